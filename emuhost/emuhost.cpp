@@ -1,0 +1,143 @@
+// Emulated host run-time. Blocks are malloc'd (16-byte aligned), so the
+// elements, which start at byte 4 as in the host's own blocks, are 4 modulo 8.
+#include "emuhost.h"
+
+#include <atomic>
+#include <cstdlib>
+#include <cstring>
+#include <mutex>
+
+extern "C" {
+// Probe symbol by which the library recognises a host process.
+EMUHOST_API extern const int32_t gGFRTVersion;
+const int32_t gGFRTVersion = 0x00070000;
+}
+
+namespace {
+// Each block remembers its capacity just before the host-visible part, so the
+// host-visible block itself is exactly {count, elements...}.
+struct Header {
+  size_t capacity;  // elements
+  size_t elementSize;
+  size_t pad;       // keeps the visible block 16-byte aligned
+  size_t pad2;
+};
+static_assert(sizeof(Header) % 16 == 0);
+
+size_t ElementSize(int32_t typeCode) { return typeCode == 13 ? 16 : 8; }
+
+Header* HeaderOf(QdmArrayBlock* block) {
+  return reinterpret_cast<Header*>(reinterpret_cast<char*>(block) - sizeof(Header));
+}
+
+std::mutex g_fail_mutex;
+int32_t g_fail_skip = 0;
+int32_t g_fail_error = 0;
+std::atomic<int64_t> g_calls{0};
+std::atomic<int32_t> g_last_type{0}, g_last_dims{0};
+std::atomic<size_t> g_last_count{0};
+
+QdmArrayBlock* AllocBlock(size_t count, size_t elementSize) {
+  const size_t bytes = sizeof(Header) + 4 + count * elementSize;
+  char* raw = static_cast<char*>(std::calloc(1, bytes));
+  if (raw == nullptr) return nullptr;
+  Header* h = reinterpret_cast<Header*>(raw);
+  h->capacity = count;
+  h->elementSize = elementSize;
+  return reinterpret_cast<QdmArrayBlock*>(raw + sizeof(Header));
+}
+}  // namespace
+
+extern "C" {
+
+int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArrayHandle* handle,
+                           size_t count) {
+  g_calls.fetch_add(1);
+  g_last_type = typeCode;
+  g_last_dims = numDims;
+  g_last_count = count;
+  {
+    std::lock_guard<std::mutex> lock(g_fail_mutex);
+    if (g_fail_error != 0) {
+      if (g_fail_skip > 0) {
+        --g_fail_skip;
+      } else {
+        const int32_t e = g_fail_error;
+        g_fail_error = 0;
+        return e;
+      }
+    }
+  }
+  if (typeCode != 10 && typeCode != 13) return 1;
+  if (numDims != 1) return 1;
+  const size_t es = ElementSize(typeCode);
+  if (*handle == nullptr) {
+    QdmArrayBlock** h = static_cast<QdmArrayBlock**>(std::malloc(sizeof(QdmArrayBlock*)));
+    if (h == nullptr) return 2;
+    *h = AllocBlock(count, es);
+    if (*h == nullptr) {
+      std::free(h);
+      return 2;
+    }
+    *handle = h;
+    return 0;
+  }
+  QdmArrayBlock* old = **handle;
+  QdmArrayBlock* nb = AllocBlock(count, es);
+  if (nb == nullptr) return 2;
+  if (old != nullptr) {
+    Header* oh = HeaderOf(old);
+    const size_t keep = (oh->capacity < count ? oh->capacity : count) * es;
+    std::memcpy(nb, old, 4 + (keep < oh->capacity * oh->elementSize ? keep : oh->capacity * oh->elementSize));
+    std::free(oh);
+  }
+  **handle = nb;
+  return 0;
+}
+
+QdmArrayHandle EmuMakeHandle(int32_t typeCode, int32_t count, const double* values) {
+  QdmArrayHandle h = nullptr;
+  if (NumericArrayResize(typeCode, 1, &h, count < 0 ? 0 : static_cast<size_t>(count)) != 0)
+    return nullptr;
+  std::memcpy(*h, &count, 4);
+  if (values != nullptr && count > 0)
+    std::memcpy(reinterpret_cast<char*>(*h) + 4, values,
+                static_cast<size_t>(count) * ElementSize(typeCode));
+  return h;
+}
+
+void EmuFreeHandle(QdmArrayHandle handle) {
+  if (handle == nullptr) return;
+  if (*handle != nullptr) std::free(HeaderOf(*handle));
+  std::free(handle);
+}
+
+int32_t EmuCount(QdmArrayHandle handle) {
+  int32_t c;
+  std::memcpy(&c, *handle, 4);
+  return c;
+}
+
+size_t EmuCapacity(QdmArrayHandle handle) { return HeaderOf(*handle)->capacity; }
+
+void* EmuElements(QdmArrayHandle handle) { return reinterpret_cast<char*>(*handle) + 4; }
+
+void EmuRead(QdmArrayHandle handle, double* out, size_t doubles) {
+  std::memcpy(out, EmuElements(handle), doubles * sizeof(double));
+}
+
+void EmuFailResize(int32_t skip, int32_t error) {
+  std::lock_guard<std::mutex> lock(g_fail_mutex);
+  g_fail_skip = skip;
+  g_fail_error = error;
+}
+
+int64_t EmuResizeCalls(void) { return g_calls.load(); }
+
+void EmuLastResize(int32_t* typeCode, int32_t* numDims, size_t* count) {
+  *typeCode = g_last_type;
+  *numDims = g_last_dims;
+  *count = g_last_count;
+}
+
+}  // extern "C"

@@ -1,0 +1,32 @@
+// FFT engine: forward DFTs of any length by recursive mixed-radix decimation in
+// time, on plans shared per length in a process-wide list.
+#pragma once
+
+#include <cstdint>
+
+#include "numeric/types.h"
+
+struct FftPlan;  // fft/plan.h
+
+// Shared plan for length n (reference count raised), or null when n < 1 or
+// memory ran out. Thread-safe.
+FftPlan* FftPlanAcquire(int32_t n);
+// Drops one reference; the last one frees the plan. Null is allowed.
+void FftPlanRelease(FftPlan* plan);
+
+// Forward complex DFT X[k] = sum_j x[j] exp(-2 pi i jk/n), unnormalised, on
+// separate real/imaginary sequences with strides counted in doubles
+// (interleaved data: base, base + 1, stride 2). Input and output must not
+// overlap. -1 when n differs from the plan's length.
+[[nodiscard]] StatusCode FftComplex(const FftPlan* plan, const double* inRe, const double* inIm,
+                                    double* outRe, double* outIm, int32_t inStride,
+                                    int32_t outStride, int32_t n);
+// Forward DFT of a real sequence in packed half-complex order: out[0] = Re X0,
+// out[k] = Re Xk, out[n-k] = Im Xk (1 <= k < n/2), out[n/2] = Re X(n/2) for
+// even n. -20999 when n differs from the plan's length.
+[[nodiscard]] StatusCode FftReal(const FftPlan* plan, const double* in, double* out,
+                                 int32_t inStride, int32_t outStride, int32_t n);
+// x replaced by |X[k]|^2 / n^2, k = 0..n-1 (two-sided).
+[[nodiscard]] StatusCode PowerSpectrumReal(double* x, int32_t n);
+// Multiplies x by the periodic cosine-sum window of the given kind (0..9, 11).
+[[nodiscard]] StatusCode ApplyWindow(double* x, int32_t n, int32_t kind, int32_t flag);

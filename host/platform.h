@@ -1,0 +1,32 @@
+// Every call into the operating system lives behind this header: module
+// lookup, the fatal message, process exit, and the one process-wide mutex that
+// guards the FFT plan list. platform.cpp has a Windows and a POSIX branch.
+#pragma once
+
+#include "numeric/types.h"
+
+namespace platform {
+
+using Module = void*;
+
+// The names of the host run-time modules, in lookup order.
+extern const char* const kRuntimeModuleNames[2];
+
+// The main executable of the process.
+Module MainExecutable();
+// A module already loaded into the process, or null; never loads anything.
+Module LoadedModule(const char* name);
+// Address of an exported symbol, or null.
+void* Symbol(Module module, const char* name);
+// Shows "Fatal Error" with `text` (message box / stderr) and ends the process
+// with exit code 1.
+[[noreturn]] void Fatal(const char* text);
+
+// The plan-list mutex: created when the library is attached, closed when it is
+// detached. Waits are unbounded.
+StatusCode PlanMutexCreate();
+void PlanMutexClose();
+void PlanMutexLock();
+void PlanMutexUnlock();
+
+}  // namespace platform

@@ -1,0 +1,89 @@
+// Numeric support: dense linear algebra over LAPACK/CBLAS, the polynomial root
+// finder, sorting and scalar helpers. Matrices are dense and row-major (element
+// (i, j) of an m-by-n matrix at i*n + j); complex values are Complex (two
+// doubles, real part first). Every routine returns a StatusCode (numeric/types.h).
+// Pointers are assumed aligned for their element type: host memory never
+// reaches this layer directly.
+#pragma once
+
+#include <cstdint>
+
+#include "numeric/types.h"
+
+// ---- products and vector helpers ---------------------------------------------
+// C (m-by-n) = A (m-by-k) * B (k-by-n). C must not overlap A or B.
+[[nodiscard]] StatusCode MatMulReal(const double* A, const double* B, int32_t m, int32_t k,
+                                    int32_t n, double* C);
+[[nodiscard]] StatusCode MatMulComplex(const Complex* A, const Complex* B, int32_t m, int32_t k,
+                                       int32_t n, Complex* C);
+[[nodiscard]] StatusCode DotReal(const double* x, const double* y, int32_t n, double* result);
+[[nodiscard]] StatusCode VecSubReal(const double* a, const double* b, int32_t n, double* out);
+[[nodiscard]] StatusCode VecCopyReal(const double* src, int32_t n, double* dst);
+[[nodiscard]] StatusCode VecZeroReal(double* x, int32_t n);
+// out may be null: negate in place.
+[[nodiscard]] StatusCode VecNegateReal(double* x, int32_t n, double* out);
+// 1 if some value is NaN, infinite, == DBL_MAX or <= -1.7976931348623e308; else 0.
+int32_t HasNonFiniteReal(const double* x, int64_t n);
+int32_t HasNonFiniteComplex(const Complex* x, int64_t n);
+// n-by-m transpose of the m-by-n A into out, or over A when out is null.
+[[nodiscard]] StatusCode TransposeReal(double* A, int32_t m, int32_t n, double* out);
+[[nodiscard]] StatusCode ConjTransposeComplex(Complex* A, int32_t m, int32_t n, Complex* out);
+
+// ---- singular value decomposition ----------------------------------------------
+// A = U diag(S) V^H; economy (full = 0): U m-by-k, V n-by-k; full: U m-by-m,
+// V n-by-n; k = min(m, n); S non-increasing. V itself, not V^H. A untouched.
+[[nodiscard]] StatusCode SvdReal(const double* A, int32_t m, int32_t n, double* U, double* S,
+                                 double* V, int32_t full);
+[[nodiscard]] StatusCode SvdComplex(const Complex* A, int32_t m, int32_t n, Complex* U, double* S,
+                                    Complex* V, int32_t full);
+
+// ---- least squares and pseudo-inverse ------------------------------------------
+// X (n-by-nrhs) minimising ||A X - B||, minimum norm; 20001 when rank deficient.
+[[nodiscard]] StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double* B,
+                                          int32_t nrhs, double* X, double rcond);
+[[nodiscard]] StatusCode LeastSquaresPinvReal(const double* A, int32_t m, int32_t n,
+                                              const double* B, int32_t nrhs, double* X,
+                                              double rcond);
+[[nodiscard]] StatusCode LeastSquaresComplex(const Complex* A, int32_t m, int32_t n,
+                                             const Complex* B, int32_t nrhs, Complex* X,
+                                             double rcond);
+// pinv(A), n-by-m, into out or over A when out is null.
+[[nodiscard]] StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol,
+                                           double* out);
+[[nodiscard]] StatusCode PseudoInverseComplex(Complex* A, int32_t m, int32_t n, double tol,
+                                              Complex* out);
+
+// ---- eigenproblems ---------------------------------------------------------------
+// General: n complex eigenvalues in LAPACK's order; vectors (n-by-n, column j
+// the right eigenvector of eigenvalue j) when wantVectors = 1.
+[[nodiscard]] StatusCode EigGeneralReal(const double* A, int32_t n, int32_t wantVectors,
+                                        Complex* eigenvalues, Complex* vectors);
+// vectors may be null: then written over A.
+[[nodiscard]] StatusCode EigGeneralComplex(Complex* A, int32_t n, int32_t wantVectors,
+                                           Complex* eigenvalues, Complex* vectors);
+// Symmetric / Hermitian: n real eigenvalues ascending. EigSymReal writes the
+// vectors over A when vectors is null.
+[[nodiscard]] StatusCode EigSymReal(double* A, int32_t n, int32_t wantVectors,
+                                    double* eigenvalues, double* vectors);
+[[nodiscard]] StatusCode EigHermitianComplex(const Complex* A, int32_t n, int32_t wantVectors,
+                                             double* eigenvalues, Complex* vectors);
+// hermitian = 0: EigGeneralComplex; 1: EigHermitianComplex with (w, 0) values.
+[[nodiscard]] StatusCode EigComplex(Complex* A, int32_t n, int32_t hermitian,
+                                    int32_t wantVectors, Complex* eigenvalues, Complex* vectors);
+
+// ---- sorting and scalar helpers --------------------------------------------------
+// NaN values first, then the rest ascending (descending = 0) or descending.
+// Into out when given (x copied there first unless out == x), else in x.
+[[nodiscard]] StatusCode SortReal(double* x, int32_t n, int32_t descending, double* out);
+// Largest and smallest non-NaN values with their first indices; all NaN:
+// NaN values and indices -1.
+[[nodiscard]] StatusCode MinMaxReal(const double* x, int32_t n, double* maxValue,
+                                    int32_t* maxIndex, double* minValue, int32_t* minIndex);
+StatusCode ComplexToPolar(double re, double im, double* magnitude, double* angle);
+StatusCode ComplexDivide(double a, double b, double c, double d, double* re, double* im);
+StatusCode ComplexSqrt(double re, double im, double* outRe, double* outIm);
+
+// ---- polynomial roots --------------------------------------------------------------
+// Roots of c[0] + c[1] z + ... + c[n-1] z^(n-1); roots may be the same array as c.
+[[nodiscard]] StatusCode PolyRootsComplex(const Complex* c, int32_t n, int32_t maxIterations,
+                                          Complex* roots);

@@ -1,0 +1,49 @@
+// Work memory. Every block of work memory in the library is obtained through
+// NumAlloc and released through NumFree, so that exhausted memory is always
+// reported as status::kNoMemory and never throws, and so that tests can make
+// the k-th allocation fail.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <memory>
+
+#include "numeric/types.h"
+
+// Allocates `bytes` uninitialised bytes into *slot (null on failure).
+[[nodiscard]] StatusCode NumAlloc(void** slot, size_t bytes);
+// Releases a block from NumAlloc/NumRealloc; null is allowed. Always 0.
+StatusCode NumFree(void* ptr);
+// Resizes *slot to `bytes`. On failure the old block is released, *slot is
+// null and the result is kNoMemory.
+[[nodiscard]] StatusCode NumRealloc(void** slot, size_t bytes);
+
+// ---- fault injection and accounting, for tests ------------------------------
+// Makes the k-th allocation from now (k >= 1) fail; with `persistent` every
+// allocation from the k-th on fails. k = 0 switches injection off.
+void NumAllocFailAt(int64_t k, bool persistent);
+// Number of allocations attempted since the last NumAllocFailAt call.
+int64_t NumAllocAttempts();
+// Blocks currently allocated and not yet released.
+int64_t NumAllocOutstanding();
+
+// ---- RAII holder -------------------------------------------------------------
+struct NumFreeDeleter {
+  void operator()(void* p) const noexcept { (void)NumFree(p); }
+};
+template <typename T>
+using WorkArray = std::unique_ptr<T[], NumFreeDeleter>;
+
+// Zero-filled work array of `count` elements; empty holder on failure (or on a
+// byte size that would overflow). A count of 0 still allocates one element so
+// that success and failure stay distinguishable.
+template <typename T>
+WorkArray<T> AllocWork(size_t count) {
+  if (count > SIZE_MAX / sizeof(T)) return WorkArray<T>();
+  const size_t bytes = (count == 0 ? 1 : count) * sizeof(T);
+  void* p = nullptr;
+  if (NumAlloc(&p, bytes) != status::kOk) return WorkArray<T>();
+  std::memset(p, 0, bytes);
+  return WorkArray<T>(static_cast<T*>(p));
+}

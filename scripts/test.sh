@@ -1,0 +1,29 @@
+#!/usr/bin/env bash
+# Builds and runs every test suite: the plain -O3 build, then the
+# AddressSanitizer + UndefinedBehaviorSanitizer build. Installs what is
+# missing on a fresh Debian 12 machine (run as root). The last lines printed
+# are ctest's own summary; the exit status is non-zero if any suite failed.
+set -uo pipefail
+cd "$(dirname "$0")/.."
+scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
+  libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev || exit 1
+
+jobs=$(nproc)
+failed=0
+suite() {  # name, cmake options...
+  local dir=build/$1; shift
+  cmake -S . -B "$dir" -DQDM_BUILD_BENCH=ON "$@" >/dev/null || return 1
+  cmake --build "$dir" -j"$jobs" >/dev/null || { cmake --build "$dir" -j1 2>&1 | tail -40; return 1; }
+}
+run() {  # name
+  ctest --test-dir "build/$1" -j"$jobs" --output-on-failure --schedule-random --timeout 600
+}
+
+suite release -DCMAKE_BUILD_TYPE=Release || failed=1
+[ $failed -eq 0 ] && { run release | tail -n 25 || failed=1; }
+suite sanitize -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_SANITIZE=ON || failed=1
+if [ $failed -eq 0 ]; then
+  export ASAN_OPTIONS=detect_leaks=1:abort_on_error=0 UBSAN_OPTIONS=print_stacktrace=1
+  run sanitize || failed=1
+fi
+exit $failed
