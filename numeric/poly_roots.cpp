@@ -95,8 +95,7 @@ StatusCode NewtonRoot(const Complex* c, ptrdiff_t m, int32_t max_iterations, Com
   double r = 1.0;
   for (ptrdiff_t k = 1; k <= m; ++k) {
     if (IsZero(c[k])) continue;
-    const double term =
-        std::pow(AbsSq(ScaledDivide(c[0], c[k])), 0.5 / static_cast<double>(k));
+    const double term = std::pow(AbsSq(ScaledDivide(c[0], c[k])), 0.5 / static_cast<double>(k));
     r = std::min(r, term);
   }
   r *= 0.5;

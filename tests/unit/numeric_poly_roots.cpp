@@ -57,8 +57,7 @@ void ExpectSameMultiset(std::vector<C> got, const std::vector<C>& want, double t
 
 StatusCode Roots(const std::vector<C>& c, std::vector<C>* roots, int32_t max_iterations = 1000) {
   roots->assign(c.size() > 1 ? c.size() - 1 : 1, C(-99, -99));
-  return PolyRootsComplex(c.data(), static_cast<int32_t>(c.size()), max_iterations,
-                          roots->data());
+  return PolyRootsComplex(c.data(), static_cast<int32_t>(c.size()), max_iterations, roots->data());
 }
 
 TEST(PolyRoots, RandomPolynomialsMatchCompanionEigenvalues) {

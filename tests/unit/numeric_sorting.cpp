@@ -146,8 +146,8 @@ TEST(ComplexScalars, SqrtCases) {
     double re, im, want_re, want_im;
   };
   const std::vector<Case> cases = {
-      {-4, 0, 0, 2}, {0, 0, 0, 0},     {4, 0, 2, 0},         {0, 2, 1, 1},
-      {0, -2, 1, -1}, {-4, -0.0, 0, -2}, {3, 4, 2, 1},       {-3, 4, 1, 2},
+      {-4, 0, 0, 2},  {0, 0, 0, 0},      {4, 0, 2, 0}, {0, 2, 1, 1},
+      {0, -2, 1, -1}, {-4, -0.0, 0, -2}, {3, 4, 2, 1}, {-3, 4, 1, 2},
   };
   for (const Case& c : cases) {
     double re = 9, im = 9;
@@ -173,8 +173,11 @@ TEST(ComplexScalars, DivideCases) {
     double a, b, c, d, want_re, want_im;
   };
   const std::vector<Case> cases = {
-      {1, 0, 0, 1, 0, -1},   {1, 1, 1, 1, 1, 0},      {2, 4, 2, 0, 1, 2},
-      {1, 2, 3, 4, 0.44, 0.08}, {1e300, 1e300, 1e300, 1e300, 1, 0},  // no overflowing squares
+      {1, 0, 0, 1, 0, -1},
+      {1, 1, 1, 1, 1, 0},
+      {2, 4, 2, 0, 1, 2},
+      {1, 2, 3, 4, 0.44, 0.08},
+      {1e300, 1e300, 1e300, 1e300, 1, 0},  // no overflowing squares
   };
   for (const Case& c : cases) {
     double re = 9, im = 9;
