@@ -106,7 +106,10 @@ if [ ! -f "$WINEPREFIX/system.reg" ]; then
 fi
 "$wineserver" -p
 trap '"$wineserver" -k 2>/dev/null' EXIT
+# Warm-up, with output going nowhere: the first program starts wine's
+# services, the first one touching user32 its desktop process.
 timeout 120 "$wine" cmd /c exit 0 >/dev/null 2>&1 || die "wine does not start"
+timeout 120 "$wine" rundll32 user32.dll,MessageBeep >/dev/null 2>&1
 
 # ---- 4. cross-build -------------------------------------------------------------------
 say "configuring and building (build/windows)"
