@@ -19,6 +19,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <charconv>
 #include <cctype>
 #include <cerrno>
 #include <cmath>
@@ -617,9 +618,13 @@ std::string FormatNumber(double v, bool integer) {
 std::string JsonNumber(double v, bool integer = false) {
   if (!std::isfinite(v)) return "null";  // JSON has no NaN or infinity
   char buf[64];
-  if (integer) std::snprintf(buf, sizeof buf, "%.0f", v);
-  else std::snprintf(buf, sizeof buf, "%.17g", v);
-  return buf;
+  if (integer) {
+    std::snprintf(buf, sizeof buf, "%.0f", v);
+    return buf;
+  }
+  // The shortest text that reads back as the same double.
+  const std::to_chars_result r = std::to_chars(buf, buf + sizeof buf, v);
+  return std::string(buf, r.ptr);
 }
 
 std::string JsonString(const std::string& s) {
@@ -642,6 +647,9 @@ std::string JsonString(const std::string& s) {
   }
   return out + "\"";
 }
+
+// Full precision; non-finite values as nan, inf, -inf.
+std::string CsvNumber(double v) { return std::isfinite(v) ? JsonNumber(v) : FormatNumber(v, false); }
 
 struct RunInfo {
   const Options* options;
@@ -813,8 +821,8 @@ void WriteSpectrumCsv(const SpectrumOut& s) {
     Fail(kExitOutput, "cannot write " + s.csv + ": " + std::strerror(errno));
   std::fprintf(f, "frequency_hz,power_db\n");
   for (size_t j = 0; j < s.db.size(); ++j)
-    std::fprintf(f, "%.17g,%s\n", s.f0 + static_cast<double>(j) * s.df,
-                 FormatNumber(s.db[j], false).c_str());
+    std::fprintf(f, "%s,%s\n", JsonNumber(s.f0 + static_cast<double>(j) * s.df).c_str(),
+                 CsvNumber(s.db[j]).c_str());
   if (std::fclose(f) != 0) Fail(kExitOutput, "cannot write " + s.csv + ": " + std::strerror(errno));
 }
 
@@ -859,7 +867,7 @@ void PlotSpectrum(const SpectrumOut& s, const std::string& title,
   script += "set output " + GnuplotQuote(s.png) + "\n";
   script += "set title " + GnuplotQuote(title) + " noenhanced\n";
   script += "set xlabel 'Frequency (Hz)'\nset ylabel 'Power (dB, peak = 0 dB)'\n";
-  script += "set grid\nset key top right\nset datafile separator ','\n";
+  script += "set grid\nset key bottom right opaque box\nset datafile separator ','\n";
   char range[160];
   std::snprintf(range, sizeof range, "set xrange [%.17g:%.17g]\nset yrange [%.17g:3]\n", left,
                 right, bottom);
