@@ -1,0 +1,140 @@
+// Covariance-method AR estimation: forward linear prediction over the samples
+// that have all p predecessors (no windowing, no zero extension), solved in the
+// least-squares sense. Returns a[0..p] with a[0] = 1 and a[k] = -w[k-1], the
+// poles (roots of z^p + a[1] z^(p-1) + ... + a[p]) and the mean squared
+// prediction error over the M = n - p equations.
+#include <cstddef>
+#include <type_traits>
+
+#include "estimation/estimation.h"
+#include "numeric/numeric.h"
+#include "numeric/work.h"
+
+namespace {
+
+template <typename T>
+constexpr bool kIsComplex = std::is_same_v<T, Complex>;
+
+// Iteration limits per root handed to the root finder. The complex estimator
+// deliberately allows twenty times more than the real one.
+constexpr int32_t kRootIterationsReal = 1000;
+constexpr int32_t kRootIterationsComplex = 20000;
+
+StatusCode BuildForward(const double* x, int32_t n, int32_t p, double* b, double* A) {
+  return BuildForwardMatrixReal(x, n, p, b, A);
+}
+StatusCode BuildForward(const Complex* x, int32_t n, int32_t p, Complex* b, Complex* A) {
+  return BuildForwardMatrixComplex(x, n, p, b, A);
+}
+StatusCode Product(const double* A, const double* w, int32_t m, int32_t k, double* out) {
+  return MatMulReal(A, w, m, k, 1, out);
+}
+StatusCode Product(const Complex* A, const Complex* w, int32_t m, int32_t k, Complex* out) {
+  return MatMulComplex(A, w, m, k, 1, out);
+}
+StatusCode Difference(const double* u, const double* v, int32_t count, double* out) {
+  return VecSubReal(u, v, count, out);
+}
+StatusCode Difference(const Complex* u, const Complex* v, int32_t count, Complex* out) {
+  return VecSubComplex(u, v, count, out);
+}
+
+template <typename T>
+StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, double* variance) {
+  if (n < 1) return status::kEmptyInput;
+  if (p <= 0 || p > MaxOrder(n)) return status::kBadCount;
+
+  const int32_t M = n - p;
+  const size_t rows = static_cast<size_t>(M);
+  const size_t cols = static_cast<size_t>(p);
+  const size_t terms = cols + 1;
+
+  WorkArray<T> b = AllocWork<T>(rows);
+  if (!b) return status::kNoMemory;
+  WorkArray<T> A = AllocWork<T>(rows * cols);
+  if (!A) return status::kNoMemory;
+  WorkArray<T> w = AllocWork<T>(cols);
+  if (!w) return status::kNoMemory;
+  WorkArray<T> Aw = AllocWork<T>(rows);
+  if (!Aw) return status::kNoMemory;
+  WorkArray<T> e = AllocWork<T>(rows);
+  if (!e) return status::kNoMemory;
+  // Root-finder input: the real estimator reverses into a real vector and
+  // widens it; the complex one reverses straight into the complex vector.
+  WorkArray<double> reversed;
+  if constexpr (!kIsComplex<T>) {
+    reversed = AllocWork<double>(terms);
+    if (!reversed) return status::kNoMemory;
+  }
+  WorkArray<Complex> c = AllocWork<Complex>(terms);
+  if (!c) return status::kNoMemory;
+
+  (void)BuildForward(x, n, p, b.get(), A.get());
+
+  // The solve's status is deliberately not examined: a rank-deficient (or
+  // failed) solve goes on with whatever w holds. rcond -1 selects machine
+  // precision. The real solve is the minimum-norm driver, the complex one the
+  // pseudo-inverse solve.
+  if constexpr (kIsComplex<T>) {
+    (void)LeastSquaresComplex(A.get(), M, p, b.get(), 1, w.get(), -1.0);
+  } else {
+    (void)LeastSquaresReal(A.get(), M, p, b.get(), 1, w.get(), -1.0);
+  }
+
+  // The coefficients are the caller's from here on, even if a later step fails.
+  a[0] = T(1.0);
+  for (size_t k = 0; k < cols; ++k) a[k + 1] = -w[k];
+
+  StatusCode st = Product(A.get(), w.get(), M, p, Aw.get());
+  if (st != status::kOk) return st;
+  st = Difference(Aw.get(), b.get(), M, e.get());
+  if (st != status::kOk) return st;
+
+  double sum = 0.0;
+  if constexpr (kIsComplex<T>) {
+    // Real parts, then imaginary parts, each gathered into a real vector and
+    // squared-summed by the dot product. A.w is no longer needed, and its M
+    // complex elements hold exactly the 2M doubles of the two gathers.
+    double* gather = reinterpret_cast<double*>(Aw.get());
+    double* re = gather;
+    double* im = gather + rows;
+    for (size_t i = 0; i < rows; ++i) {
+      re[i] = e[i].real();
+      im[i] = e[i].imag();
+    }
+    double sum_re = 0.0;
+    double sum_im = 0.0;
+    st = DotReal(re, re, M, &sum_re);
+    if (st != status::kOk) return st;
+    st = DotReal(im, im, M, &sum_im);
+    if (st != status::kOk) return st;
+    sum = sum_re + sum_im;
+  } else {
+    st = DotReal(e.get(), e.get(), M, &sum);
+    if (st != status::kOk) return st;
+  }
+  *variance = sum / static_cast<double>(M);
+
+  // c[k] = a[p-k]: the constant term first, as the root finder wants it.
+  int32_t iteration_limit = 0;
+  if constexpr (kIsComplex<T>) {
+    (void)ReverseComplex(a, c.get(), p + 1);
+    iteration_limit = kRootIterationsComplex;
+  } else {
+    (void)ReverseReal(a, reversed.get(), p + 1);
+    for (size_t k = 0; k < terms; ++k) c[k] = Complex(reversed[k], 0.0);
+    iteration_limit = kRootIterationsReal;
+  }
+  return PolyRootsComplex(c.get(), p + 1, iteration_limit, r);
+}
+
+}  // namespace
+
+StatusCode CovarianceArReal(const double* x, int32_t n, int32_t p, double* a, Complex* r,
+                            double* variance) {
+  return CovarianceAr<double>(x, n, p, a, r, variance);
+}
+StatusCode CovarianceArComplex(const Complex* x, int32_t n, int32_t p, Complex* a, Complex* r,
+                               double* variance) {
+  return CovarianceAr<Complex>(x, n, p, a, r, variance);
+}

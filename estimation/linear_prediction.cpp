@@ -1,0 +1,90 @@
+// Linear-prediction building blocks shared by the AR estimators: the forward
+// and backward prediction blocks, array reversal and the complex difference.
+//
+// With q = n - p equations, the forward block predicts each sample from the p
+// samples before it (nearest first), the backward block each sample from the
+// p samples after it (nearest first). Neither conjugates anything; the callers
+// that need a conjugated backward block do that themselves.
+#include <cstddef>
+#include <cstring>
+
+#include "estimation/estimation.h"
+
+namespace {
+
+// Forward block: b[i] = x[i+p], A[i][j] = x[i+p-1-j], i < q, j < p.
+template <typename T>
+StatusCode BuildForwardMatrix(const T* x, int32_t n, int32_t p, T* b, T* A) {
+  const ptrdiff_t rows = static_cast<ptrdiff_t>(n) - p;
+  const ptrdiff_t cols = p;
+  if (rows <= 0 || cols <= 0) return status::kOk;
+  std::memset(static_cast<void*>(A), 0, static_cast<size_t>(rows * cols) * sizeof(T));
+  for (ptrdiff_t i = 0; i < rows; ++i) {
+    b[i] = x[i + cols];
+    T* row = A + i * cols;
+    for (ptrdiff_t j = 0; j < cols; ++j) row[j] = x[i + cols - 1 - j];
+  }
+  return status::kOk;
+}
+
+// Backward block: b[i] = x[i], A[i][j] = x[i+1+j], i < q, j < p.
+template <typename T>
+StatusCode BuildBackwardMatrix(const T* x, int32_t n, int32_t p, T* b, T* A) {
+  const ptrdiff_t rows = static_cast<ptrdiff_t>(n) - p;
+  const ptrdiff_t cols = p;
+  if (rows <= 0 || cols <= 0) return status::kOk;
+  std::memset(static_cast<void*>(A), 0, static_cast<size_t>(rows * cols) * sizeof(T));
+  for (ptrdiff_t i = 0; i < rows; ++i) {
+    b[i] = x[i];
+    T* row = A + i * cols;
+    for (ptrdiff_t j = 0; j < cols; ++j) row[j] = x[i + 1 + j];
+  }
+  return status::kOk;
+}
+
+// In place (src == dst) works too: the ends are swapped towards the middle.
+template <typename T>
+StatusCode Reverse(const T* src, T* dst, int32_t count) {
+  if (src == dst) {
+    for (ptrdiff_t lo = 0, hi = static_cast<ptrdiff_t>(count) - 1; lo < hi; ++lo, --hi) {
+      const T t = dst[lo];
+      dst[lo] = dst[hi];
+      dst[hi] = t;
+    }
+    return status::kOk;
+  }
+  for (ptrdiff_t k = 0; k < count; ++k) dst[k] = src[count - 1 - k];
+  return status::kOk;
+}
+
+}  // namespace
+
+StatusCode BuildForwardMatrixReal(const double* x, int32_t n, int32_t p, double* b, double* A) {
+  return BuildForwardMatrix<double>(x, n, p, b, A);
+}
+StatusCode BuildForwardMatrixComplex(const Complex* x, int32_t n, int32_t p, Complex* b,
+                                     Complex* A) {
+  return BuildForwardMatrix<Complex>(x, n, p, b, A);
+}
+StatusCode BuildBackwardMatrixReal(const double* x, int32_t n, int32_t p, double* b, double* A) {
+  return BuildBackwardMatrix<double>(x, n, p, b, A);
+}
+StatusCode BuildBackwardMatrixComplex(const Complex* x, int32_t n, int32_t p, Complex* b,
+                                      Complex* A) {
+  return BuildBackwardMatrix<Complex>(x, n, p, b, A);
+}
+
+StatusCode ReverseReal(const double* src, double* dst, int32_t count) {
+  return Reverse<double>(src, dst, count);
+}
+StatusCode ReverseComplex(const Complex* src, Complex* dst, int32_t count) {
+  return Reverse<Complex>(src, dst, count);
+}
+
+// No check of count: a count below 1 simply writes nothing.
+StatusCode VecSubComplex(const Complex* u, const Complex* v, int32_t count, Complex* out) {
+  for (ptrdiff_t i = 0; i < count; ++i) {
+    out[i] = Complex(u[i].real() - v[i].real(), u[i].imag() - v[i].imag());
+  }
+  return status::kOk;
+}

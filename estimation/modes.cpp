@@ -1,0 +1,126 @@
+// Exponential modes: least-squares amplitudes of a set of poles against a
+// record, x[t] ~ sum_i A_i z_i^t, and the conversion of poles and amplitudes
+// into amplitude, phase, damping (per sample) and frequency (Hz).
+#include <cmath>
+#include <cstddef>
+#include <type_traits>
+
+#include "estimation/estimation.h"
+#include "numeric/numeric.h"
+#include "numeric/work.h"
+
+namespace {
+
+constexpr double kTwoPi = 6.283185307179586;
+constexpr double kPi = 3.141592653589793;
+
+// Fits the k amplitudes A of poles z to the n samples x and reports the mean
+// squared modulus of the residual in E. The solve, product and difference are
+// not checked: if one of them fails, A and E are whatever it left behind.
+template <typename T>
+StatusCode ModeAmplitudes(const T* x, int32_t n, const Complex* z, int32_t k, Complex* A,
+                          double* E) {
+  if constexpr (std::is_same_v<T, Complex>) {
+    // The real form trusts its callers (n >= 1, k >= 1); only the complex one
+    // checks its arguments.
+    if (n < 1) return status::kEmptyInput;
+    if (k <= 0) return status::kNoModes;
+  }
+  const size_t rows = static_cast<size_t>(n);
+  const size_t cols = static_cast<size_t>(k);
+  const size_t cells = (rows != 0 && cols > SIZE_MAX / rows) ? SIZE_MAX : rows * cols;
+
+  WorkArray<Complex> V = AllocWork<Complex>(cells);
+  if (!V) return status::kNoMemory;
+  WorkArray<Complex> data = AllocWork<Complex>(rows);
+  if (!data) return status::kNoMemory;
+  WorkArray<Complex> model = AllocWork<Complex>(rows);
+  if (!model) return status::kNoMemory;
+  WorkArray<Complex> residual = AllocWork<Complex>(rows);
+  if (!residual) return status::kNoMemory;
+
+  // Vandermonde matrix V[t][i] = z_i^t by running products down each column:
+  // no power function, so every entry is the exact product chain.
+  for (size_t i = 0; i < cols; ++i) {
+    const double zr = z[i].real();
+    const double zi = z[i].imag();
+    double re = 1.0;
+    double im = 0.0;
+    for (size_t t = 0; t < rows; ++t) {
+      V[t * cols + i] = Complex(re, im);
+      const double next_re = re * zr - im * zi;
+      const double next_im = re * zi + im * zr;
+      re = next_re;
+      im = next_im;
+    }
+  }
+
+  if constexpr (std::is_same_v<T, Complex>) {
+    for (size_t t = 0; t < rows; ++t) data[t] = x[t];
+  } else {
+    // Real samples go into the real parts; the amplitudes stay complex.
+    for (size_t t = 0; t < rows; ++t) data[t] = Complex(x[t], 0.0);
+  }
+
+  (void)LeastSquaresComplex(V.get(), n, k, data.get(), 1, A, -1.0);
+  (void)MatMulComplex(V.get(), A, n, k, 1, model.get());
+  (void)VecSubComplex(model.get(), data.get(), n, residual.get());
+
+  double sum = 0.0;
+  for (size_t t = 0; t < rows; ++t) {
+    const double re = residual[t].real();
+    const double im = residual[t].imag();
+    sum += re * re + im * im;
+  }
+  *E = sum / static_cast<double>(n);
+  return status::kOk;
+}
+
+}  // namespace
+
+StatusCode ModeAmplitudesComplex(const Complex* x, int32_t n, const Complex* z, int32_t k,
+                                 Complex* A, double* E) {
+  return ModeAmplitudes<Complex>(x, n, z, k, A, E);
+}
+StatusCode ModeAmplitudesReal(const double* x, int32_t n, const Complex* z, int32_t k,
+                              Complex* A, double* E) {
+  return ModeAmplitudes<double>(x, n, z, k, A, E);
+}
+
+// Complex mode reports every pole in order. Real-signal mode reports one
+// member of each conjugate pair, the one with 0 <= angle < pi: a real positive
+// pole is kept, a real negative one (angle pi) dropped, and the amplitude is
+// that member's own |A_i|, not doubled. Damping is ln|z| unguarded, so a pole
+// at 0 gives -inf.
+StatusCode ModeParameters(const Complex* A, int32_t kA, const Complex* z, int32_t kz, double fs,
+                          int32_t realFlag, double* amp, double* phase, double* damp,
+                          double* freq, int32_t* count) {
+  const double scale = fs / kTwoPi;
+  if (realFlag == 0) {
+    for (int32_t i = 0; i < kz; ++i) {
+      double m = 0.0;
+      double theta = 0.0;
+      (void)ComplexToPolar(z[i].real(), z[i].imag(), &m, &theta);
+      freq[i] = theta * scale;
+      damp[i] = std::log(m);
+    }
+    for (int32_t i = 0; i < kA; ++i) {
+      (void)ComplexToPolar(A[i].real(), A[i].imag(), &amp[i], &phase[i]);
+    }
+    *count = kz;
+    return status::kOk;
+  }
+  int32_t j = 0;
+  for (int32_t i = 0; i < kz; ++i) {
+    double m = 0.0;
+    double theta = 0.0;
+    (void)ComplexToPolar(z[i].real(), z[i].imag(), &m, &theta);
+    if (!(theta >= 0.0 && theta < kPi)) continue;
+    damp[j] = std::log(m);
+    freq[j] = theta * scale;
+    (void)ComplexToPolar(A[i].real(), A[i].imag(), &amp[j], &phase[j]);
+    ++j;
+  }
+  *count = j;
+  return status::kOk;
+}

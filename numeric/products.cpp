@@ -1,0 +1,220 @@
+// Matrix products over CBLAS, the dot product, element-wise vector helpers, the
+// finiteness screen in front of every LAPACK call, and the transposes between
+// row-major storage and LAPACK's column-major storage.
+
+#include <bit>
+#include <cfloat>
+#include <cstring>
+#include <limits>
+#include <type_traits>
+
+#include "numeric/lapack_shims.h"
+#include "numeric/mat_mul.h"
+#include "numeric/numeric.h"
+#include "numeric/work.h"
+
+namespace {
+
+constexpr uint64_t kSignBit = uint64_t{1} << 63;
+
+// Row blocking of tall real products: one dgemm call handles at most this many
+// rows of A and C when all three extents exceed their thresholds.
+constexpr int32_t kBlockRows = 1530;
+constexpr int32_t kBlockMinInner = 256;  // k must exceed this
+constexpr int32_t kBlockMinCols = 2;     // n must exceed this
+
+// Lower bound of the finiteness screen: every value at or below it is rejected.
+// It lies slightly above -DBL_MAX, so a short interval at the negative end of the
+// range is rejected while at the positive end only DBL_MAX itself is.
+constexpr double kLowerLimit = std::bit_cast<double>(uint64_t{0xFFEFFFFFFFFFFFB0});
+static_assert(kLowerLimit == -1.7976931348623e308);
+
+inline double FlipSign(double v) {
+  return std::bit_cast<double>(std::bit_cast<uint64_t>(v) ^ kSignBit);
+}
+
+// Accepted exactly when kLowerLimit < v < DBL_MAX; NaN fails both comparisons.
+inline bool Rejected(double v) { return !(v > kLowerLimit && v < DBL_MAX); }
+
+// The k = 0 fill; for complex elements both parts are NaN.
+template <typename T>
+void FillQuietNaN(T* C, int64_t count) {
+  const double nan = std::numeric_limits<double>::quiet_NaN();
+  T value;
+  if constexpr (std::is_same_v<T, double>) {
+    value = nan;
+  } else {
+    value = T(nan, nan);
+  }
+  for (int64_t i = 0; i < count; ++i) C[i] = value;
+}
+
+// C = A * B into storage that does not overlap A or B; C already zeroed.
+template <typename T>
+void GemmInto(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C) {
+  if constexpr (std::is_same_v<T, double>) {
+    // Only the real product is blocked.
+    if (m > kBlockRows && k > kBlockMinInner && n > kBlockMinCols) {
+      const int32_t blocks = m / kBlockRows;
+      for (int32_t b = 0; b < blocks; ++b) {
+        lapack::Gemm(kBlockRows, n, k, A + int64_t{b} * kBlockRows * k, B,
+                     C + int64_t{b} * kBlockRows * n);
+      }
+      const int32_t rest = m - blocks * kBlockRows;
+      if (rest > 0) {
+        lapack::Gemm(rest, n, k, A + int64_t{blocks} * kBlockRows * k, B,
+                     C + int64_t{blocks} * kBlockRows * n);
+      }
+      return;
+    }
+  }
+  lapack::Gemm(m, n, k, A, B, C);
+}
+
+}  // namespace
+
+// ---- products ----------------------------------------------------------------------
+
+template <typename T>
+StatusCode MatMul(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C,
+                  bool copyInputs) {
+  if (m < 0 || k < 0 || n < 0) return status::kNegativeDim;
+  if (m == 0 || n == 0) return status::kOk;
+  const int64_t mn = int64_t{m} * n;
+  if (k == 0) {
+    // A product over an empty inner dimension is reported as NaN, not zeros.
+    FillQuietNaN(C, mn);
+    return status::kOk;
+  }
+  if (!copyInputs) {
+    std::memset(static_cast<void*>(C), 0, static_cast<size_t>(mn) * sizeof(T));
+    GemmInto(A, B, m, k, n, C);
+    return status::kOk;
+  }
+  const int64_t mk = int64_t{m} * k;
+  const int64_t kn = int64_t{k} * n;
+  WorkArray<T> a_copy = AllocWork<T>(static_cast<size_t>(mk));
+  if (!a_copy) return status::kNoMemory;
+  WorkArray<T> b_copy = AllocWork<T>(static_cast<size_t>(kn));
+  if (!b_copy) return status::kNoMemory;
+  WorkArray<T> product = AllocWork<T>(static_cast<size_t>(mn));
+  if (!product) return status::kNoMemory;
+  std::memcpy(static_cast<void*>(a_copy.get()), A, static_cast<size_t>(mk) * sizeof(T));
+  std::memcpy(static_cast<void*>(b_copy.get()), B, static_cast<size_t>(kn) * sizeof(T));
+  GemmInto(a_copy.get(), b_copy.get(), m, k, n, product.get());
+  std::memcpy(static_cast<void*>(C), product.get(), static_cast<size_t>(mn) * sizeof(T));
+  return status::kOk;
+}
+
+template StatusCode MatMul<double>(const double*, const double*, int32_t, int32_t, int32_t,
+                                   double*, bool);
+template StatusCode MatMul<Complex>(const Complex*, const Complex*, int32_t, int32_t, int32_t,
+                                    Complex*, bool);
+
+StatusCode MatMulReal(const double* A, const double* B, int32_t m, int32_t k, int32_t n,
+                      double* C) {
+  return MatMul<double>(A, B, m, k, n, C, false);
+}
+
+StatusCode MatMulComplex(const Complex* A, const Complex* B, int32_t m, int32_t k, int32_t n,
+                         Complex* C) {
+  return MatMul<Complex>(A, B, m, k, n, C, false);
+}
+
+// ---- vector helpers ----------------------------------------------------------------
+
+StatusCode DotReal(const double* x, const double* y, int32_t n, double* result) {
+  if (n < 1) return status::kBadSize;
+  *result = cblas_ddot(n, x, 1, y, 1);
+  return status::kOk;
+}
+
+StatusCode VecSubReal(const double* a, const double* b, int32_t n, double* out) {
+  if (n < 1) return status::kBadSize;
+  for (int32_t i = 0; i < n; ++i) out[i] = a[i] - b[i];
+  return status::kOk;
+}
+
+StatusCode VecCopyReal(const double* src, int32_t n, double* dst) {
+  if (n < 1) return status::kBadSize;
+  std::memcpy(dst, src, static_cast<size_t>(n) * sizeof(double));
+  return status::kOk;
+}
+
+StatusCode VecZeroReal(double* x, int32_t n) {
+  if (n < 1) return status::kBadSize;
+  std::memset(x, 0, static_cast<size_t>(n) * sizeof(double));
+  return status::kOk;
+}
+
+// Sign-bit flip: +0.0 becomes -0.0 and a NaN keeps its payload.
+StatusCode VecNegateReal(double* x, int32_t n, double* out) {
+  if (n < 1) return status::kBadSize;
+  double* dst = out != nullptr ? out : x;
+  for (int32_t i = 0; i < n; ++i) dst[i] = FlipSign(x[i]);
+  return status::kOk;
+}
+
+// ---- finiteness screen ---------------------------------------------------------------
+
+int32_t HasNonFiniteReal(const double* x, int64_t n) {
+  for (int64_t i = 0; i < n; ++i) {
+    if (Rejected(x[i])) return 1;
+  }
+  return 0;
+}
+
+int32_t HasNonFiniteComplex(const Complex* x, int64_t n) {
+  for (int64_t i = 0; i < n; ++i) {
+    if (Rejected(x[i].real()) || Rejected(x[i].imag())) return 1;
+  }
+  return 0;
+}
+
+// ---- transposes ----------------------------------------------------------------------
+
+namespace {
+
+// out (n-by-m) = A^T, or A^H for complex A; out does not overlap A.
+template <typename T>
+void TransposeInto(const T* A, int32_t m, int32_t n, T* out) {
+  if constexpr (std::is_same_v<T, double>) {
+    // Column j of A (stride n) becomes row j of the result.
+    for (int32_t j = 0; j < n; ++j) lapack::Copy(m, A + j, n, out + int64_t{j} * m, 1);
+  } else {
+    // Row i of A becomes column i of the result (stride m), then every
+    // imaginary part has its sign bit flipped.
+    for (int32_t i = 0; i < m; ++i) lapack::Copy(n, A + int64_t{i} * n, 1, out + i, m);
+    const int64_t count = int64_t{m} * n;
+    for (int64_t e = 0; e < count; ++e) out[e].imag(FlipSign(out[e].imag()));
+  }
+}
+
+// The transpose in `out`, or back over A (through scratch) when out is null or
+// is A itself.
+template <typename T>
+StatusCode Transpose(T* A, int32_t m, int32_t n, T* out) {
+  if (m < 1 || n < 1) return status::kBadSize;
+  if (out != nullptr && out != A) {
+    TransposeInto(A, m, n, out);
+    return status::kOk;
+  }
+  const int64_t count = int64_t{m} * n;
+  void* raw = nullptr;
+  const StatusCode st = NumAlloc(&raw, static_cast<size_t>(count) * sizeof(T));
+  if (st != status::kOk) return st;
+  T* scratch = static_cast<T*>(raw);
+  TransposeInto(A, m, n, scratch);
+  std::memcpy(static_cast<void*>(A), scratch, static_cast<size_t>(count) * sizeof(T));
+  return MergeStatus(status::kOk, NumFree(raw));
+}
+
+}  // namespace
+
+StatusCode TransposeReal(double* A, int32_t m, int32_t n, double* out) {
+  return Transpose<double>(A, m, n, out);
+}
+
+StatusCode ConjTransposeComplex(Complex* A, int32_t m, int32_t n, Complex* out) {
+  return Transpose<Complex>(A, m, n, out);
+}
