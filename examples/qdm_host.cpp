@@ -1072,9 +1072,14 @@ Report Run(const Exports& e, RunInfo& run) {
         r.tables.push_back(ModeTable(amp, ph, nullptr, freq));
         modeFrequencies = freq.Reals();
       }
+      // As many peaks as the model can hold modes; half of them for real data,
+      // whose spectrum is listed for non-negative frequencies only.
       const size_t peaks = pcar ? static_cast<size_t>(std::max(k, 1)) : 6;
-      r.tables.push_back(PeakTable(s, !sig.complex, sig.complex ? peaks : (peaks + 1) / 2 + 2));
+      r.tables.push_back(PeakTable(s, !sig.complex, sig.complex ? peaks : (peaks + 1) / 2));
       WriteSpectrumCsv(s);
+      if (!o.noPlot && !(std::isfinite(f0) && std::isfinite(df)))
+        Fail(kExitOutput, "cannot plot a spectrum whose frequency grid is not finite (sampling "
+                          "rate " + FormatNumber(rate, false) + "); spectrum CSV is " + s.csv);
       if (!o.noPlot) {
         s.png = o.png;
         char title[512];
