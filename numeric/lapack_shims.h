@@ -44,6 +44,13 @@ inline void Gesdd(char jobz, lapack_int m, lapack_int n, Complex* a, lapack_int 
   LAPACK_zgesdd(&jobz, &m, &n, a, &lda, s, u, &ldu, vt, &ldvt, work, &lwork, rwork, iwork, info);
 }
 
+// Minimum-norm least squares by divide and conquer, column-major (real only).
+inline void Gelsd(lapack_int m, lapack_int n, lapack_int nrhs, double* a, lapack_int lda,
+                  double* b, lapack_int ldb, double* s, double rcond, lapack_int* rank,
+                  double* work, lapack_int lwork, lapack_int* iwork, lapack_int* info) {
+  LAPACK_dgelsd(&m, &n, &nrhs, a, &lda, b, &ldb, s, &rcond, rank, work, &lwork, iwork, info);
+}
+
 // The size a workspace query (LWORK = -1) left in WORK(1), truncated toward zero.
 inline int64_t QueriedWorkSize(double w) { return static_cast<int64_t>(w); }
 inline int64_t QueriedWorkSize(const Complex& w) { return static_cast<int64_t>(w.real()); }
