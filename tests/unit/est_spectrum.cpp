@@ -391,10 +391,11 @@ TEST(PowerSpectrumDrivers, ArgumentChecksInOrder) {
 // ---------------------------------------------------------------------------
 
 // Runs `call` with the k-th allocation failing, k = 1, 2, ... until a run
-// sees no failure; every run must end in success or kNoMemory and leave no
-// allocation behind.
+// sees no failure; no run may leave an allocation behind. Strict: every run
+// with a failure ends in kNoMemory. Otherwise success is allowed too: the
+// estimators deliberately proceed past a failed least-squares solve.
 template <typename F>
-void FaultSweep(const char* what, F call) {
+void FaultSweep(const char* what, F call, bool strict = true) {
   for (const bool persistent : {false, true}) {
     for (int64_t k = 1;; ++k) {
       ASSERT_LT(k, 1000) << what;
@@ -408,7 +409,9 @@ void FaultSweep(const char* what, F call) {
         EXPECT_EQ(st, 0) << what << ": no failure injected, k=" << k;
         break;
       }
-      EXPECT_EQ(st, status::kNoMemory) << what << " k=" << k << (persistent ? " persistent" : "");
+      if (strict || st != 0) {
+        EXPECT_EQ(st, status::kNoMemory) << what << " k=" << k << (persistent ? " persistent" : "");
+      }
     }
   }
 }
@@ -460,24 +463,24 @@ TEST(PowerSpectrumMemory, DriverAllocationFailuresAreReported) {
     SpectrumResult r{0, 0, values.data()};
     double v = 0;
     return CovPowerSpectrumReal(xr.data(), 48, 6, 100, 1.0, &r, &v);
-  });
+  }, false);
   FaultSweep("CovPowerSpectrumComplex", [&] {
     SpectrumResult r{0, 0, values.data()};
     double v = 0;
     return CovPowerSpectrumComplex(xc.data(), 48, 6, 100, 1.0, &r, &v);
-  });
+  }, false);
   FaultSweep("PcarPowerSpectrumReal", [&] {
     SpectrumResult r{0, 0, values.data()};
     double fit = 0;
     int32_t count = 0;
     return PcarPowerSpectrumReal(xr.data(), 48, 8, 4, 100, 1.0, 1, amp, ph, fr, &fit, &r, &count);
-  });
+  }, false);
   FaultSweep("PcarPowerSpectrumComplex", [&] {
     SpectrumResult r{0, 0, values.data()};
     double fit = 0;
     int32_t count = 0;
     return PcarPowerSpectrumComplex(xc.data(), 48, 8, 2, 100, 1.0, amp, ph, fr, &fit, &r, &count);
-  });
+  }, false);
 }
 
 // ---------------------------------------------------------------------------
