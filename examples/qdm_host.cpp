@@ -601,6 +601,7 @@ struct SpectrumOut {
   std::string csv, png;
 };
 struct Report {
+  std::vector<std::string> notes;  // printed under the tables (text output only)
   std::vector<Scalar> scalars;
   std::vector<Table> tables;
   SpectrumOut spectrum;
@@ -688,6 +689,7 @@ void PrintText(const RunInfo& run, const Report& r) {
       std::printf("\n");
     }
   }
+  for (const std::string& note : r.notes) std::printf("\nnote: %s\n", note.c_str());
   if (r.spectrum.present) {
     std::printf("\nspectrum written to %s", r.spectrum.csv.c_str());
     if (!r.spectrum.png.empty()) std::printf(", plot to %s", r.spectrum.png.c_str());
@@ -945,6 +947,12 @@ Report Run(const Exports& e, RunInfo& run) {
   const uint8_t flag = o.realSignal ? 1 : 0;
   auto param = [&](const char* name, double v) { run.parameters.push_back({name, v}); };
   Report r;
+
+  if (o.realSignal && (o.method == Method::kProny || o.method == Method::kPencil ||
+                       o.method == Method::kPcarSpectrum))
+    r.notes.push_back(
+        "with --real-signal each conjugate pair is reported once, at its non-negative "
+        "frequency, with the amplitude of that one exponential (half the sinusoid's)");
 
   switch (o.method) {
     case Method::kCovariance: {
