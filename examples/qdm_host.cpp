@@ -11,12 +11,17 @@
 // Exit status: 0 success, 1 bad input (usage, parameters, data file), 2 the
 // library returned a non-zero status, 3 an output file or the plot failed.
 // Every failure is reported as one line on stderr.
+#if defined(_WIN32)
+#include <windows.h>
+#undef LoadLibrary  // the name of this program's own loader below
+#else
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <spawn.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#endif
+#include <sys/stat.h>
 
 #include <algorithm>
 #include <charconv>
@@ -35,7 +40,9 @@
 #include "emuhost.h"
 #include "qdm.h"
 
+#if !defined(_WIN32)
 extern char** environ;
+#endif
 
 namespace {
 
@@ -114,19 +121,56 @@ struct Exports {
   decltype(&QdmCxPCARPowerSpectrumH) cxPcarSpectrum;
 };
 
+// The platform's module loader: dlopen/dlsym, or LoadLibraryA/GetProcAddress.
+void* OpenModule(const std::string& path, std::string* why) {
+#if defined(_WIN32)
+  void* module = reinterpret_cast<void*>(LoadLibraryA(path.c_str()));
+  if (module == nullptr) *why = path + ": error " + std::to_string(GetLastError());
+#else
+  void* module = dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
+  if (module == nullptr) {
+    const char* message = dlerror();
+    *why = message ? message : path;
+  }
+#endif
+  return module;
+}
+
+void* ModuleSymbol(void* module, const char* name) {
+#if defined(_WIN32)
+  return reinterpret_cast<void*>(GetProcAddress(static_cast<HMODULE>(module), name));
+#else
+  return dlsym(module, name);
+#endif
+}
+
+// The already loaded module that holds `address`, or null.
+void* ModuleOf(void* address) {
+#if defined(_WIN32)
+  HMODULE module = nullptr;
+  if (!GetModuleHandleExA(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
+                              GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
+                          static_cast<LPCSTR>(address), &module))
+    return nullptr;
+  return reinterpret_cast<void*>(module);
+#else
+  Dl_info info{};
+  if (dladdr(address, &info) == 0 || info.dli_fname == nullptr) return nullptr;
+  return dlopen(info.dli_fname, RTLD_LAZY | RTLD_NOLOAD);
+#endif
+}
+
 template <typename F>
 void Bind(void* library, const std::string& path, const char* name, F* slot) {
-  void* address = dlsym(library, name);
+  void* address = ModuleSymbol(library, name);
   if (address == nullptr) Fail(kExitInput, path + " does not export " + name);
   *slot = reinterpret_cast<F>(address);
 }
 
 Exports LoadLibrary(const std::string& path) {
-  void* library = dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
-  if (library == nullptr) {
-    const char* why = dlerror();
-    Fail(kExitInput, "cannot load the library: " + std::string(why ? why : path));
-  }
+  std::string why;
+  void* library = OpenModule(path, &why);
+  if (library == nullptr) Fail(kExitInput, "cannot load the library: " + why);
   Exports e{};
   Bind(library, path, "SetGFRTModule", &e.setModule);
   Bind(library, path, "QdmReCovarianceH", &e.reCovariance);
@@ -146,12 +190,8 @@ Exports LoadLibrary(const std::string& path) {
 
   // Name the run-time module explicitly, as a host embedding the library
   // would: the module that holds our NumericArrayResize.
-  Dl_info info{};
-  if (dladdr(reinterpret_cast<void*>(&NumericArrayResize), &info) != 0 &&
-      info.dli_fname != nullptr) {
-    void* runtime = dlopen(info.dli_fname, RTLD_LAZY | RTLD_NOLOAD);
-    if (runtime != nullptr) e.setModule(runtime);
-  }
+  if (void* runtime = ModuleOf(reinterpret_cast<void*>(&NumericArrayResize)))
+    e.setModule(runtime);
   return e;
 }
 
@@ -829,15 +869,28 @@ void WriteSpectrumCsv(const SpectrumOut& s) {
 }
 
 std::string FindOnPath(const char* program) {
+#if defined(_WIN32)
+  constexpr char kSeparator = ';';
+  const std::string file = std::string("\\") + program + ".exe";
+#else
+  constexpr char kSeparator = ':';
+  const std::string file = std::string("/") + program;
+#endif
   const char* path = std::getenv("PATH");
   std::string dirs = path ? path : "/usr/bin:/bin";
   size_t start = 0;
   for (;;) {
-    const size_t colon = dirs.find(':', start);
+    const size_t colon = dirs.find(kSeparator, start);
     std::string dir = dirs.substr(start, colon - start);
     if (dir.empty()) dir = ".";
-    const std::string candidate = dir + "/" + program;
+    const std::string candidate = dir + file;
+#if defined(_WIN32)
+    const DWORD attributes = GetFileAttributesA(candidate.c_str());
+    if (attributes != INVALID_FILE_ATTRIBUTES && !(attributes & FILE_ATTRIBUTE_DIRECTORY))
+      return candidate;
+#else
     if (access(candidate.c_str(), X_OK) == 0) return candidate;
+#endif
     if (colon == std::string::npos) return "";
     start = colon + 1;
   }
@@ -900,6 +953,26 @@ void PlotSpectrum(const SpectrumOut& s, const std::string& title,
     script += ", NaN with lines dt 2 lw 1.5 lc rgb '#c0392b' title 'PCAR modes'";
   script += "\n";
 
+#if defined(_WIN32)
+  // gnuplot runs through the command interpreter, its output going to a log.
+  char tempDir[MAX_PATH + 1], scriptPath[MAX_PATH + 1], logPath[MAX_PATH + 1];
+  const DWORD dirLength = GetTempPathA(sizeof tempDir, tempDir);
+  if (dirLength == 0 || dirLength > MAX_PATH ||
+      GetTempFileNameA(tempDir, "qdp", 0, scriptPath) == 0 ||
+      GetTempFileNameA(tempDir, "qdl", 0, logPath) == 0)
+    Fail(kExitOutput, "cannot create a temporary file for gnuplot");
+  bool written = false;
+  {
+    std::ofstream out(scriptPath, std::ios::binary);
+    written =
+        static_cast<bool>(out.write(script.data(), static_cast<std::streamsize>(script.size())));
+  }
+  const std::string command =
+      "\"\"" + gnuplot + "\" \"" + scriptPath + "\" >\"" + logPath + "\" 2>&1\"";
+  const int exitCode = written ? std::system(command.c_str()) : -1;
+  const bool spawned = exitCode != -1;
+  const bool succeeded = exitCode == 0;
+#else
   char scriptPath[] = "/tmp/qdm_example_plot_XXXXXX";
   const int scriptFd = mkstemp(scriptPath);
   char logPath[] = "/tmp/qdm_example_log_XXXXXX";
@@ -921,6 +994,8 @@ void PlotSpectrum(const SpectrumOut& s, const std::string& title,
   int wstatus = 0;
   if (spawned == 0) waitpid(pid, &wstatus, 0);
   close(logFd);
+  const bool succeeded = spawned == 0 && WIFEXITED(wstatus) && WEXITSTATUS(wstatus) == 0;
+#endif
 
   std::string firstLine;
   std::ifstream log(logPath);
@@ -929,10 +1004,15 @@ void PlotSpectrum(const SpectrumOut& s, const std::string& title,
       firstLine = Trim(line);
       break;
     }
-  unlink(scriptPath);
-  unlink(logPath);
+  log.close();
+  std::remove(scriptPath);
+  std::remove(logPath);
+#if defined(_WIN32)
+  if (!spawned) Fail(kExitOutput, "cannot run gnuplot");
+#else
   if (spawned != 0) Fail(kExitOutput, "cannot run gnuplot");
-  if (!WIFEXITED(wstatus) || WEXITSTATUS(wstatus) != 0)
+#endif
+  if (!succeeded)
     Fail(kExitOutput, "gnuplot failed drawing " + s.png +
                           (firstLine.empty() ? std::string() : ": " + firstLine));
 }

@@ -6,9 +6,11 @@
 # tests; run with `cmake -P` it is the checker each test runs.
 
 if(CMAKE_SCRIPT_MODE_FILE)
-  # ---- checker: EXE, ARGS ('|'-separated), MODE (fail | json), EXPECT --------
+  # ---- checker: EXE, ARGS ('|'-separated), MODE (fail | json), EXPECT, and
+  # EMULATOR ('|'-separated; the cross-compiling emulator, e.g. wine) ---------
   string(REPLACE "|" ";" args "${ARGS}")
-  execute_process(COMMAND ${EXE} ${args} RESULT_VARIABLE rc OUTPUT_VARIABLE out
+  string(REPLACE "|" ";" emulator "${EMULATOR}")
+  execute_process(COMMAND ${emulator} ${EXE} ${args} RESULT_VARIABLE rc OUTPUT_VARIABLE out
                   ERROR_VARIABLE err)
   if(NOT rc MATCHES "^[0-9]+$")
     message(FATAL_ERROR "qdm_example did not exit normally: ${rc}\n${err}")
@@ -79,20 +81,21 @@ file(WRITE ${_ex_data}/three_columns.csv "1,2,3\n4,5,6\n")
 file(WRITE ${_ex_data}/empty_field.csv "1.0,2.0\n3.0,\n")
 file(WRITE ${_ex_data}/empty.csv "# no samples\n")
 set(_ex_marple ${CMAKE_SOURCE_DIR}/tests/data/marple64.csv)
+string(REPLACE ";" "|" _ex_emulator "${CMAKE_CROSSCOMPILING_EMULATOR}")
 
 # qdm_example_fails(name regex args...): non-zero exit, one stderr line matching regex.
 function(qdm_example_fails name regex)
   string(REPLACE ";" "|" joined "${ARGN}")
   add_test(NAME example.${name}
            COMMAND ${CMAKE_COMMAND} -DEXE=$<TARGET_FILE:qdm_example> "-DARGS=${joined}"
-                   -DMODE=fail "-DEXPECT=${regex}" -P ${CMAKE_CURRENT_LIST_FILE})
+                   "-DEMULATOR=${_ex_emulator}" -DMODE=fail "-DEXPECT=${regex}" -P ${CMAKE_CURRENT_LIST_FILE})
 endfunction()
 # qdm_example_json(name checks args...): exit 0, JSON with status 0 and the checks.
 function(qdm_example_json name checks)
   string(REPLACE ";" "|" joined "${ARGN}")
   add_test(NAME example.${name}
            COMMAND ${CMAKE_COMMAND} -DEXE=$<TARGET_FILE:qdm_example> "-DARGS=${joined}"
-                   -DMODE=json "-DEXPECT=${checks}" -P ${CMAKE_CURRENT_LIST_FILE})
+                   "-DEMULATOR=${_ex_emulator}" -DMODE=json "-DEXPECT=${checks}" -P ${CMAKE_CURRENT_LIST_FILE})
 endfunction()
 
 # Bad command lines.
