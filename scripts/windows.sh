@@ -28,8 +28,9 @@ quiet() {  # runs a command, showing its output only when it fails
 }
 
 # ---- 1. packages ----------------------------------------------------------------------
-scripts/deps.sh cmake make g++-mingw-w64-x86-64 gfortran-mingw-w64-x86-64 wine64 \
-  googletest dpkg-dev xz-utils || die "package installation"
+scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
+  g++-mingw-w64-x86-64 gfortran-mingw-w64-x86-64 wine64 googletest dpkg-dev xz-utils ||
+  die "package installation"
 
 # `apt-get source lapack` needs a deb-src entry: the binary sources, retyped.
 lapack_version() {
@@ -112,9 +113,18 @@ timeout 120 "$wine" cmd /c exit 0 >/dev/null 2>&1 || die "wine does not start"
 timeout 120 "$wine" rundll32 user32.dll,MessageBeep >/dev/null 2>&1
 
 # ---- 4. cross-build -------------------------------------------------------------------
+# The Linux example host is the reference the Windows results are compared
+# with; scripts/test.sh has built it already in build/release.
+linux=$root/build/release
+if [ ! -x "$linux/examples/qdm_example" ]; then
+  say "building the Linux example host for the comparison (build/release)"
+  quiet cmake -S "$root" -B "$linux" -DCMAKE_BUILD_TYPE=Release || die "Linux configure"
+  quiet cmake --build "$linux" --target qdm_example -j"$jobs" || die "Linux example host"
+fi
 say "configuring and building (build/windows)"
 quiet cmake -S "$root" -B "$build" -DCMAKE_TOOLCHAIN_FILE="$toolchain" -DQDM_WIN_DEPS="$deps" \
-  -DCMAKE_BUILD_TYPE=Release "-DCMAKE_CROSSCOMPILING_EMULATOR=$emulator" || die "configure"
+  -DCMAKE_BUILD_TYPE=Release "-DCMAKE_CROSSCOMPILING_EMULATOR=$emulator" \
+  -DQDM_LINUX_EXAMPLE="$linux/examples/qdm_example" || die "configure"
 if ! cmake --build "$build" -j"$jobs" >/dev/null 2>&1; then
   cmake --build "$build" -j1 2>&1 | grep -v '^\[' | tail -n 40
   die "build"
