@@ -1,0 +1,106 @@
+// The plan record, its per-factor stage records and the kernel entry points
+// they select. Shared between the plan list, the drivers and the kernels.
+//
+// Kernel legend: re/im are separate real and imaginary sequences, strides are
+// counted in doubles (interleaved complex data is base, base + 1, stride 2);
+// `is`/`os` input/output stride, `c` repeat count, `m` butterfly count,
+// `twCos`/`twSin` the stage's twiddle table (cosine, negated sine).
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include "fft/fft.h"
+#include "numeric/types.h"
+
+constexpr int kFftMaxFactors = 20;
+constexpr int kFftMaxRadix = 43;  // kernel tables are indexed 0..kFftMaxRadix
+
+// Factor kinds.
+constexpr int32_t kFftKindKernel = 0;  // specialised straight-line kernel
+constexpr int32_t kFftKindGeneric = 1;  // generic odd prime below 50
+constexpr int32_t kFftKindRader = 2;   // prime of 50 or more, by Rader's method
+
+// for t = 0..c-1: DFT of inputs (t*is + q*c*is), q = 0..r-1, to outputs (t*r + q)*os.
+using FftComplexLeafFn = void (*)(const double* inRe, const double* inIm, double* outRe,
+                                  double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);
+// In place, for k = 0..m-1 on legs (k + j*m)*os: twiddle legs j >= 1 of
+// butterflies k >= 1 by entry (k-1)*(r-1) + (j-1), then a DFT of size r.
+using FftComplexTwiddleFn = void (*)(double* re, double* im, const double* twCos,
+                                     const double* twSin, ptrdiff_t os, ptrdiff_t m);
+// Real-input DFTs of size r written in packed half-complex order.
+using FftRealLeafFn = void (*)(const double* in, double* out, ptrdiff_t is, ptrdiff_t os,
+                               ptrdiff_t c);
+// Combining pass over r packed half-complex sub-transforms of length m.
+using FftRealTwiddleFn = void (*)(double* data, const double* twCos, const double* twSin,
+                                  ptrdiff_t os, ptrdiff_t m);
+
+// One stage per factor, zero-filled at creation.
+struct FftStage {
+  double* primeCos;  // kind 1: cos(2 pi k/r), k = 0..r-1
+  double* primeSin;  // kind 1: -sin(2 pi k/r)
+  double* twCos;     // all but the last stage: (r-1)*(m-1) twiddles
+  double* twSin;
+  FftPlan* raderPlan;  // kind 2: plan of length r-1
+  double* raderKernelRe;  // kind 2: transformed convolution kernel, r-1 values
+  double* raderKernelIm;
+  int32_t* raderIndex;         // kind 2: 0, 1, g^(r-2), ..., g (mod r)
+  int32_t* raderInverseIndex;  // kind 2: 0, 1, g, ..., g^(r-2) (mod r)
+};
+
+struct FftPlan {
+  int32_t n;
+  int32_t refCount;
+  int32_t factor[kFftMaxFactors];
+  int32_t kind[kFftMaxFactors];
+  int32_t factorCount;
+  FftStage* stage[kFftMaxFactors];
+  FftRealLeafFn realLeaf[kFftMaxFactors];
+  FftRealTwiddleFn realTwiddle[kFftMaxFactors];
+  FftComplexLeafFn complexLeaf[kFftMaxFactors];
+  FftComplexTwiddleFn complexTwiddle[kFftMaxFactors];
+  FftPlan* prev;
+  FftPlan* next;
+};
+
+// Generated radix-indexed kernel tables (fft/kernels/kernel_table.cpp); null
+// entries for radices without a specialised kernel.
+extern const FftComplexLeafFn kFftComplexLeaf[kFftMaxRadix + 1];
+extern const FftComplexTwiddleFn kFftComplexTwiddle[kFftMaxRadix + 1];
+extern const FftRealLeafFn kFftRealLeaf[kFftMaxRadix + 1];
+extern const FftRealTwiddleFn kFftRealTwiddle[kFftMaxRadix + 1];
+
+// Plan list internals: the caller already holds the plan mutex.
+FftPlan* FftPlanAcquireLocked(int32_t n);
+void FftPlanReleaseLocked(FftPlan* plan);
+
+// Factorisation of n (n >= 2) into ascending factors with their kinds; returns
+// the factor count (0 for n = 1).
+int32_t FftFactorize(int32_t n, int32_t* factor, int32_t* kind);
+
+// ---- generic odd-prime and Rader passes (fft/prime_kernels.cpp) ---------------
+// Leaf forms: c transforms as FftComplexLeafFn / FftRealLeafFn. Combining forms:
+// in place as FftComplexTwiddleFn / FftRealTwiddleFn. -20001 when the per-call
+// scratch cannot be allocated.
+[[nodiscard]] StatusCode FftGenericLeafComplex(const FftStage* st, int32_t r, const double* inRe,
+                                               const double* inIm, double* outRe, double* outIm,
+                                               ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);
+[[nodiscard]] StatusCode FftGenericTwiddleComplex(const FftStage* st, int32_t r, double* re,
+                                                  double* im, const double* twCos,
+                                                  const double* twSin, ptrdiff_t os, ptrdiff_t m);
+[[nodiscard]] StatusCode FftGenericLeafReal(const FftStage* st, int32_t r, const double* in,
+                                            double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);
+[[nodiscard]] StatusCode FftGenericTwiddleReal(const FftStage* st, int32_t r, double* data,
+                                               const double* twCos, const double* twSin,
+                                               ptrdiff_t os, ptrdiff_t m);
+[[nodiscard]] StatusCode FftRaderLeafComplex(const FftStage* st, int32_t r, const double* inRe,
+                                             const double* inIm, double* outRe, double* outIm,
+                                             ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);
+[[nodiscard]] StatusCode FftRaderTwiddleComplex(const FftStage* st, int32_t r, double* re,
+                                                double* im, const double* twCos,
+                                                const double* twSin, ptrdiff_t os, ptrdiff_t m);
+[[nodiscard]] StatusCode FftRaderLeafReal(const FftStage* st, int32_t r, const double* in,
+                                          double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);
+[[nodiscard]] StatusCode FftRaderTwiddleReal(const FftStage* st, int32_t r, double* data,
+                                             const double* twCos, const double* twSin,
+                                             ptrdiff_t os, ptrdiff_t m);

@@ -1,0 +1,477 @@
+#!/usr/bin/env python3
+"""Writes the straight-line FFT kernels of fft/kernels/.
+
+One file per radix (radix_02.cpp ... radix_43.cpp) with the four kernel forms
+(complex leaf, complex combining pass, real leaf, real combining pass), plus
+kernels.h (declarations) and kernel_table.cpp (the radix-indexed tables).
+
+The output is byte-reproducible (no dates, stable formatting) so that the
+committed files can be checked for drift:
+
+    python3 tools/gen_fft_kernels.py --out fft/kernels
+
+Constants are computed with 60-digit decimal arithmetic and printed with 21
+significant digits. Standard library only.
+"""
+
+import argparse
+import decimal
+import math
+import os
+import sys
+
+# The radices with a specialised kernel; everything else in the engine derives
+# from this list.
+RADICES = [2, 3, 4, 5, 7, 8, 9, 10, 11, 13, 14, 16, 17, 18, 19, 29, 31, 32, 37, 41, 43]
+MAX_RADIX = 43
+
+# Composite radices as (n1, n2): n2 inner DFTs of size n1 over inputs n2*j1 + j2,
+# twiddled by W_n^(j2*k1), then n1 DFTs of size n2 (decimation in time).
+SPLITS = {4: (2, 2), 8: (2, 4), 9: (3, 3), 10: (2, 5), 14: (2, 7), 16: (4, 4),
+          18: (2, 9), 32: (4, 8)}
+
+# ---- high-precision constants ------------------------------------------------------
+D = decimal.Decimal
+CTX = decimal.Context(prec=60)
+PI = D("3.14159265358979323846264338327950288419716939937510582097494459230781640628620899")
+
+
+def _taylor(x, first):
+    """Sum of the cos (first=0) or sin (first=1) Taylor series at x."""
+    term = D(1) if first == 0 else x
+    total = term
+    k = first
+    x2 = CTX.multiply(x, x)
+    while True:
+        term = CTX.divide(CTX.multiply(-term, x2), D((k + 1) * (k + 2)))
+        k += 2
+        if term.copy_abs() < D("1e-70"):
+            return total
+        total = CTX.add(total, term)
+
+
+def cos2pi(a, b):
+    """cos(2*pi*a/b) to about 55 digits."""
+    a %= b
+    return _taylor(CTX.divide(CTX.multiply(2 * PI, D(a)), D(b)), 0)
+
+
+def sin2pi(a, b):
+    a %= b
+    return _taylor(CTX.divide(CTX.multiply(2 * PI, D(a)), D(b)), 1)
+
+
+def fmt(value):
+    """A positive constant with 21 significant digits."""
+    v = decimal.Context(prec=21).plus(D(value))
+    text = format(v, "f")
+    if "." in text:
+        text = text.rstrip("0").rstrip(".")
+    if "." not in text and "e" not in text:
+        text += ".0"
+    return text
+
+
+SQRT_HALF = decimal.Context(prec=60).sqrt(D("0.5"))
+
+# ---- straight-line code builder ------------------------------------------------------
+# A value is None (known zero) or (name, negated). Statements are linear
+# combinations with constant coefficients, emitted in order; dead ones are
+# dropped at the end.
+
+
+class Block:
+    def __init__(self):
+        self.stmts = []  # (name, expression, deps)
+        self.count = 0
+        self.adds = 0
+        self.muls = 0
+
+    def emit(self, expr, deps, prefix="t"):
+        name = "%s%d" % (prefix, self.count)
+        self.count += 1
+        self.stmts.append((name, expr, tuple(deps)))
+        return (name, False)
+
+    def load(self, expr):
+        return self.emit(expr, ())
+
+    def lin(self, terms):
+        """Sum of coefficient * value, left to right; coefficients are Decimal or int."""
+        items = []
+        for coef, val in terms:
+            if val is None or coef == 0:
+                continue
+            name, neg = val
+            c = D(coef)
+            if neg:
+                c = -c
+            items.append((c, name))
+        if not items:
+            return None
+        if len(items) == 1 and items[0][0].copy_abs() == 1:
+            return (items[0][1], items[0][0] < 0)
+        negate = False
+        if items[0][0] < 0:
+            if len(items) > 1 and items[1][0] > 0:
+                items[0], items[1] = items[1], items[0]  # -a + b == b - a exactly
+            else:
+                items = [(-c, n) for c, n in items]   # -(a + b ...) exactly
+                negate = True
+        parts = []
+        for i, (c, name) in enumerate(items):
+            mag = c.copy_abs()
+            term = name if mag == 1 else "%s * %s" % (fmt(mag), name)
+            if i == 0:
+                parts.append(term)
+            else:
+                parts.append(("- " if c < 0 else "+ ") + term)
+        name, _ = self.emit(" ".join(parts), [n for _, n in items])
+        return (name, negate)
+
+    def raw(self, expr, deps):
+        return self.emit(expr, deps)
+
+    def render(self, stores, indent="  "):
+        """Live statements and the stores [(lvalue, value)] as C++ lines."""
+        live = set()
+        for _, val in stores:
+            if val is not None:
+                live.add(val[0])
+        kept = []
+        for name, expr, deps in reversed(self.stmts):
+            if name in live:
+                kept.append((name, expr))
+                live.update(deps)
+        kept.reverse()
+        ops = [0, 0]
+        lines = []
+        for name, expr in kept:
+            lines.append("%sconst double %s = %s;" % (indent, name, expr))
+            if "[" in expr:
+                continue  # a load
+            ops[0] += expr.count(" + ") + expr.count(" - ")
+            ops[1] += expr.count(" * ")
+        for lvalue, val in stores:
+            if val is None:
+                lines.append("%s%s = 0.0;" % (indent, lvalue))
+            else:
+                lines.append("%s%s = %s%s;" % (indent, lvalue, "-" if val[1] else "", val[0]))
+        return lines, ops
+
+
+def neg(v):
+    return None if v is None else (v[0], not v[1])
+
+
+def add(b, x, y):
+    return b.lin([(1, x), (1, y)])
+
+
+def sub(b, x, y):
+    return b.lin([(1, x), (-1, y)])
+
+
+def twiddle_const(b, v, e, n):
+    """v * exp(-2 pi i e/n), with the trivial angles done by sign and swap."""
+    re, im = v
+    e %= n
+    if e == 0:
+        return v
+    g = math.gcd(e, n)
+    a, d = e // g, n // g
+    if d == 2:
+        return (neg(re), neg(im))
+    if d == 4:
+        return (im, neg(re)) if a == 1 else (neg(im), re)
+    if d == 8:
+        c = SQRT_HALF
+        if a == 1:
+            return (b.lin([(c, add(b, re, im))]), b.lin([(c, sub(b, im, re))]))
+        if a == 3:
+            return (b.lin([(c, sub(b, im, re))]), b.lin([(-c, add(b, re, im))]))
+        if a == 5:
+            return (b.lin([(-c, add(b, re, im))]), b.lin([(c, sub(b, re, im))]))
+        return (b.lin([(c, sub(b, re, im))]), b.lin([(c, add(b, re, im))]))
+    cs, sn = cos2pi(a, d), sin2pi(a, d)
+    return (b.lin([(cs, re), (sn, im)]), b.lin([(cs, im), (-sn, re)]))
+
+
+def is_prime(n):
+    return n > 1 and all(n % d for d in range(2, int(n ** 0.5) + 1))
+
+
+def dft(b, xs):
+    """Forward DFT of the complex values xs (list of (re, im))."""
+    n = len(xs)
+    if n == 1:
+        return list(xs)
+    if n == 2:
+        (ar, ai), (br, bi) = xs
+        return [(add(b, ar, br), add(b, ai, bi)), (sub(b, ar, br), sub(b, ai, bi))]
+    if n == 3:
+        # X0 = x0 + s; t = X0 - 1.5 s (from X0, not from x0); c = sin(2 pi/3).
+        (x0r, x0i), (x1r, x1i), (x2r, x2i) = xs
+        sr, si = add(b, x1r, x2r), add(b, x1i, x2i)
+        dr, di = sub(b, x1r, x2r), sub(b, x1i, x2i)
+        X0r, X0i = add(b, x0r, sr), add(b, x0i, si)
+        tr = b.lin([(1, X0r), (D("-1.5"), sr)])
+        ti = b.lin([(1, X0i), (D("-1.5"), si)])
+        c = sin2pi(1, 3)
+        return [(X0r, X0i),
+                (b.lin([(1, tr), (c, di)]), b.lin([(1, ti), (-c, dr)])),
+                (b.lin([(1, tr), (-c, di)]), b.lin([(1, ti), (c, dr)]))]
+    if is_prime(n):
+        # Symmetric pairs: s_j = x_j + x_(n-j), d_j = x_j - x_(n-j).
+        h = (n - 1) // 2
+        x0r, x0i = xs[0]
+        s = [None] + [(add(b, xs[j][0], xs[n - j][0]), add(b, xs[j][1], xs[n - j][1]))
+                      for j in range(1, h + 1)]
+        d = [None] + [(sub(b, xs[j][0], xs[n - j][0]), sub(b, xs[j][1], xs[n - j][1]))
+                      for j in range(1, h + 1)]
+        out = [None] * n
+        out[0] = (b.lin([(1, x0r)] + [(1, s[j][0]) for j in range(1, h + 1)]),
+                  b.lin([(1, x0i)] + [(1, s[j][1]) for j in range(1, h + 1)]))
+        for q in range(1, h + 1):
+            cs = [cos2pi(j * q, n) for j in range(h + 1)]
+            sn = [sin2pi(j * q, n) for j in range(h + 1)]
+            ar = b.lin([(1, x0r)] + [(cs[j], s[j][0]) for j in range(1, h + 1)])
+            ai = b.lin([(1, x0i)] + [(cs[j], s[j][1]) for j in range(1, h + 1)])
+            br = b.lin([(sn[j], d[j][1]) for j in range(1, h + 1)])
+            bi = b.lin([(sn[j], d[j][0]) for j in range(1, h + 1)])
+            out[q] = (add(b, ar, br), sub(b, ai, bi))
+            out[n - q] = (sub(b, ar, br), add(b, ai, bi))
+        return out
+    n1, n2 = SPLITS[n]
+    inner = [dft(b, [xs[n2 * j1 + j2] for j1 in range(n1)]) for j2 in range(n2)]
+    out = [None] * n
+    for k1 in range(n1):
+        col = [twiddle_const(b, inner[j2][k1], j2 * k1, n) for j2 in range(n2)]
+        res = dft(b, col)
+        for k2 in range(n2):
+            out[k1 + n1 * k2] = res[k2]
+    return out
+
+
+# ---- the per-radix source ------------------------------------------------------------
+def idx(base, q, stride):
+    return "%s[%s]" % (base, "0" if q == 0 else ("%s" % stride if q == 1 else "%d * %s" % (q, stride)))
+
+
+def complex_core(r):
+    b = Block()
+    xs = [(b.load(idx("xr", q, "is")), b.load(idx("xi", q, "is"))) for q in range(r)]
+    ys = dft(b, xs)
+    stores = []
+    for q in range(r):
+        stores.append((idx("yr", q, "os"), ys[q][0]))
+        stores.append((idx("yi", q, "os"), ys[q][1]))
+    return b.render(stores)
+
+
+def twiddle_loads(b, re_base, im_base, r):
+    """Legs j at base[j*s]; legs j >= 1 multiplied by (wc[j-1] + i ws[j-1])."""
+    xs = []
+    for j in range(r):
+        xr, xi = b.load(idx(re_base, j, "s")), b.load(idx(im_base, j, "s"))
+        if j > 0:
+            c, s = b.load("wc[%d]" % (j - 1)), b.load("ws[%d]" % (j - 1))
+            xr, xi = (b.raw("%s * %s - %s * %s" % (xr[0], c[0], xi[0], s[0]), [xr[0], xi[0], c[0], s[0]]),
+                      b.raw("%s * %s + %s * %s" % (xi[0], c[0], xr[0], s[0]), [xr[0], xi[0], c[0], s[0]]))
+        xs.append((xr, xi))
+    return xs
+
+
+def complex_twiddle_core(r):
+    b = Block()
+    ys = dft(b, twiddle_loads(b, "re", "im", r))
+    stores = []
+    for q in range(r):
+        stores.append((idx("re", q, "s"), ys[q][0]))
+        stores.append((idx("im", q, "s"), ys[q][1]))
+    return b.render(stores)
+
+
+def real_core(r):
+    b = Block()
+    xs = [(b.load(idx("x", q, "is")), None) for q in range(r)]
+    ys = dft(b, xs)
+    stores = [(idx("y", 0, "os"), ys[0][0])]
+    for q in range(1, r // 2 + 1):
+        stores.append((idx("y", q, "os"), ys[q][0]))
+    for q in range(1, (r - 1) // 2 + 1):
+        stores.append((idx("y", r - q, "os"), ys[q][1]))
+    return b.render(stores)
+
+
+def real_twiddle_core(r):
+    # Group k of the combining pass: Re Y_j[k] at a[j*s], Im Y_j[k] at b[j*s]
+    # (b = position m-k). X[k + m q] goes to a[q*s] / b[(r-1-q)*s] below the
+    # middle and, conjugated, to b[(r-1-q)*s] / a[q*s] above it.
+    b = Block()
+    ys = dft(b, twiddle_loads(b, "a", "b", r))
+    stores = []
+    for q in range(r):
+        if 2 * q < r:
+            stores.append((idx("a", q, "s"), ys[q][0]))
+            stores.append((idx("b", r - 1 - q, "s"), ys[q][1]))
+        else:
+            stores.append((idx("b", r - 1 - q, "s"), ys[q][0]))
+            stores.append((idx("a", q, "s"), neg(ys[q][1])))
+    return b.render(stores)
+
+
+def real_half_core(r):
+    # Group k = m/2 of an even m: real Y_j twiddled by exp(-i pi j/r).
+    b = Block()
+    xs = [twiddle_const(b, (b.load(idx("x", j, "s")), None), j, 2 * r) for j in range(r)]
+    ys = dft(b, xs)
+    stores = []
+    for q in range(r):
+        if 2 * q + 1 < r:
+            stores.append((idx("x", q, "s"), ys[q][0]))
+            stores.append((idx("x", r - 1 - q, "s"), ys[q][1]))
+        elif 2 * q + 1 == r:
+            stores.append((idx("x", q, "s"), ys[q][0]))
+    return b.render(stores)
+
+
+def banner(what):
+    return ["// Generated by tools/gen_fft_kernels.py%s. Do not edit; regenerate with" % what,
+            "//   python3 tools/gen_fft_kernels.py --out fft/kernels"]
+
+
+def radix_file(r):
+    rr = "%02d" % r
+    c_lines, c_ops = complex_core(r)
+    t_lines, t_ops = complex_twiddle_core(r)
+    r_lines, r_ops = real_core(r)
+    g_lines, g_ops = real_twiddle_core(r)
+    h_lines, h_ops = real_half_core(r)
+    out = banner(" --radix %d" % r)
+    out += [
+        "// Radix-%d DFT kernels. Operation counts (adds, muls): complex DFT %d, %d;" % (r, c_ops[0], c_ops[1]),
+        "// twiddled complex DFT %d, %d; real DFT %d, %d; real combining group %d, %d." % (
+            t_ops[0], t_ops[1], r_ops[0], r_ops[1], g_ops[0], g_ops[1]),
+        "// Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides",
+        "// in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;",
+        "// m butterfly count.",
+        "// clang-format off",
+        '#include "fft/kernels/kernels.h"',
+        "",
+        "namespace {",
+        "",
+        "inline void Dft%s(const double* xr, const double* xi, ptrdiff_t is, double* yr, double* yi," % rr,
+        "                 ptrdiff_t os) {",
+    ]
+    out += c_lines
+    out += ["}", "",
+            "inline void DftTw%s(double* re, double* im, ptrdiff_t s, const double* wc, const double* ws) {" % rr]
+    out += t_lines
+    out += ["}", "",
+            "inline void RealDft%s(const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {" % rr]
+    out += r_lines
+    out += ["}", "",
+            "inline void RealTw%s(double* a, double* b, ptrdiff_t s, const double* wc, const double* ws) {" % rr]
+    out += g_lines
+    out += ["}", "",
+            "inline void RealHalf%s(double* x, ptrdiff_t s) {" % rr]
+    out += h_lines
+    out += ["}", "", "}  // namespace", ""]
+    out += [
+        "void FftComplexLeaf%s(const double* inRe, const double* inIm, double* outRe, double* outIm," % rr,
+        "                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {",
+        "  const ptrdiff_t ls = c * is;",
+        "  for (ptrdiff_t t = 0; t < c; ++t) {",
+        "    Dft%s(inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r),
+        "  }",
+        "}",
+        "",
+        "void FftComplexTwiddle%s(double* re, double* im, const double* twCos, const double* twSin," % rr,
+        "                         ptrdiff_t os, ptrdiff_t m) {",
+        "  const ptrdiff_t s = m * os;",
+        "  Dft%s(re, im, s, re, im, s);" % rr,
+        "  for (ptrdiff_t k = 1; k < m; ++k) {",
+        "    DftTw%s(re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, r - 1, r - 1),
+        "  }",
+        "}",
+        "",
+        "void FftRealLeaf%s(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {" % rr,
+        "  const ptrdiff_t ls = c * is;",
+        "  for (ptrdiff_t t = 0; t < c; ++t) RealDft%s(in + t * is, ls, out + t * %d * os, os);" % (rr, r),
+        "}",
+        "",
+        "void FftRealTwiddle%s(double* data, const double* twCos, const double* twSin, ptrdiff_t os," % rr,
+        "                      ptrdiff_t m) {",
+        "  const ptrdiff_t s = m * os;",
+        "  RealDft%s(data, s, data, s);" % rr,
+        "  for (ptrdiff_t k = 1; 2 * k < m; ++k) {",
+        "    RealTw%s(data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (
+            rr, r - 1, r - 1),
+        "  }",
+        "  if (m % 2 == 0) RealHalf" + rr + "(data + (m / 2) * os, s);",
+        "}",
+        "// clang-format on",
+    ]
+    return "\n".join(out) + "\n"
+
+
+def header_file():
+    out = banner("")
+    out += ["// Declarations of the specialised kernels, four forms per radix.",
+            "#pragma once", "", "#include <cstddef>", "", '#include "fft/plan.h"', ""]
+    for r in RADICES:
+        rr = "%02d" % r
+        out += [
+            "void FftComplexLeaf%s(const double* inRe, const double* inIm, double* outRe, double* outIm," % rr,
+            "                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);",
+            "void FftComplexTwiddle%s(double* re, double* im, const double* twCos, const double* twSin," % rr,
+            "                         ptrdiff_t os, ptrdiff_t m);",
+            "void FftRealLeaf%s(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);" % rr,
+            "void FftRealTwiddle%s(double* data, const double* twCos, const double* twSin, ptrdiff_t os," % rr,
+            "                      ptrdiff_t m);",
+        ]
+    return "\n".join(out) + "\n"
+
+
+def table_file():
+    out = banner("")
+    out += ["// The radix-indexed kernel tables (null where a radix has no specialised kernel).",
+            '#include "fft/kernels/kernels.h"', ""]
+    for table, typ, fn in (("kFftComplexLeaf", "FftComplexLeafFn", "FftComplexLeaf"),
+                           ("kFftComplexTwiddle", "FftComplexTwiddleFn", "FftComplexTwiddle"),
+                           ("kFftRealLeaf", "FftRealLeafFn", "FftRealLeaf"),
+                           ("kFftRealTwiddle", "FftRealTwiddleFn", "FftRealTwiddle")):
+        out.append("const %s %s[kFftMaxRadix + 1] = {" % (typ, table))
+        for r in range(MAX_RADIX + 1):
+            out.append("    %s,  // %d" % ("%s%02d" % (fn, r) if r in RADICES else "nullptr", r))
+        out += ["};", ""]
+    return "\n".join(out)
+
+
+def write(path, text):
+    with open(path, "w", newline="\n") as f:
+        f.write(text)
+
+
+def main():
+    here = os.path.dirname(os.path.abspath(__file__))
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("--out", default=os.path.join(here, "..", "fft", "kernels"),
+                        help="output directory (default: fft/kernels)")
+    parser.add_argument("--radix", type=int, help="write only this radix's file to stdout")
+    args = parser.parse_args()
+    if args.radix is not None:
+        if args.radix not in RADICES:
+            sys.exit("no specialised kernel for radix %d" % args.radix)
+        sys.stdout.write(radix_file(args.radix))
+        return
+    os.makedirs(args.out, exist_ok=True)
+    for r in RADICES:
+        write(os.path.join(args.out, "radix_%02d.cpp" % r), radix_file(r))
+    write(os.path.join(args.out, "kernels.h"), header_file())
+    write(os.path.join(args.out, "kernel_table.cpp"), table_file())
+
+
+if __name__ == "__main__":
+    main()
