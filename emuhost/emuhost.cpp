@@ -2,7 +2,7 @@
 // elements, which start at byte 4 as in the host's own blocks, are 4 modulo 8.
 #include "emuhost.h"
 
-#include <atomic>
+#include <algorithm>
 #include <cstdlib>
 #include <cstring>
 #include <mutex>
@@ -30,12 +30,19 @@ Header* HeaderOf(QdmArrayBlock* block) {
   return reinterpret_cast<Header*>(reinterpret_cast<char*>(block) - sizeof(Header));
 }
 
-std::mutex g_fail_mutex;
+// Injected failures and the call log share one mutex, so that a log entry and
+// the call number it is filed under always agree, also under concurrent calls.
+struct ResizeEntry {
+  int32_t typeCode;
+  int32_t numDims;
+  size_t count;
+};
+constexpr int64_t kLogSize = 1024;
+std::mutex g_mutex;
 int32_t g_fail_skip = 0;
 int32_t g_fail_error = 0;
-std::atomic<int64_t> g_calls{0};
-std::atomic<int32_t> g_last_type{0}, g_last_dims{0};
-std::atomic<size_t> g_last_count{0};
+int64_t g_calls = 0;
+ResizeEntry g_log[kLogSize];
 
 QdmArrayBlock* AllocBlock(size_t count, size_t elementSize) {
   const size_t bytes = sizeof(Header) + 4 + count * elementSize;
@@ -46,28 +53,10 @@ QdmArrayBlock* AllocBlock(size_t count, size_t elementSize) {
   h->elementSize = elementSize;
   return reinterpret_cast<QdmArrayBlock*>(raw + sizeof(Header));
 }
-}  // namespace
 
-extern "C" {
-
-int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArrayHandle* handle,
-                           size_t count) {
-  g_calls.fetch_add(1);
-  g_last_type = typeCode;
-  g_last_dims = numDims;
-  g_last_count = count;
-  {
-    std::lock_guard<std::mutex> lock(g_fail_mutex);
-    if (g_fail_error != 0) {
-      if (g_fail_skip > 0) {
-        --g_fail_skip;
-      } else {
-        const int32_t e = g_fail_error;
-        g_fail_error = 0;
-        return e;
-      }
-    }
-  }
+// The resize itself, without the bookkeeping of the exported function (so that
+// handles made by the helpers below neither count nor use up an injected failure).
+int32_t Resize(int32_t typeCode, int32_t numDims, QdmArrayHandle* handle, size_t count) {
   if (typeCode != 10 && typeCode != 13) return 1;
   if (numDims != 1) return 1;
   const size_t es = ElementSize(typeCode);
@@ -87,17 +76,41 @@ int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArrayHandle* ha
   if (nb == nullptr) return 2;
   if (old != nullptr) {
     Header* oh = HeaderOf(old);
-    const size_t keep = (oh->capacity < count ? oh->capacity : count) * es;
-    std::memcpy(nb, old, 4 + (keep < oh->capacity * oh->elementSize ? keep : oh->capacity * oh->elementSize));
+    // Keep the count and the elements that fit; only a resize to the same
+    // element type keeps meaningful elements, as with the host's own resize.
+    const size_t keepBytes = std::min(oh->capacity * oh->elementSize, count * es);
+    std::memcpy(nb, old, 4 + keepBytes);
     std::free(oh);
   }
   **handle = nb;
   return 0;
 }
+}  // namespace
+
+extern "C" {
+
+int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArrayHandle* handle,
+                           size_t count) {
+  {
+    std::lock_guard<std::mutex> lock(g_mutex);
+    ++g_calls;
+    g_log[g_calls % kLogSize] = ResizeEntry{typeCode, numDims, count};
+    if (g_fail_error != 0) {
+      if (g_fail_skip > 0) {
+        --g_fail_skip;
+      } else {
+        const int32_t e = g_fail_error;
+        g_fail_error = 0;
+        return e;
+      }
+    }
+  }
+  return Resize(typeCode, numDims, handle, count);
+}
 
 QdmArrayHandle EmuMakeHandle(int32_t typeCode, int32_t count, const double* values) {
   QdmArrayHandle h = nullptr;
-  if (NumericArrayResize(typeCode, 1, &h, count < 0 ? 0 : static_cast<size_t>(count)) != 0)
+  if (Resize(typeCode, 1, &h, count < 0 ? 0 : static_cast<size_t>(count)) != 0)
     return nullptr;
   std::memcpy(*h, &count, 4);
   if (values != nullptr && count > 0)
@@ -127,17 +140,32 @@ void EmuRead(QdmArrayHandle handle, double* out, size_t doubles) {
 }
 
 void EmuFailResize(int32_t skip, int32_t error) {
-  std::lock_guard<std::mutex> lock(g_fail_mutex);
+  std::lock_guard<std::mutex> lock(g_mutex);
   g_fail_skip = skip;
   g_fail_error = error;
 }
 
-int64_t EmuResizeCalls(void) { return g_calls.load(); }
+int64_t EmuResizeCalls(void) {
+  std::lock_guard<std::mutex> lock(g_mutex);
+  return g_calls;
+}
 
 void EmuLastResize(int32_t* typeCode, int32_t* numDims, size_t* count) {
-  *typeCode = g_last_type;
-  *numDims = g_last_dims;
-  *count = g_last_count;
+  std::lock_guard<std::mutex> lock(g_mutex);
+  const ResizeEntry& e = g_log[g_calls % kLogSize];
+  *typeCode = e.typeCode;
+  *numDims = e.numDims;
+  *count = e.count;
+}
+
+int32_t EmuResizeAt(int64_t call, int32_t* typeCode, int32_t* numDims, size_t* count) {
+  std::lock_guard<std::mutex> lock(g_mutex);
+  if (call < 1 || call > g_calls || call <= g_calls - kLogSize) return 0;
+  const ResizeEntry& e = g_log[call % kLogSize];
+  *typeCode = e.typeCode;
+  *numDims = e.numDims;
+  *count = e.count;
+  return 1;
 }
 
 }  // extern "C"

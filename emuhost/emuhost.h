@@ -35,7 +35,8 @@ EMUHOST_API int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArr
 
 /* New handle of `count` elements of the type code, count field set, elements
  * copied from `values` (count doubles for type 10, 2*count for type 13; null
- * gives zeros). */
+ * gives zeros). Not a NumericArrayResize call: neither counted nor logged,
+ * and it never takes an injected failure. */
 EMUHOST_API QdmArrayHandle EmuMakeHandle(int32_t typeCode, int32_t count, const double* values);
 EMUHOST_API void EmuFreeHandle(QdmArrayHandle handle);
 /* The count field of the block. */
@@ -48,12 +49,17 @@ EMUHOST_API void* EmuElements(QdmArrayHandle handle);
  * are not 8-aligned). */
 EMUHOST_API void EmuRead(QdmArrayHandle handle, double* out, size_t doubles);
 
-/* The next resize (after `skip` successful ones) returns `error` instead of
- * resizing; 0 clears. */
+/* The next NumericArrayResize call (after `skip` further ones that succeed)
+ * returns `error` instead of resizing; error 0 clears. */
 EMUHOST_API void EmuFailResize(int32_t skip, int32_t error);
 /* Number of NumericArrayResize calls so far, and the arguments of the last one. */
 EMUHOST_API int64_t EmuResizeCalls(void);
 EMUHOST_API void EmuLastResize(int32_t* typeCode, int32_t* numDims, size_t* count);
+/* Arguments of resize call number `call` (1-based, as counted by
+ * EmuResizeCalls); the most recent 1024 calls are kept. Returns 0 if that call
+ * is no longer (or not yet) in the log. */
+EMUHOST_API int32_t EmuResizeAt(int64_t call, int32_t* typeCode, int32_t* numDims,
+                                size_t* count);
 
 #ifdef __cplusplus
 }

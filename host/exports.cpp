@@ -1,0 +1,352 @@
+// The fourteen analysis entry points. Each one only states its tables (checks
+// in order, outputs in resize order, out doubles) and its estimator call; the
+// sequence itself lives in entry_frame.cpp.
+#include <cstdint>
+
+#include "estimation/estimation.h"
+#include "host/entry_frame.h"
+#include "numeric/types.h"
+#include "qdm.h"
+
+using host::ArgCheck;
+using host::CountSource;
+using host::EntryCall;
+using host::EntrySpec;
+using host::OutDouble;
+using host::OutDoubleRole;
+using host::OutputArray;
+using host::ResizeFailure;
+
+namespace {
+
+constexpr int32_t kReal = QDM_TYPE_DOUBLE;
+constexpr int32_t kCx = QDM_TYPE_COMPLEX;
+
+// The sampling-rate test is the ordered comparison 0 >= rate, so a NaN rate
+// passes it and reaches the estimator.
+bool BadRate(double rate) { return 0.0 >= rate; }
+
+// Flags arrive as a pointer to one host byte; its value goes on zero-extended.
+int32_t FlagValue(const uint8_t* flag) { return static_cast<int32_t>(*flag); }
+
+// ---- Prony ------------------------------------------------------------------------------
+
+template <typename Estimate>
+int32_t PronyEntry(QdmArrayHandle data, int32_t type, int32_t p, double rate,
+                   QdmArrayHandle amp, QdmArrayHandle phase, QdmArrayHandle damp,
+                   QdmArrayHandle freq, ResizeFailure onResizeFailure,
+                   const Estimate& estimate) {
+  const int32_t n = host::BlockCount(data);
+  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
+                             {p <= 0, status::kBadCount},
+                             {p > MaxOrder(n), status::kBadCount},
+                             {BadRate(rate), status::kBadSampleRate}};
+  const OutputArray outputs[] = {{amp, kReal, p, CountSource::kModes},
+                                 {phase, kReal, p, CountSource::kModes},
+                                 {damp, kReal, p, CountSource::kModes},
+                                 {freq, kReal, p, CountSource::kModes}};
+  return host::RunEntry(EntrySpec{data, type, n, checks, outputs, {}, onResizeFailure}, estimate);
+}
+
+// ---- covariance AR and principal-component AR ----------------------------------------------
+// Both resize the p-element second output (poles or roots) first, then the p+1
+// coefficients.
+
+template <typename Estimate>
+int32_t ArEntry(QdmArrayHandle data, int32_t type, std::span<const ArgCheck> checks, int32_t p,
+                QdmArrayHandle coefficients, QdmArrayHandle second,
+                std::span<const OutDouble> outDoubles, const Estimate& estimate) {
+  const OutputArray outputs[] = {{second, kCx, p, CountSource::kLength},
+                                 {coefficients, type, p + 1, CountSource::kLength}};
+  return host::RunEntry(EntrySpec{data, type, host::BlockCount(data), checks, outputs,
+                                  outDoubles},
+                        estimate);
+}
+
+template <typename Estimate>
+int32_t CovarianceEntry(QdmArrayHandle data, int32_t type, int32_t p,
+                        QdmArrayHandle coefficients, QdmArrayHandle poles, double* variance,
+                        const Estimate& estimate) {
+  const int32_t n = host::BlockCount(data);
+  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
+                             {p <= 0, status::kBadCount},
+                             {p > MaxOrder(n), status::kBadCount}};
+  const OutDouble outDoubles[] = {{variance, OutDoubleRole::kEstimator}};
+  return ArEntry(data, type, checks, p, coefficients, poles, outDoubles, estimate);
+}
+
+template <typename Estimate>
+int32_t PcarEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t components,
+                  QdmArrayHandle coefficients, QdmArrayHandle roots, const Estimate& estimate) {
+  const int32_t n = host::BlockCount(data);
+  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
+                             {p < 0, status::kBadOrder},
+                             {p > MaxOrder(n), status::kBadOrder},
+                             {components <= 0, status::kBadCount},
+                             {components > p, status::kCountAboveOrder}};
+  return ArEntry(data, type, checks, p, coefficients, roots, {}, estimate);
+}
+
+// ---- matrix pencil --------------------------------------------------------------------------
+
+template <typename Estimate>
+int32_t PencilEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t M, double rate,
+                    QdmArrayHandle amp, QdmArrayHandle phase, QdmArrayHandle damp,
+                    QdmArrayHandle freq, double* mse, const Estimate& estimate) {
+  const int32_t n = host::BlockCount(data);
+  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
+                             {L < 0, status::kBadOrder},
+                             {L > MaxOrder(n), status::kBadOrder},
+                             {M <= 0, status::kBadCount},
+                             {M > L, status::kCountAboveOrder},
+                             {BadRate(rate), status::kBadSampleRate}};
+  const OutputArray outputs[] = {{amp, kReal, M, CountSource::kModes},
+                                 {phase, kReal, M, CountSource::kModes},
+                                 {damp, kReal, M, CountSource::kModes},
+                                 {freq, kReal, M, CountSource::kModes}};
+  const OutDouble outDoubles[] = {{mse, OutDoubleRole::kEstimator}};
+  return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles}, estimate);
+}
+
+// ---- MDL --------------------------------------------------------------------------------
+
+int32_t MdlEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t minOrder,
+                 int32_t* order, host::MdlEstimator estimate) {
+  const int32_t n = host::BlockCount(data);
+  const host::MdlCheck checks[] = {{n < 1, -42401},
+                                   {minOrder < 1, -42414},
+                                   {L <= minOrder, -42415},
+                                   {L > MaxOrder(n), -42415}};
+  return host::RunMdlEntry(data, type, n, checks, L, minOrder, order, estimate);
+}
+
+// ---- spectra ----------------------------------------------------------------------------
+// The spectrum has N = SpectrumLength(m) points. An m beyond 2^30 has no
+// 32-bit power of two above it and is reported like a spectrum size below 2.
+
+template <typename Estimate>
+int32_t CovSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t m, double rate,
+                         double* f0, double* df, QdmArrayHandle spectrum, double* variance,
+                         const Estimate& estimate) {
+  const int32_t n = host::BlockCount(data);
+  const int32_t N = SpectrumLength(m);
+  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
+                             {p < 0, status::kBadCount},
+                             {p > MaxOrder(n), status::kBadCount},
+                             {m <= 1 || N == 0, status::kBadSpectrumSize},
+                             {BadRate(rate), status::kBadSampleRate}};
+  const OutputArray outputs[] = {{spectrum, kReal, N, CountSource::kLength}};
+  const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
+                                  {df, OutDoubleRole::kSpectrumDf},
+                                  {variance, OutDoubleRole::kEstimator}};
+  return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles},
+                        [&](EntryCall& c) {
+                          c.spectrum.values = c.RealOutput(0);
+                          return estimate(c, N);
+                        });
+}
+
+template <typename Estimate>
+int32_t PcarSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t m, int32_t k,
+                          double rate, QdmArrayHandle amp, QdmArrayHandle phase,
+                          QdmArrayHandle freq, double* f0, double* df, QdmArrayHandle spectrum,
+                          double* fitError, ResizeFailure onResizeFailure,
+                          const Estimate& estimate) {
+  const int32_t n = host::BlockCount(data);
+  const int32_t N = SpectrumLength(m);
+  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
+                             {p < 0, status::kBadOrder},
+                             {p > MaxOrder(n), status::kBadOrder},
+                             {k <= 0, status::kBadCount},
+                             {k > p, status::kCountAboveOrder},
+                             {m <= 1 || N == 0, status::kBadSpectrumSize},
+                             {BadRate(rate), status::kBadSampleRate}};
+  const OutputArray outputs[] = {{amp, kReal, k, CountSource::kModes},
+                                 {phase, kReal, k, CountSource::kModes},
+                                 {freq, kReal, k, CountSource::kModes},
+                                 {spectrum, kReal, N, CountSource::kLength}};
+  const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
+                                  {df, OutDoubleRole::kSpectrumDf},
+                                  {fitError, OutDoubleRole::kPassThrough}};
+  return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles, onResizeFailure},
+                        [&](EntryCall& c) {
+                          c.spectrum.values = c.RealOutput(3);
+                          return estimate(c, N);
+                        });
+}
+
+}  // namespace
+
+// ================================ exports ================================
+// Estimator arguments: the input, n, the scalars in the entry point's order,
+// the outputs (aligned stand-ins, in the estimator's own order), extra pointers.
+
+extern "C" {
+
+QDM_API int32_t QdmCxPronyH(QdmArrayHandle data, int32_t p, double samplingRate,
+                            QdmArrayHandle amplitude, QdmArrayHandle phase,
+                            QdmArrayHandle damping, QdmArrayHandle frequency) {
+  const int32_t n = host::BlockCount(data);
+  return PronyEntry(data, kCx, p, samplingRate, amplitude, phase, damping, frequency,
+                    ResizeFailure::kEmptyOutputs, [&](EntryCall& c) {
+                      return PronyComplex(c.ComplexInput(), n, p, samplingRate, c.RealOutput(0),
+                                          c.RealOutput(1), c.RealOutput(2), c.RealOutput(3),
+                                          &c.modes);
+                    });
+}
+
+// A failed resize returns at once here, leaving the outputs as they are; the
+// complex twin empties them.
+QDM_API int32_t QdmRePronyH(QdmArrayHandle data, int32_t p, double samplingRate,
+                            const uint8_t* realSignal, QdmArrayHandle amplitude,
+                            QdmArrayHandle phase, QdmArrayHandle damping,
+                            QdmArrayHandle frequency) {
+  const int32_t n = host::BlockCount(data);
+  return PronyEntry(data, kReal, p, samplingRate, amplitude, phase, damping, frequency,
+                    ResizeFailure::kReturnAtOnce, [&](EntryCall& c) {
+                      return PronyReal(c.RealInput(), n, p, samplingRate, FlagValue(realSignal),
+                                       c.RealOutput(0), c.RealOutput(1), c.RealOutput(2),
+                                       c.RealOutput(3), &c.modes);
+                    });
+}
+
+QDM_API int32_t QdmCxCovarianceH(QdmArrayHandle data, int32_t p, QdmArrayHandle coefficients,
+                                 QdmArrayHandle poles, double* noiseVariance) {
+  const int32_t n = host::BlockCount(data);
+  return CovarianceEntry(data, kCx, p, coefficients, poles, noiseVariance, [&](EntryCall& c) {
+    return CovarianceArComplex(c.ComplexInput(), n, p, c.ComplexOutput(1), c.ComplexOutput(0),
+                               &c.outDoubles[0]);
+  });
+}
+
+QDM_API int32_t QdmReCovarianceH(QdmArrayHandle data, int32_t p, QdmArrayHandle coefficients,
+                                 QdmArrayHandle poles, double* noiseVariance) {
+  const int32_t n = host::BlockCount(data);
+  return CovarianceEntry(data, kReal, p, coefficients, poles, noiseVariance, [&](EntryCall& c) {
+    return CovarianceArReal(c.RealInput(), n, p, c.RealOutput(1), c.ComplexOutput(0),
+                            &c.outDoubles[0]);
+  });
+}
+
+QDM_API int32_t QdmCxPCARH(QdmArrayHandle data, int32_t p, int32_t components,
+                           QdmArrayHandle coefficients, QdmArrayHandle roots) {
+  const int32_t n = host::BlockCount(data);
+  return PcarEntry(data, kCx, p, components, coefficients, roots, [&](EntryCall& c) {
+    return PcarEstimateComplex(c.ComplexInput(), n, p, components, c.ComplexOutput(1),
+                               c.ComplexOutput(0));
+  });
+}
+
+QDM_API int32_t QdmRePCARH(QdmArrayHandle data, int32_t p, int32_t components,
+                           QdmArrayHandle coefficients, QdmArrayHandle roots) {
+  const int32_t n = host::BlockCount(data);
+  return PcarEntry(data, kReal, p, components, coefficients, roots, [&](EntryCall& c) {
+    return PcarEstimateReal(c.RealInput(), n, p, components, c.RealOutput(1),
+                            c.ComplexOutput(0));
+  });
+}
+
+QDM_API int32_t QdmCxMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M,
+                                   double samplingRate, QdmArrayHandle amplitude,
+                                   QdmArrayHandle phase, QdmArrayHandle damping,
+                                   QdmArrayHandle frequency, double* mse) {
+  const int32_t n = host::BlockCount(data);
+  return PencilEntry(data, kCx, L, M, samplingRate, amplitude, phase, damping, frequency, mse,
+                     [&](EntryCall& c) {
+                       return MatrixPencilComplex(c.ComplexInput(), n, L, M, samplingRate,
+                                                  c.RealOutput(0), c.RealOutput(1),
+                                                  c.RealOutput(2), c.RealOutput(3),
+                                                  &c.outDoubles[0], &c.modes);
+                     });
+}
+
+QDM_API int32_t QdmReMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M,
+                                   double samplingRate, const uint8_t* realSignal,
+                                   QdmArrayHandle amplitude, QdmArrayHandle phase,
+                                   QdmArrayHandle damping, QdmArrayHandle frequency,
+                                   double* mse) {
+  const int32_t n = host::BlockCount(data);
+  return PencilEntry(data, kReal, L, M, samplingRate, amplitude, phase, damping, frequency, mse,
+                     [&](EntryCall& c) {
+                       return MatrixPencilReal(c.RealInput(), n, L, M, samplingRate,
+                                               FlagValue(realSignal), c.RealOutput(0),
+                                               c.RealOutput(1), c.RealOutput(2),
+                                               c.RealOutput(3), &c.outDoubles[0], &c.modes);
+                     });
+}
+
+QDM_API int32_t QdmCxMinDescriptLenH(QdmArrayHandle data, int32_t L, int32_t minOrder,
+                                     int32_t* order) {
+  return MdlEntry(data, kCx, L, minOrder, order,
+                  [](const void* x, int32_t n, int32_t upper, int32_t lower, int32_t* chosen) {
+                    return MdlOrderComplex(static_cast<const Complex*>(x), n, upper, lower,
+                                           chosen);
+                  });
+}
+
+QDM_API int32_t QdmReMinDescriptLenH(QdmArrayHandle data, int32_t L, int32_t minOrder,
+                                     int32_t* order) {
+  return MdlEntry(data, kReal, L, minOrder, order,
+                  [](const void* x, int32_t n, int32_t upper, int32_t lower, int32_t* chosen) {
+                    return MdlOrderReal(static_cast<const double*>(x), n, upper, lower, chosen);
+                  });
+}
+
+QDM_API int32_t QdmCxCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m,
+                                     double samplingRate, double* f0, double* df,
+                                     QdmArrayHandle spectrum, double* noiseVariance) {
+  const int32_t n = host::BlockCount(data);
+  return CovSpectrumEntry(data, kCx, p, m, samplingRate, f0, df, spectrum, noiseVariance,
+                          [&](EntryCall& c, int32_t N) {
+                            return CovPowerSpectrumComplex(c.ComplexInput(), n, p, N,
+                                                           samplingRate, &c.spectrum,
+                                                           &c.outDoubles[2]);
+                          });
+}
+
+QDM_API int32_t QdmReCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m,
+                                     double samplingRate, double* f0, double* df,
+                                     QdmArrayHandle spectrum, double* noiseVariance) {
+  const int32_t n = host::BlockCount(data);
+  return CovSpectrumEntry(data, kReal, p, m, samplingRate, f0, df, spectrum, noiseVariance,
+                          [&](EntryCall& c, int32_t N) {
+                            return CovPowerSpectrumReal(c.RealInput(), n, p, N, samplingRate,
+                                                        &c.spectrum, &c.outDoubles[2]);
+                          });
+}
+
+QDM_API int32_t QdmCxPCARPowerSpectrumH(QdmArrayHandle data, int32_t p, int32_t m, int32_t k,
+                                        double samplingRate, QdmArrayHandle amplitude,
+                                        QdmArrayHandle phase, QdmArrayHandle frequency,
+                                        double* f0, double* df, QdmArrayHandle spectrum,
+                                        double* fitError) {
+  const int32_t n = host::BlockCount(data);
+  return PcarSpectrumEntry(data, kCx, p, m, k, samplingRate, amplitude, phase, frequency, f0,
+                           df, spectrum, fitError, ResizeFailure::kEmptyOutputs,
+                           [&](EntryCall& c, int32_t N) {
+                             return PcarPowerSpectrumComplex(
+                                 c.ComplexInput(), n, p, k, N, samplingRate, c.RealOutput(0),
+                                 c.RealOutput(1), c.RealOutput(2), &c.outDoubles[2],
+                                 &c.spectrum, &c.modes);
+                           });
+}
+
+// A failed resize returns at once here, leaving the outputs as they are; the
+// complex twin empties them.
+QDM_API int32_t QdmRePCARPowerSpectrumH(QdmArrayHandle data, int32_t p, int32_t m, int32_t k,
+                                        double samplingRate, const uint8_t* realSignal,
+                                        QdmArrayHandle amplitude, QdmArrayHandle phase,
+                                        QdmArrayHandle frequency, double* f0, double* df,
+                                        QdmArrayHandle spectrum, double* fitError) {
+  const int32_t n = host::BlockCount(data);
+  return PcarSpectrumEntry(data, kReal, p, m, k, samplingRate, amplitude, phase, frequency, f0,
+                           df, spectrum, fitError, ResizeFailure::kReturnAtOnce,
+                           [&](EntryCall& c, int32_t N) {
+                             return PcarPowerSpectrumReal(
+                                 c.RealInput(), n, p, k, N, samplingRate, FlagValue(realSignal),
+                                 c.RealOutput(0), c.RealOutput(1), c.RealOutput(2),
+                                 &c.outDoubles[2], &c.spectrum, &c.modes);
+                           });
+}
+
+}  // extern "C"

@@ -1,0 +1,515 @@
+// The fourteen analysis exports as the host sees them: argument checks and
+// their host codes, the resizes each export makes (order, type codes, lengths),
+// what failure leaves in the outputs, and the failed-resize asymmetry. None of
+// this depends on what the estimators compute, so every case holds whether an
+// estimator succeeds or fails on valid input.
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <complex>
+#include <functional>
+#include <limits>
+#include <string>
+#include <vector>
+
+#include "support/qdm_host.h"
+
+namespace {
+
+using qdmtest::HostArray;
+using qdmtest::HostCode;
+using qdmtest::Qdm;
+using qdmtest::QdmApi;
+using qdmtest::ResizeCall;
+using qdmtest::ResizesSince;
+
+constexpr int32_t kR = QDM_TYPE_DOUBLE;
+constexpr int32_t kC = QDM_TYPE_COMPLEX;
+constexpr double kStale = 5.0;   // what outputs hold before a call
+constexpr int32_t kStaleCount = 3;
+constexpr int32_t kStaleOrder = 77;
+
+enum class Family { kProny, kCovariance, kPcar, kPencil, kMdl, kCovSpectrum, kPcarSpectrum };
+
+// The scalar arguments of one call: n and the family's integers in argument
+// order (Prony/covariance: p; PCAR: p, components; pencil: L, M; MDL: L,
+// minOrder; covariance spectrum: p, m; PCAR spectrum: p, m, k), and the rate.
+struct Scalars {
+  int32_t n;
+  int32_t a, b, c;
+  double fs;
+};
+
+// The host-side state of one call: stale outputs, out doubles, the MDL result.
+struct Call {
+  HostArray data;
+  HostArray out[4] = {HostArray::Filled(kR, kStaleCount, kStale),
+                      HostArray::Filled(kR, kStaleCount, kStale),
+                      HostArray::Filled(kR, kStaleCount, kStale),
+                      HostArray::Filled(kR, kStaleCount, kStale)};
+  double d[3] = {kStale, kStale, kStale};
+  int32_t order = kStaleOrder;
+  uint8_t flag = 1;
+};
+
+HostArray Signal(bool complexData, int32_t n) {
+  if (complexData) {
+    std::vector<std::complex<double>> x;
+    for (int32_t t = 0; t < n; ++t) {
+      x.push_back(std::polar(std::pow(0.97, t), 0.9 * t) + 0.5 * std::polar(1.0, -2.1 * t) +
+                  std::complex<double>(0.01 * std::sin(7.3 * t * t), 0.01 * std::cos(5.1 * t)));
+    }
+    return HostArray::Complex(x);
+  }
+  std::vector<double> x;
+  for (int32_t t = 0; t < n; ++t) {
+    x.push_back(std::pow(0.97, t) * std::cos(0.9 * t) + 0.5 * std::cos(2.1 * t + 0.3) +
+                0.01 * std::sin(7.3 * t * t));
+  }
+  return HostArray::Real(x);
+}
+
+// Smallest power of two not below m (0 beyond 32 bits: such an m fails its check).
+int32_t SpectrumN(int32_t m) {
+  int64_t N = 1;
+  while (N < m) N *= 2;
+  return N > INT32_MAX ? 0 : static_cast<int32_t>(N);
+}
+
+struct Export {
+  const char* name;
+  Family family;
+  bool complexData;
+  int outputs;                 // array outputs, in resize order out[0..]
+  int doubles;                 // out doubles d[0..]
+  int passThrough;             // index into d of the amplitude-fit error, or -1
+  bool failedResizeReturns;    // a failed resize returns at once
+  std::function<int32_t(const QdmApi&, Call&, const Scalars&)> invoke;
+  // The resizes a call whose checks pass makes first, in order.
+  std::function<std::vector<ResizeCall>(const Scalars&)> resizes;
+};
+
+std::vector<ResizeCall> Repeat(int times, int32_t type, int32_t count) {
+  return std::vector<ResizeCall>(static_cast<size_t>(times),
+                                 ResizeCall{type, 1, static_cast<size_t>(count)});
+}
+
+// Outputs in resize order: Prony and pencil out1..out4; covariance and PCAR
+// the p-element second output, then the coefficients; spectra out1..out3 then
+// the spectrum.
+const std::vector<Export>& Exports() {
+  static const std::vector<Export> exports = {
+      {"QdmRePronyH", Family::kProny, false, 4, 0, -1, true,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmRePronyH(c.data, s.a, s.fs, &c.flag, c.out[0], c.out[1], c.out[2], c.out[3]);
+       },
+       [](const Scalars& s) { return Repeat(4, kR, s.a); }},
+      {"QdmCxPronyH", Family::kProny, true, 4, 0, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmCxPronyH(c.data, s.a, s.fs, c.out[0], c.out[1], c.out[2], c.out[3]);
+       },
+       [](const Scalars& s) { return Repeat(4, kR, s.a); }},
+      {"QdmReCovarianceH", Family::kCovariance, false, 2, 1, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmReCovarianceH(c.data, s.a, c.out[1], c.out[0], &c.d[0]);
+       },
+       [](const Scalars& s) {
+         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kR, 1, size_t(s.a + 1)}};
+       }},
+      {"QdmCxCovarianceH", Family::kCovariance, true, 2, 1, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmCxCovarianceH(c.data, s.a, c.out[1], c.out[0], &c.d[0]);
+       },
+       [](const Scalars& s) {
+         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kC, 1, size_t(s.a + 1)}};
+       }},
+      {"QdmRePCARH", Family::kPcar, false, 2, 0, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmRePCARH(c.data, s.a, s.b, c.out[1], c.out[0]);
+       },
+       [](const Scalars& s) {
+         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kR, 1, size_t(s.a + 1)}};
+       }},
+      {"QdmCxPCARH", Family::kPcar, true, 2, 0, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmCxPCARH(c.data, s.a, s.b, c.out[1], c.out[0]);
+       },
+       [](const Scalars& s) {
+         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kC, 1, size_t(s.a + 1)}};
+       }},
+      {"QdmReMatrixPencilH", Family::kPencil, false, 4, 1, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmReMatrixPencilH(c.data, s.a, s.b, s.fs, &c.flag, c.out[0], c.out[1],
+                                     c.out[2], c.out[3], &c.d[0]);
+       },
+       [](const Scalars& s) { return Repeat(4, kR, s.b); }},
+      {"QdmCxMatrixPencilH", Family::kPencil, true, 4, 1, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmCxMatrixPencilH(c.data, s.a, s.b, s.fs, c.out[0], c.out[1], c.out[2],
+                                     c.out[3], &c.d[0]);
+       },
+       [](const Scalars& s) { return Repeat(4, kR, s.b); }},
+      {"QdmReMinDescriptLenH", Family::kMdl, false, 0, 0, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmReMinDescriptLenH(c.data, s.a, s.b, &c.order);
+       },
+       [](const Scalars&) { return std::vector<ResizeCall>{}; }},
+      {"QdmCxMinDescriptLenH", Family::kMdl, true, 0, 0, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmCxMinDescriptLenH(c.data, s.a, s.b, &c.order);
+       },
+       [](const Scalars&) { return std::vector<ResizeCall>{}; }},
+      {"QdmReCovPowerSpectrH", Family::kCovSpectrum, false, 1, 3, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmReCovPowerSpectrH(c.data, s.a, s.b, s.fs, &c.d[0], &c.d[1], c.out[0],
+                                       &c.d[2]);
+       },
+       [](const Scalars& s) { return Repeat(1, kR, SpectrumN(s.b)); }},
+      {"QdmCxCovPowerSpectrH", Family::kCovSpectrum, true, 1, 3, -1, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmCxCovPowerSpectrH(c.data, s.a, s.b, s.fs, &c.d[0], &c.d[1], c.out[0],
+                                       &c.d[2]);
+       },
+       [](const Scalars& s) { return Repeat(1, kR, SpectrumN(s.b)); }},
+      {"QdmRePCARPowerSpectrumH", Family::kPcarSpectrum, false, 4, 3, 2, true,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmRePCARPowerSpectrumH(c.data, s.a, s.b, s.c, s.fs, &c.flag, c.out[0],
+                                          c.out[1], c.out[2], &c.d[0], &c.d[1], c.out[3],
+                                          &c.d[2]);
+       },
+       [](const Scalars& s) {
+         auto r = Repeat(3, kR, s.c);
+         r.push_back({kR, 1, size_t(SpectrumN(s.b))});
+         return r;
+       }},
+      {"QdmCxPCARPowerSpectrumH", Family::kPcarSpectrum, true, 4, 3, 2, false,
+       [](const QdmApi& q, Call& c, const Scalars& s) {
+         return q.QdmCxPCARPowerSpectrumH(c.data, s.a, s.b, s.c, s.fs, c.out[0], c.out[1],
+                                          c.out[2], &c.d[0], &c.d[1], c.out[3], &c.d[2]);
+       },
+       [](const Scalars& s) {
+         auto r = Repeat(3, kR, s.c);
+         r.push_back({kR, 1, size_t(SpectrumN(s.b))});
+         return r;
+       }},
+  };
+  return exports;
+}
+
+// n = 12 gives the order bound floor(24/3) = 8.
+Scalars Valid(Family f) {
+  switch (f) {
+    case Family::kProny: return {12, 2, 0, 0, 1.0};
+    case Family::kCovariance: return {12, 2, 0, 0, 1.0};
+    case Family::kPcar: return {12, 4, 2, 0, 1.0};
+    case Family::kPencil: return {12, 4, 2, 0, 1.0};
+    case Family::kMdl: return {12, 4, 1, 0, 1.0};
+    case Family::kCovSpectrum: return {12, 2, 16, 0, 1.0};
+    case Family::kPcarSpectrum: return {12, 4, 16, 2, 1.0};
+  }
+  return {};
+}
+
+struct CheckRow {
+  const char* what;
+  std::function<void(Scalars&)> change;
+  int32_t host;  // 0: the call passes the checks
+};
+
+constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
+
+std::vector<CheckRow> Rows(Family f) {
+  const int32_t e = HostCode(1);
+  switch (f) {
+    case Family::kProny:
+    case Family::kCovariance: {
+      std::vector<CheckRow> rows = {
+          {"n = 0", [](Scalars& s) { s.n = 0; }, e},
+          {"n = 0 before p = 0", [](Scalars& s) { s.n = 0, s.a = 0; }, e},
+          {"p = 0", [](Scalars& s) { s.a = 0; }, HostCode(12)},
+          {"p < 0", [](Scalars& s) { s.a = -3; }, HostCode(12)},
+          {"p = 2n/3 + 1", [](Scalars& s) { s.a = 9; }, HostCode(12)},
+          {"p = 2n/3 + 1, n = 13", [](Scalars& s) { s.n = 13, s.a = 9; }, HostCode(12)},
+          {"n = 1", [](Scalars& s) { s.n = 1, s.a = 1; }, HostCode(12)},
+          {"p = 2n/3", [](Scalars& s) { s.a = 8; }, 0},
+          {"p = 2n/3, n = 14", [](Scalars& s) { s.n = 14, s.a = 9; }, 0},
+      };
+      if (f == Family::kProny) {
+        rows.push_back({"rate = 0", [](Scalars& s) { s.fs = 0; }, HostCode(18)});
+        rows.push_back({"rate < 0", [](Scalars& s) { s.fs = -1; }, HostCode(18)});
+        rows.push_back({"rate -inf", [](Scalars& s) { s.fs = -INFINITY; }, HostCode(18)});
+        rows.push_back({"p before rate", [](Scalars& s) { s.a = 0, s.fs = 0; }, HostCode(12)});
+        rows.push_back({"rate NaN", [](Scalars& s) { s.fs = kNaN; }, 0});
+      }
+      return rows;
+    }
+    case Family::kPcar:
+      return {
+          {"n = 0", [](Scalars& s) { s.n = 0; }, e},
+          {"p < 0", [](Scalars& s) { s.a = -1; }, HostCode(11)},
+          {"p = 2n/3 + 1", [](Scalars& s) { s.a = 9; }, HostCode(11)},
+          {"components = 0", [](Scalars& s) { s.b = 0; }, HostCode(12)},
+          {"components < 0", [](Scalars& s) { s.b = -2; }, HostCode(12)},
+          {"components > p", [](Scalars& s) { s.b = 5; }, HostCode(13)},
+          {"p = 0", [](Scalars& s) { s.a = 0, s.b = 1; }, HostCode(13)},
+          {"p = 0, components = 0", [](Scalars& s) { s.a = 0, s.b = 0; }, HostCode(12)},
+          {"p before components", [](Scalars& s) { s.a = 9, s.b = 0; }, HostCode(11)},
+          {"p = 2n/3", [](Scalars& s) { s.a = 8; }, 0},
+          {"components = p", [](Scalars& s) { s.b = 4; }, 0},
+      };
+    case Family::kPencil:
+      return {
+          {"n = 0", [](Scalars& s) { s.n = 0; }, e},
+          {"L < 0", [](Scalars& s) { s.a = -1; }, HostCode(11)},
+          {"L = 2n/3 + 1", [](Scalars& s) { s.a = 9; }, HostCode(11)},
+          {"M = 0", [](Scalars& s) { s.b = 0; }, HostCode(12)},
+          {"M > L", [](Scalars& s) { s.b = 5; }, HostCode(13)},
+          {"L = 0", [](Scalars& s) { s.a = 0, s.b = 1; }, HostCode(13)},
+          {"rate = 0", [](Scalars& s) { s.fs = 0; }, HostCode(18)},
+          {"M before rate", [](Scalars& s) { s.b = 5, s.fs = -1; }, HostCode(13)},
+          {"L = 2n/3", [](Scalars& s) { s.a = 8; }, 0},
+          {"M = L", [](Scalars& s) { s.b = 4; }, 0},
+          {"rate NaN", [](Scalars& s) { s.fs = kNaN; }, 0},
+      };
+    case Family::kMdl:
+      return {
+          {"n = 0", [](Scalars& s) { s.n = 0; }, -42401},
+          {"minOrder = 0", [](Scalars& s) { s.b = 0; }, -42414},
+          {"minOrder < 0", [](Scalars& s) { s.b = -4; }, -42414},
+          {"L = minOrder", [](Scalars& s) { s.a = 1; }, -42415},
+          {"L < minOrder", [](Scalars& s) { s.a = 2, s.b = 3; }, -42415},
+          {"L = 2n/3 + 1", [](Scalars& s) { s.a = 9; }, -42415},
+          {"minOrder before L", [](Scalars& s) { s.a = 0, s.b = 0; }, -42414},
+          {"L = 2n/3", [](Scalars& s) { s.a = 8; }, 0},
+      };
+    case Family::kCovSpectrum:
+      return {
+          {"n = 0", [](Scalars& s) { s.n = 0; }, e},
+          {"p < 0", [](Scalars& s) { s.a = -1; }, HostCode(12)},
+          {"p = 2n/3 + 1", [](Scalars& s) { s.a = 9; }, HostCode(12)},
+          {"m = 1", [](Scalars& s) { s.b = 1; }, HostCode(17)},
+          {"m = 0", [](Scalars& s) { s.b = 0; }, HostCode(17)},
+          {"m beyond 2^30", [](Scalars& s) { s.b = (1 << 30) + 1; }, HostCode(17)},
+          {"rate = 0", [](Scalars& s) { s.fs = 0; }, HostCode(18)},
+          {"m before rate", [](Scalars& s) { s.b = 1, s.fs = 0; }, HostCode(17)},
+          {"p = 0", [](Scalars& s) { s.a = 0; }, 0},
+          {"p = 2n/3", [](Scalars& s) { s.a = 8; }, 0},
+          {"m = 2", [](Scalars& s) { s.b = 2; }, 0},
+          {"rate NaN", [](Scalars& s) { s.fs = kNaN; }, 0},
+      };
+    case Family::kPcarSpectrum:
+      return {
+          {"n = 0", [](Scalars& s) { s.n = 0; }, e},
+          {"p < 0", [](Scalars& s) { s.a = -1; }, HostCode(11)},
+          {"p = 2n/3 + 1", [](Scalars& s) { s.a = 9; }, HostCode(11)},
+          {"k = 0", [](Scalars& s) { s.c = 0; }, HostCode(12)},
+          {"k > p", [](Scalars& s) { s.c = 5; }, HostCode(13)},
+          {"p = 0", [](Scalars& s) { s.a = 0; }, HostCode(13)},
+          {"m = 1", [](Scalars& s) { s.b = 1; }, HostCode(17)},
+          {"rate < 0", [](Scalars& s) { s.fs = -1; }, HostCode(18)},
+          {"k before m", [](Scalars& s) { s.c = 0, s.b = 1; }, HostCode(12)},
+          {"m before rate", [](Scalars& s) { s.b = 0, s.fs = 0; }, HostCode(17)},
+          {"p = 2n/3", [](Scalars& s) { s.a = 8; }, 0},
+          {"k = p", [](Scalars& s) { s.c = 4; }, 0},
+          {"rate NaN", [](Scalars& s) { s.fs = kNaN; }, 0},
+      };
+  }
+  return {};
+}
+
+Call MakeCall(const Export& x, const Scalars& s) { return Call{Signal(x.complexData, s.n)}; }
+
+// Every output at count 0 and capacity 0, every out double but the
+// amplitude-fit error zeroed.
+void ExpectEmptied(const Export& x, const Call& c, const std::string& where) {
+  for (int i = 0; i < x.outputs; ++i) {
+    EXPECT_EQ(c.out[i].Count(), 0) << where << " out" << i;
+    EXPECT_EQ(c.out[i].Capacity(), 0u) << where << " out" << i;
+  }
+  for (int j = 0; j < x.doubles; ++j) {
+    EXPECT_EQ(c.d[j], j == x.passThrough ? kStale : 0.0) << where << " double " << j;
+  }
+}
+
+std::vector<ResizeCall> EmptyingResizes(const Export& x, const Scalars& s) {
+  std::vector<ResizeCall> r = x.resizes(s);
+  for (ResizeCall& call : r) call.count = 0;
+  return r;
+}
+
+TEST(EntryChecks, EveryFailingArgumentGivesItsHostCodeAndEmptiesTheOutputs) {
+  const QdmApi& qdm = Qdm();
+  for (const Export& x : Exports()) {
+    for (const CheckRow& row : Rows(x.family)) {
+      if (row.host == 0) continue;
+      Scalars s = Valid(x.family);
+      row.change(s);
+      const std::string where = std::string(x.name) + ": " + row.what;
+      Call c = MakeCall(x, s);
+      const int64_t mark = qdmtest::ResizeMark();
+      EXPECT_EQ(x.invoke(qdm, c, s), row.host) << where;
+      // The only resizes are the ones that empty the outputs.
+      EXPECT_EQ(ResizesSince(mark), EmptyingResizes(x, s)) << where;
+      ExpectEmptied(x, c, where);
+      EXPECT_EQ(c.order, kStaleOrder) << where;  // MDL: result untouched
+    }
+  }
+}
+
+TEST(EntryChecks, BoundaryAndNaNRateCasesPassTheChecks) {
+  const QdmApi& qdm = Qdm();
+  for (const Export& x : Exports()) {
+    for (const CheckRow& row : Rows(x.family)) {
+      if (row.host != 0) continue;
+      Scalars s = Valid(x.family);
+      row.change(s);
+      const std::string where = std::string(x.name) + ": " + row.what;
+      Call c = MakeCall(x, s);
+      const int64_t mark = qdmtest::ResizeMark();
+      const int32_t st = x.invoke(qdm, c, s);
+      // Reaching the resizes with the full lengths is passing the checks.
+      const std::vector<ResizeCall> expected = x.resizes(s);
+      std::vector<ResizeCall> made = ResizesSince(mark);
+      ASSERT_GE(made.size(), expected.size()) << where;
+      made.resize(expected.size());
+      EXPECT_EQ(made, expected) << where;
+      if (x.family == Family::kMdl) {
+        EXPECT_NE(st, -42401) << where;
+        EXPECT_NE(st, -42414) << where;
+        EXPECT_NE(st, -42415) << where;
+      }
+    }
+  }
+}
+
+// On valid input the outcome is either success, with the counts the export
+// writes, or an estimator failure, with every output emptied.
+TEST(EntryPoints, ResizeOrderTypeCodesAndCounts) {
+  const QdmApi& qdm = Qdm();
+  for (const Export& x : Exports()) {
+    const Scalars s = Valid(x.family);
+    Call c = MakeCall(x, s);
+    const int64_t mark = qdmtest::ResizeMark();
+    const int32_t st = x.invoke(qdm, c, s);
+    const std::vector<ResizeCall> expected = x.resizes(s);
+    std::vector<ResizeCall> made = ResizesSince(mark);
+    if (st != 0) {
+      std::vector<ResizeCall> all = expected;
+      for (const ResizeCall& r : EmptyingResizes(x, s)) all.push_back(r);
+      EXPECT_EQ(made, all) << x.name << " status " << st;
+      ExpectEmptied(x, c, x.name);
+      continue;
+    }
+    EXPECT_EQ(made, expected) << x.name;
+    switch (x.family) {
+      case Family::kCovariance:
+      case Family::kPcar:
+        EXPECT_EQ(c.out[0].Count(), s.a) << x.name;
+        EXPECT_EQ(c.out[1].Count(), s.a + 1) << x.name;
+        break;
+      case Family::kProny:
+      case Family::kPencil:
+      case Family::kPcarSpectrum: {
+        const int32_t capacity = x.family == Family::kProny    ? s.a
+                                 : x.family == Family::kPencil ? s.b
+                                                               : s.c;
+        EXPECT_GE(c.out[0].Count(), 0) << x.name;
+        EXPECT_LE(c.out[0].Count(), capacity) << x.name;
+        for (int i = 1; i < 3; ++i) EXPECT_EQ(c.out[i].Count(), c.out[0].Count()) << x.name;
+        if (x.family == Family::kPcarSpectrum) {
+          EXPECT_EQ(c.out[3].Count(), SpectrumN(s.b)) << x.name;
+        } else {
+          EXPECT_EQ(c.out[3].Count(), c.out[0].Count()) << x.name;
+        }
+        break;
+      }
+      case Family::kCovSpectrum:
+        EXPECT_EQ(c.out[0].Count(), SpectrumN(s.b)) << x.name;
+        break;
+      case Family::kMdl:
+        EXPECT_GE(c.order, s.b) << x.name;
+        EXPECT_LE(c.order, s.a) << x.name;
+        break;
+    }
+  }
+}
+
+TEST(EntryPoints, SpectrumLengthIsTheSmallestPowerOfTwoNotBelowM) {
+  const QdmApi& qdm = Qdm();
+  const struct {
+    int32_t m, N;
+  } sizes[] = {{2, 2}, {3, 4}, {5, 8}, {512, 512}, {513, 1024}, {1000, 1024}};
+  for (const Export& x : Exports()) {
+    if (x.family != Family::kCovSpectrum && x.family != Family::kPcarSpectrum) continue;
+    for (const auto& size : sizes) {
+      Scalars s = Valid(x.family);
+      s.b = size.m;
+      Call c = MakeCall(x, s);
+      const int64_t mark = qdmtest::ResizeMark();
+      (void)x.invoke(qdm, c, s);
+      const std::vector<ResizeCall> made = ResizesSince(mark);
+      const size_t spectrum = static_cast<size_t>(x.outputs - 1);
+      ASSERT_GT(made.size(), spectrum) << x.name;
+      EXPECT_EQ(made[spectrum], (ResizeCall{kR, 1, static_cast<size_t>(size.N)}))
+          << x.name << " m = " << size.m;
+    }
+  }
+}
+
+// A resize that fails with host error e returns -42400 - e (e > 0) or e
+// (e < 0). QdmRePronyH and QdmRePCARPowerSpectrumH return at once, leaving the
+// outputs as they were; every other export, their complex twins included,
+// empties its outputs.
+TEST(EntryPoints, FailedResize) {
+  const QdmApi& qdm = Qdm();
+  for (const Export& x : Exports()) {
+    for (int skip = 0; skip < x.outputs; ++skip) {
+      for (int32_t error : {3, -7}) {
+        const Scalars s = Valid(x.family);
+        const std::string where =
+            std::string(x.name) + " resize " + std::to_string(skip) + " error " +
+            std::to_string(error);
+        Call c = MakeCall(x, s);
+        const int64_t mark = qdmtest::ResizeMark();
+        EmuFailResize(skip, error);
+        const int32_t st = x.invoke(qdm, c, s);
+        EmuFailResize(0, 0);
+        EXPECT_EQ(st, error > 0 ? -42400 - error : error) << where;
+        std::vector<ResizeCall> expected = x.resizes(s);
+        expected.resize(static_cast<size_t>(skip) + 1);
+        if (x.failedResizeReturns) {
+          EXPECT_EQ(ResizesSince(mark), expected) << where;
+          for (int i = 0; i < x.outputs; ++i) {
+            EXPECT_EQ(c.out[i].Count(), kStaleCount) << where << " out" << i;
+            // Resized before the failure: new size; from the failing one on: as they were.
+            EXPECT_EQ(c.out[i].Capacity(),
+                      i < skip ? expected[static_cast<size_t>(i)].count : size_t{kStaleCount})
+                << where << " out" << i;
+            if (i >= skip) {
+              EXPECT_EQ(c.out[i].Reals(), std::vector<double>(kStaleCount, kStale)) << where;
+            }
+          }
+          for (int j = 0; j < x.doubles; ++j) EXPECT_EQ(c.d[j], kStale) << where;
+        } else {
+          for (const ResizeCall& r : EmptyingResizes(x, s)) expected.push_back(r);
+          EXPECT_EQ(ResizesSince(mark), expected) << where;
+          ExpectEmptied(x, c, where);
+        }
+      }
+    }
+  }
+}
+
+TEST(EntryPoints, InputIsReadInPlaceAndLeftUnchanged) {
+  const QdmApi& qdm = Qdm();
+  for (const Export& x : Exports()) {
+    const Scalars s = Valid(x.family);
+    Call c = MakeCall(x, s);
+    const std::vector<double> before = c.data.Reals(s.n * (x.complexData ? 2 : 1));
+    (void)x.invoke(qdm, c, s);
+    EXPECT_EQ(c.data.Count(), s.n) << x.name;
+    EXPECT_EQ(c.data.Reals(s.n * (x.complexData ? 2 : 1)), before) << x.name;
+  }
+}
+
+}  // namespace
