@@ -8,6 +8,7 @@
 #if defined(_WIN32)
 #include <cstdio>
 #else
+#include <fcntl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -41,6 +42,8 @@ inline ChildResult RunChild(const std::vector<std::string>& argv) {
   if (pid < 0) return result;
   if (pid == 0) {
     dup2(fds[1], STDERR_FILENO);
+    const int devnull = open("/dev/null", O_WRONLY);
+    if (devnull >= 0) dup2(devnull, STDOUT_FILENO);
     close(fds[0]);
     close(fds[1]);
     std::vector<char*> args;
