@@ -1,5 +1,4 @@
-// A module that looks like a host run-time (it exports the probe symbol) but
-// lacks NumericArrayResize.
+// A module without NumericArrayResize, to be named as the host run-time.
 #include <cstdint>
 
-extern "C" __attribute__((visibility("default"))) const int32_t gGFRTVersion = 1;
+extern "C" __attribute__((visibility("default"))) int32_t QdmTestNotAHostRuntime() { return 1; }

@@ -26,9 +26,10 @@ inline ChildResult RunChild(const std::vector<std::string>& argv) {
   ChildResult result;
 #if defined(_WIN32)
   // stdout is discarded; stderr comes through the pipe.
-  std::string command;
+  // cmd /c strips one outer pair of quotes, hence the extra pair around it all.
+  std::string command = "\"";
   for (const std::string& arg : argv) command += "\"" + arg + "\" ";
-  command += "2>&1 1>NUL";
+  command += "2>&1 1>NUL\"";
   FILE* pipe = _popen(command.c_str(), "r");
   if (pipe == nullptr) return result;
   char buffer[512];
