@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
 # Builds and runs every test suite: the plain -O3 build, then the
-# AddressSanitizer + UndefinedBehaviorSanitizer build. Installs what is
+# AddressSanitizer + UndefinedBehaviorSanitizer build, then the Windows build
+# under wine (scripts/windows.sh). Installs what is
 # missing on a fresh Debian 12 machine (run as root). The last lines printed
 # are ctest's own summary; the exit status is non-zero if any suite failed.
 set -uo pipefail
@@ -25,5 +26,10 @@ suite sanitize -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_SANITIZE=ON || failed=1
 if [ $failed -eq 0 ]; then
   export ASAN_OPTIONS=detect_leaks=1:abort_on_error=0 UBSAN_OPTIONS=print_stacktrace=1
   run sanitize || failed=1
+fi
+# The Windows DLL, cross-built with mingw-w64 and tested under wine
+# (QDM_WINDOWS=0 skips it).
+if [ "${QDM_WINDOWS:-1}" != 0 ]; then
+  scripts/windows.sh || failed=1
 fi
 exit $failed

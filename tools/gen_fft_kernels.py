@@ -132,31 +132,48 @@ class Block:
     def raw(self, expr, deps):
         return self.emit(expr, deps)
 
+    def load_pair(self, re_ptr, im_ptr):
+        """Real and imaginary part of one complex input, loaded together."""
+        a = "t%d" % self.count
+        b = "t%d" % (self.count + 1)
+        self.count += 2
+        self.stmts.append(((a, b), "p.LdC(%s, %s, %s, %s);" % (re_ptr, im_ptr, a, b), ()))
+        return (a, False), (b, False)
+
     def render(self, stores, indent="  "):
-        """Live statements and the stores [(lvalue, value)] as C++ lines."""
+        """Live statements and the stores as C++ lines. A store is
+        (method, pointer, value) or ("StC", re pointer, im pointer, re, im)."""
+        def text(val):
+            return "0.0" if val is None else ("-" if val[1] else "") + val[0]
         live = set()
-        for _, val in stores:
-            if val is not None:
-                live.add(val[0])
+        for st in stores:
+            for val in st[2:] if st[0] != "StC" else st[3:]:
+                if val is not None:
+                    live.add(val[0])
         kept = []
         for name, expr, deps in reversed(self.stmts):
-            if name in live:
+            names = name if isinstance(name, tuple) else (name,)
+            if any(n in live for n in names):
                 kept.append((name, expr))
                 live.update(deps)
         kept.reverse()
         ops = [0, 0]
         lines = []
         for name, expr in kept:
-            lines.append("%sconst double %s = %s;" % (indent, name, expr))
-            if "[" in expr:
+            if isinstance(name, tuple):
+                lines.append("%sT %s, %s;" % (indent, name[0], name[1]))
+                lines.append("%s%s" % (indent, expr))
+                continue
+            lines.append("%sconst T %s = %s;" % (indent, name, expr))
+            if expr.startswith("p."):
                 continue  # a load
             ops[0] += expr.count(" + ") + expr.count(" - ")
             ops[1] += expr.count(" * ")
-        for lvalue, val in stores:
-            if val is None:
-                lines.append("%s%s = 0.0;" % (indent, lvalue))
+        for st in stores:
+            if st[0] == "StC":
+                lines.append("%sp.StC(%s, %s, %s, %s);" % (indent, st[1], st[2], text(st[3]), text(st[4])))
             else:
-                lines.append("%s%s = %s%s;" % (indent, lvalue, "-" if val[1] else "", val[0]))
+                lines.append("%sp.%s(%s, %s);" % (indent, st[0], st[1], text(st[2])))
         return lines, ops
 
 
@@ -255,84 +272,84 @@ def dft(b, xs):
 
 # ---- the per-radix source ------------------------------------------------------------
 def idx(base, q, stride):
-    return "%s[%s]" % (base, "0" if q == 0 else ("%s" % stride if q == 1 else "%d * %s" % (q, stride)))
+    """Pointer to element q of base at the given stride."""
+    if q == 0:
+        return base
+    return "%s + %s" % (base, stride if q == 1 else "%d * %s" % (q, stride))
 
 
 def complex_core(r):
     b = Block()
-    xs = [(b.load(idx("xr", q, "is")), b.load(idx("xi", q, "is"))) for q in range(r)]
+    xs = [b.load_pair(idx("xr", q, "is"), idx("xi", q, "is")) for q in range(r)]
     ys = dft(b, xs)
-    stores = []
-    for q in range(r):
-        stores.append((idx("yr", q, "os"), ys[q][0]))
-        stores.append((idx("yi", q, "os"), ys[q][1]))
+    stores = [("StC", idx("yr", q, "os"), idx("yi", q, "os"), ys[q][0], ys[q][1]) for q in range(r)]
     return b.render(stores)
 
 
-def twiddle_loads(b, re_base, im_base, r):
-    """Legs j at base[j*s]; legs j >= 1 multiplied by (wc[j-1] + i ws[j-1])."""
+def twiddle_loads(b, r, pair):
+    """Legs j at s-spaced places; legs j >= 1 multiplied by (wc[j-1] + i ws[j-1])."""
     xs = []
     for j in range(r):
-        xr, xi = b.load(idx(re_base, j, "s")), b.load(idx(im_base, j, "s"))
+        xr, xi = pair(j)
         if j > 0:
-            c, s = b.load("wc[%d]" % (j - 1)), b.load("ws[%d]" % (j - 1))
-            xr, xi = (b.raw("%s * %s - %s * %s" % (xr[0], c[0], xi[0], s[0]), [xr[0], xi[0], c[0], s[0]]),
-                      b.raw("%s * %s + %s * %s" % (xi[0], c[0], xr[0], s[0]), [xr[0], xi[0], c[0], s[0]]))
+            c, s = b.load("p.LdW(wc + %d)" % (j - 1)), b.load("p.LdW(ws + %d)" % (j - 1))
+            deps = [xr[0], xi[0], c[0], s[0]]
+            xr, xi = (b.raw("%s * %s - %s * %s" % (xr[0], c[0], xi[0], s[0]), deps),
+                      b.raw("%s * %s + %s * %s" % (xi[0], c[0], xr[0], s[0]), deps))
         xs.append((xr, xi))
     return xs
 
 
 def complex_twiddle_core(r):
     b = Block()
-    ys = dft(b, twiddle_loads(b, "re", "im", r))
-    stores = []
-    for q in range(r):
-        stores.append((idx("re", q, "s"), ys[q][0]))
-        stores.append((idx("im", q, "s"), ys[q][1]))
+    ys = dft(b, twiddle_loads(b, r, lambda j: b.load_pair(idx("re", j, "s"), idx("im", j, "s"))))
+    stores = [("StC", idx("re", q, "s"), idx("im", q, "s"), ys[q][0], ys[q][1]) for q in range(r)]
     return b.render(stores)
 
 
 def real_core(r):
     b = Block()
-    xs = [(b.load(idx("x", q, "is")), None) for q in range(r)]
+    xs = [(b.load("p.Ld(%s)" % idx("x", q, "is")), None) for q in range(r)]
     ys = dft(b, xs)
-    stores = [(idx("y", 0, "os"), ys[0][0])]
+    stores = [("St", idx("y", 0, "os"), ys[0][0])]
     for q in range(1, r // 2 + 1):
-        stores.append((idx("y", q, "os"), ys[q][0]))
+        stores.append(("St", idx("y", q, "os"), ys[q][0]))
     for q in range(1, (r - 1) // 2 + 1):
-        stores.append((idx("y", r - q, "os"), ys[q][1]))
+        stores.append(("St", idx("y", r - q, "os"), ys[q][1]))
     return b.render(stores)
 
 
 def real_twiddle_core(r):
-    # Group k of the combining pass: Re Y_j[k] at a[j*s], Im Y_j[k] at b[j*s]
-    # (b = position m-k). X[k + m q] goes to a[q*s] / b[(r-1-q)*s] below the
-    # middle and, conjugated, to b[(r-1-q)*s] / a[q*s] above it.
+    # Group k of the combining pass: Re Y_j[k] at a + j*s, Im Y_j[k] at b + j*s
+    # (b = position m-k). X[k + m q] goes to a + q*s / b + (r-1-q)*s below the
+    # middle and, conjugated, to b + (r-1-q)*s / a + q*s above it.
     b = Block()
-    ys = dft(b, twiddle_loads(b, "a", "b", r))
+    ys = dft(b, twiddle_loads(b, r, lambda j: (b.load("p.Ld(%s)" % idx("a", j, "s")),
+                                               b.load("p.LdB(%s)" % idx("b", j, "s")))))
     stores = []
     for q in range(r):
         if 2 * q < r:
-            stores.append((idx("a", q, "s"), ys[q][0]))
-            stores.append((idx("b", r - 1 - q, "s"), ys[q][1]))
+            stores.append(("St", idx("a", q, "s"), ys[q][0]))
+            stores.append(("StB", idx("b", r - 1 - q, "s"), ys[q][1]))
         else:
-            stores.append((idx("b", r - 1 - q, "s"), ys[q][0]))
-            stores.append((idx("a", q, "s"), neg(ys[q][1])))
+            stores.append(("StB", idx("b", r - 1 - q, "s"), ys[q][0]))
+            stores.append(("St", idx("a", q, "s"), neg(ys[q][1])))
     return b.render(stores)
 
 
 def real_half_core(r):
     # Group k = m/2 of an even m: real Y_j twiddled by exp(-i pi j/r).
     b = Block()
-    xs = [twiddle_const(b, (b.load(idx("x", j, "s")), None), j, 2 * r) for j in range(r)]
+    xs = [twiddle_const(b, (b.load("p.Ld(%s)" % idx("x", j, "s")), None), j, 2 * r)
+          for j in range(r)]
     ys = dft(b, xs)
     stores = []
     for q in range(r):
         if 2 * q + 1 < r:
-            stores.append((idx("x", q, "s"), ys[q][0]))
-            stores.append((idx("x", r - 1 - q, "s"), ys[q][1]))
+            stores.append(("St", idx("x", q, "s"), ys[q][0]))
+            stores.append(("St", idx("x", r - 1 - q, "s"), ys[q][1]))
         elif 2 * q + 1 == r:
-            stores.append((idx("x", q, "s"), ys[q][0]))
+            stores.append(("St", idx("x", q, "s"), ys[q][0]))
     return b.render(stores)
 
 
@@ -348,6 +365,7 @@ def radix_file(r):
     r_lines, r_ops = real_core(r)
     g_lines, g_ops = real_twiddle_core(r)
     h_lines, h_ops = real_half_core(r)
+    tw = r - 1
     out = banner(" --radix %d" % r)
     out += [
         "// Radix-%d DFT kernels. Operation counts (adds, muls): complex DFT %d, %d;" % (r, c_ops[0], c_ops[1]),
@@ -355,61 +373,114 @@ def radix_file(r):
             t_ops[0], t_ops[1], r_ops[0], r_ops[1], g_ops[0], g_ops[1]),
         "// Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides",
         "// in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;",
-        "// m butterfly count.",
+        "// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms",
+        "// or butterflies run in the two lanes of a vector, a last odd one alone.",
         "// clang-format off",
+        '#include "fft/kernel_access.h"',
         '#include "fft/kernels/kernels.h"',
         "",
         "namespace {",
         "",
-        "inline void Dft%s(const double* xr, const double* xi, ptrdiff_t is, double* yr, double* yi," % rr,
-        "                 ptrdiff_t os) {",
+        "using fftk::InterleavedAccess;",
+        "using fftk::LaneAccess;",
+        "using fftk::ScalarAccess;",
+        "",
+        "template <class P>",
+        "inline void Dft%s(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr," % rr,
+        "                 double* yi, ptrdiff_t os) {",
+        "  using T = typename P::T;",
     ]
     out += c_lines
     out += ["}", "",
-            "inline void DftTw%s(double* re, double* im, ptrdiff_t s, const double* wc, const double* ws) {" % rr]
+            "template <class P>",
+            "inline void DftTw%s(const P& p, double* re, double* im, ptrdiff_t s, const double* wc," % rr,
+            "                   const double* ws) {",
+            "  using T = typename P::T;"]
     out += t_lines
     out += ["}", "",
-            "inline void RealDft%s(const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {" % rr]
+            "template <class P>",
+            "inline void RealDft%s(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {" % rr,
+            "  using T = typename P::T;"]
     out += r_lines
     out += ["}", "",
-            "inline void RealTw%s(double* a, double* b, ptrdiff_t s, const double* wc, const double* ws) {" % rr]
+            "template <class P>",
+            "inline void RealTw%s(const P& p, double* a, double* b, ptrdiff_t s, const double* wc," % rr,
+            "                    const double* ws) {",
+            "  using T = typename P::T;"]
     out += g_lines
     out += ["}", "",
-            "inline void RealHalf%s(double* x, ptrdiff_t s) {" % rr]
+            "template <class P>",
+            "inline void RealHalf%s(const P& p, double* x, ptrdiff_t s) {" % rr,
+            "  using T = typename P::T;"]
     out += h_lines
     out += ["}", "", "}  // namespace", ""]
     out += [
         "void FftComplexLeaf%s(const double* inRe, const double* inIm, double* outRe, double* outIm," % rr,
         "                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {",
         "  const ptrdiff_t ls = c * is;",
-        "  for (ptrdiff_t t = 0; t < c; ++t) {",
-        "    Dft%s(inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r),
+        "  ptrdiff_t t = 0;",
+        "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
+        "    const InterleavedAccess p{is, %d * os, 0, 0};" % r,
+        "    for (; t + 1 < c; t += 2) {",
+        "      Dft%s(p, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r),
+        "    }",
+        "  } else {",
+        "    const LaneAccess p{is, %d * os, 0, 0};" % r,
+        "    for (; t + 1 < c; t += 2) {",
+        "      Dft%s(p, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r),
+        "    }",
+        "  }",
+        "  for (; t < c; ++t) {",
+        "    Dft%s(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os," % (rr, r),
+        "          outIm + t * %d * os, os);" % r,
         "  }",
         "}",
         "",
         "void FftComplexTwiddle%s(double* re, double* im, const double* twCos, const double* twSin," % rr,
         "                         ptrdiff_t os, ptrdiff_t m) {",
         "  const ptrdiff_t s = m * os;",
-        "  Dft%s(re, im, s, re, im, s);" % rr,
-        "  for (ptrdiff_t k = 1; k < m; ++k) {",
-        "    DftTw%s(re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, r - 1, r - 1),
+        "  Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
+        "  ptrdiff_t k = 1;",
+        "  if (im == re + 1) {",
+        "    const InterleavedAccess p{os, os, 0, %d};" % tw,
+        "    for (; k + 1 < m; k += 2) {",
+        "      DftTw%s(p, re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, tw, tw),
+        "    }",
+        "  } else {",
+        "    const LaneAccess p{os, os, 0, %d};" % tw,
+        "    for (; k + 1 < m; k += 2) {",
+        "      DftTw%s(p, re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, tw, tw),
+        "    }",
+        "  }",
+        "  for (; k < m; ++k) {",
+        "    DftTw%s(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * %d," % (rr, tw),
+        "           twSin + (k - 1) * %d);" % tw,
         "  }",
         "}",
         "",
         "void FftRealLeaf%s(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {" % rr,
         "  const ptrdiff_t ls = c * is;",
-        "  for (ptrdiff_t t = 0; t < c; ++t) RealDft%s(in + t * is, ls, out + t * %d * os, os);" % (rr, r),
+        "  const LaneAccess p{is, %d * os, 0, 0};" % r,
+        "  ptrdiff_t t = 0;",
+        "  for (; t + 1 < c; t += 2) RealDft%s(p, in + t * is, ls, out + t * %d * os, os);" % (rr, r),
+        "  for (; t < c; ++t) RealDft%s(ScalarAccess{}, in + t * is, ls, out + t * %d * os, os);" % (rr, r),
         "}",
         "",
         "void FftRealTwiddle%s(double* data, const double* twCos, const double* twSin, ptrdiff_t os," % rr,
         "                      ptrdiff_t m) {",
         "  const ptrdiff_t s = m * os;",
-        "  RealDft%s(data, s, data, s);" % rr,
-        "  for (ptrdiff_t k = 1; 2 * k < m; ++k) {",
-        "    RealTw%s(data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (
-            rr, r - 1, r - 1),
+        "  RealDft%s(ScalarAccess{}, data, s, data, s);" % rr,
+        "  const LaneAccess p{os, os, -os, %d};" % tw,
+        "  ptrdiff_t k = 1;",
+        "  for (; 2 * (k + 1) < m; k += 2) {",
+        "    RealTw%s(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d," % (rr, tw),
+        "            twSin + (k - 1) * %d);" % tw,
         "  }",
-        "  if (m % 2 == 0) RealHalf" + rr + "(data + (m / 2) * os, s);",
+        "  for (; 2 * k < m; ++k) {",
+        "    RealTw%s(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d," % (rr, tw),
+        "            twSin + (k - 1) * %d);" % tw,
+        "  }",
+        "  if (m % 2 == 0) RealHalf" + rr + "(ScalarAccess{}, data + (m / 2) * os, s);",
         "}",
         "// clang-format on",
     ]

@@ -4,80 +4,94 @@
 // twiddled complex DFT 6, 4; real DFT 2, 0; real combining group 6, 4.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count.
+// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
+// or butterflies run in the two lanes of a vector, a last odd one alone.
 // clang-format off
+#include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
 
 namespace {
 
-inline void Dft02(const double* xr, const double* xi, ptrdiff_t is, double* yr, double* yi,
-                 ptrdiff_t os) {
-  const double t0 = xr[0];
-  const double t1 = xi[0];
-  const double t2 = xr[is];
-  const double t3 = xi[is];
-  const double t4 = t0 + t2;
-  const double t5 = t1 + t3;
-  const double t6 = t0 - t2;
-  const double t7 = t1 - t3;
-  yr[0] = t4;
-  yi[0] = t5;
-  yr[os] = t6;
-  yi[os] = t7;
+using fftk::InterleavedAccess;
+using fftk::LaneAccess;
+using fftk::ScalarAccess;
+
+template <class P>
+inline void Dft02(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+                 double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  const T t4 = t0 + t2;
+  const T t5 = t1 + t3;
+  const T t6 = t0 - t2;
+  const T t7 = t1 - t3;
+  p.StC(yr, yi, t4, t5);
+  p.StC(yr + os, yi + os, t6, t7);
 }
 
-inline void DftTw02(double* re, double* im, ptrdiff_t s, const double* wc, const double* ws) {
-  const double t0 = re[0];
-  const double t1 = im[0];
-  const double t2 = re[s];
-  const double t3 = im[s];
-  const double t4 = wc[0];
-  const double t5 = ws[0];
-  const double t6 = t2 * t4 - t3 * t5;
-  const double t7 = t3 * t4 + t2 * t5;
-  const double t8 = t0 + t6;
-  const double t9 = t1 + t7;
-  const double t10 = t0 - t6;
-  const double t11 = t1 - t7;
-  re[0] = t8;
-  im[0] = t9;
-  re[s] = t10;
-  im[s] = t11;
+template <class P>
+inline void DftTw02(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+                   const double* ws) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = t2 * t4 - t3 * t5;
+  const T t7 = t3 * t4 + t2 * t5;
+  const T t8 = t0 + t6;
+  const T t9 = t1 + t7;
+  const T t10 = t0 - t6;
+  const T t11 = t1 - t7;
+  p.StC(re, im, t8, t9);
+  p.StC(re + s, im + s, t10, t11);
 }
 
-inline void RealDft02(const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
-  const double t0 = x[0];
-  const double t1 = x[is];
-  const double t2 = t0 + t1;
-  const double t3 = t0 - t1;
-  y[0] = t2;
-  y[os] = t3;
+template <class P>
+inline void RealDft02(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t1 = p.Ld(x + is);
+  const T t2 = t0 + t1;
+  const T t3 = t0 - t1;
+  p.St(y, t2);
+  p.St(y + os, t3);
 }
 
-inline void RealTw02(double* a, double* b, ptrdiff_t s, const double* wc, const double* ws) {
-  const double t0 = a[0];
-  const double t1 = b[0];
-  const double t2 = a[s];
-  const double t3 = b[s];
-  const double t4 = wc[0];
-  const double t5 = ws[0];
-  const double t6 = t2 * t4 - t3 * t5;
-  const double t7 = t3 * t4 + t2 * t5;
-  const double t8 = t0 + t6;
-  const double t9 = t1 + t7;
-  const double t10 = t0 - t6;
-  const double t11 = t1 - t7;
-  a[0] = t8;
-  b[s] = t9;
-  b[0] = t10;
-  a[s] = -t11;
+template <class P>
+inline void RealTw02(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+                    const double* ws) {
+  using T = typename P::T;
+  const T t0 = p.Ld(a);
+  const T t1 = p.LdB(b);
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = t2 * t4 - t3 * t5;
+  const T t7 = t3 * t4 + t2 * t5;
+  const T t8 = t0 + t6;
+  const T t9 = t1 + t7;
+  const T t10 = t0 - t6;
+  const T t11 = t1 - t7;
+  p.St(a, t8);
+  p.StB(b + s, t9);
+  p.StB(b, t10);
+  p.St(a + s, -t11);
 }
 
-inline void RealHalf02(double* x, ptrdiff_t s) {
-  const double t0 = x[0];
-  const double t1 = x[s];
-  x[0] = t0;
-  x[s] = -t1;
+template <class P>
+inline void RealHalf02(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t1 = p.Ld(x + s);
+  p.St(x, t0);
+  p.St(x + s, -t1);
 }
 
 }  // namespace
@@ -85,32 +99,68 @@ inline void RealHalf02(double* x, ptrdiff_t s) {
 void FftComplexLeaf02(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  for (ptrdiff_t t = 0; t < c; ++t) {
-    Dft02(inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os, outIm + t * 2 * os, os);
+  ptrdiff_t t = 0;
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const InterleavedAccess p{is, 2 * os, 0, 0};
+    for (; t + 1 < c; t += 2) {
+      Dft02(p, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os, outIm + t * 2 * os, os);
+    }
+  } else {
+    const LaneAccess p{is, 2 * os, 0, 0};
+    for (; t + 1 < c; t += 2) {
+      Dft02(p, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os, outIm + t * 2 * os, os);
+    }
+  }
+  for (; t < c; ++t) {
+    Dft02(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os,
+          outIm + t * 2 * os, os);
   }
 }
 
 void FftComplexTwiddle02(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft02(re, im, s, re, im, s);
-  for (ptrdiff_t k = 1; k < m; ++k) {
-    DftTw02(re + k * os, im + k * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
+  Dft02(ScalarAccess{}, re, im, s, re, im, s);
+  ptrdiff_t k = 1;
+  if (im == re + 1) {
+    const InterleavedAccess p{os, os, 0, 1};
+    for (; k + 1 < m; k += 2) {
+      DftTw02(p, re + k * os, im + k * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
+    }
+  } else {
+    const LaneAccess p{os, os, 0, 1};
+    for (; k + 1 < m; k += 2) {
+      DftTw02(p, re + k * os, im + k * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
+    }
+  }
+  for (; k < m; ++k) {
+    DftTw02(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 1,
+           twSin + (k - 1) * 1);
   }
 }
 
 void FftRealLeaf02(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  for (ptrdiff_t t = 0; t < c; ++t) RealDft02(in + t * is, ls, out + t * 2 * os, os);
+  const LaneAccess p{is, 2 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 1 < c; t += 2) RealDft02(p, in + t * is, ls, out + t * 2 * os, os);
+  for (; t < c; ++t) RealDft02(ScalarAccess{}, in + t * is, ls, out + t * 2 * os, os);
 }
 
 void FftRealTwiddle02(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  RealDft02(data, s, data, s);
-  for (ptrdiff_t k = 1; 2 * k < m; ++k) {
-    RealTw02(data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
+  RealDft02(ScalarAccess{}, data, s, data, s);
+  const LaneAccess p{os, os, -os, 1};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 1) < m; k += 2) {
+    RealTw02(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 1,
+            twSin + (k - 1) * 1);
   }
-  if (m % 2 == 0) RealHalf02(data + (m / 2) * os, s);
+  for (; 2 * k < m; ++k) {
+    RealTw02(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 1,
+            twSin + (k - 1) * 1);
+  }
+  if (m % 2 == 0) RealHalf02(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

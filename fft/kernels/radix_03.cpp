@@ -4,141 +4,153 @@
 // twiddled complex DFT 16, 14; real DFT 4, 2; real combining group 16, 14.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count.
+// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
+// or butterflies run in the two lanes of a vector, a last odd one alone.
 // clang-format off
+#include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
 
 namespace {
 
-inline void Dft03(const double* xr, const double* xi, ptrdiff_t is, double* yr, double* yi,
-                 ptrdiff_t os) {
-  const double t0 = xr[0];
-  const double t1 = xi[0];
-  const double t2 = xr[is];
-  const double t3 = xi[is];
-  const double t4 = xr[2 * is];
-  const double t5 = xi[2 * is];
-  const double t6 = t2 + t4;
-  const double t7 = t3 + t5;
-  const double t8 = t2 - t4;
-  const double t9 = t3 - t5;
-  const double t10 = t0 + t6;
-  const double t11 = t1 + t7;
-  const double t12 = t10 - 1.5 * t6;
-  const double t13 = t11 - 1.5 * t7;
-  const double t14 = t12 + 0.866025403784438646764 * t9;
-  const double t15 = t13 - 0.866025403784438646764 * t8;
-  const double t16 = t12 - 0.866025403784438646764 * t9;
-  const double t17 = t13 + 0.866025403784438646764 * t8;
-  yr[0] = t10;
-  yi[0] = t11;
-  yr[os] = t14;
-  yi[os] = t15;
-  yr[2 * os] = t16;
-  yi[2 * os] = t17;
+using fftk::InterleavedAccess;
+using fftk::LaneAccess;
+using fftk::ScalarAccess;
+
+template <class P>
+inline void Dft03(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+                 double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  const T t6 = t2 + t4;
+  const T t7 = t3 + t5;
+  const T t8 = t2 - t4;
+  const T t9 = t3 - t5;
+  const T t10 = t0 + t6;
+  const T t11 = t1 + t7;
+  const T t12 = t10 - 1.5 * t6;
+  const T t13 = t11 - 1.5 * t7;
+  const T t14 = t12 + 0.866025403784438646764 * t9;
+  const T t15 = t13 - 0.866025403784438646764 * t8;
+  const T t16 = t12 - 0.866025403784438646764 * t9;
+  const T t17 = t13 + 0.866025403784438646764 * t8;
+  p.StC(yr, yi, t10, t11);
+  p.StC(yr + os, yi + os, t14, t15);
+  p.StC(yr + 2 * os, yi + 2 * os, t16, t17);
 }
 
-inline void DftTw03(double* re, double* im, ptrdiff_t s, const double* wc, const double* ws) {
-  const double t0 = re[0];
-  const double t1 = im[0];
-  const double t2 = re[s];
-  const double t3 = im[s];
-  const double t4 = wc[0];
-  const double t5 = ws[0];
-  const double t6 = t2 * t4 - t3 * t5;
-  const double t7 = t3 * t4 + t2 * t5;
-  const double t8 = re[2 * s];
-  const double t9 = im[2 * s];
-  const double t10 = wc[1];
-  const double t11 = ws[1];
-  const double t12 = t8 * t10 - t9 * t11;
-  const double t13 = t9 * t10 + t8 * t11;
-  const double t14 = t6 + t12;
-  const double t15 = t7 + t13;
-  const double t16 = t6 - t12;
-  const double t17 = t7 - t13;
-  const double t18 = t0 + t14;
-  const double t19 = t1 + t15;
-  const double t20 = t18 - 1.5 * t14;
-  const double t21 = t19 - 1.5 * t15;
-  const double t22 = t20 + 0.866025403784438646764 * t17;
-  const double t23 = t21 - 0.866025403784438646764 * t16;
-  const double t24 = t20 - 0.866025403784438646764 * t17;
-  const double t25 = t21 + 0.866025403784438646764 * t16;
-  re[0] = t18;
-  im[0] = t19;
-  re[s] = t22;
-  im[s] = t23;
-  re[2 * s] = t24;
-  im[2 * s] = t25;
+template <class P>
+inline void DftTw03(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+                   const double* ws) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = t2 * t4 - t3 * t5;
+  const T t7 = t3 * t4 + t2 * t5;
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = t8 * t10 - t9 * t11;
+  const T t13 = t9 * t10 + t8 * t11;
+  const T t14 = t6 + t12;
+  const T t15 = t7 + t13;
+  const T t16 = t6 - t12;
+  const T t17 = t7 - t13;
+  const T t18 = t0 + t14;
+  const T t19 = t1 + t15;
+  const T t20 = t18 - 1.5 * t14;
+  const T t21 = t19 - 1.5 * t15;
+  const T t22 = t20 + 0.866025403784438646764 * t17;
+  const T t23 = t21 - 0.866025403784438646764 * t16;
+  const T t24 = t20 - 0.866025403784438646764 * t17;
+  const T t25 = t21 + 0.866025403784438646764 * t16;
+  p.StC(re, im, t18, t19);
+  p.StC(re + s, im + s, t22, t23);
+  p.StC(re + 2 * s, im + 2 * s, t24, t25);
 }
 
-inline void RealDft03(const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
-  const double t0 = x[0];
-  const double t1 = x[is];
-  const double t2 = x[2 * is];
-  const double t3 = t1 + t2;
-  const double t4 = t1 - t2;
-  const double t5 = t0 + t3;
-  const double t6 = t5 - 1.5 * t3;
-  const double t7 = 0.866025403784438646764 * t4;
-  y[0] = t5;
-  y[os] = t6;
-  y[2 * os] = -t7;
+template <class P>
+inline void RealDft03(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t1 = p.Ld(x + is);
+  const T t2 = p.Ld(x + 2 * is);
+  const T t3 = t1 + t2;
+  const T t4 = t1 - t2;
+  const T t5 = t0 + t3;
+  const T t6 = t5 - 1.5 * t3;
+  const T t7 = 0.866025403784438646764 * t4;
+  p.St(y, t5);
+  p.St(y + os, t6);
+  p.St(y + 2 * os, -t7);
 }
 
-inline void RealTw03(double* a, double* b, ptrdiff_t s, const double* wc, const double* ws) {
-  const double t0 = a[0];
-  const double t1 = b[0];
-  const double t2 = a[s];
-  const double t3 = b[s];
-  const double t4 = wc[0];
-  const double t5 = ws[0];
-  const double t6 = t2 * t4 - t3 * t5;
-  const double t7 = t3 * t4 + t2 * t5;
-  const double t8 = a[2 * s];
-  const double t9 = b[2 * s];
-  const double t10 = wc[1];
-  const double t11 = ws[1];
-  const double t12 = t8 * t10 - t9 * t11;
-  const double t13 = t9 * t10 + t8 * t11;
-  const double t14 = t6 + t12;
-  const double t15 = t7 + t13;
-  const double t16 = t6 - t12;
-  const double t17 = t7 - t13;
-  const double t18 = t0 + t14;
-  const double t19 = t1 + t15;
-  const double t20 = t18 - 1.5 * t14;
-  const double t21 = t19 - 1.5 * t15;
-  const double t22 = t20 + 0.866025403784438646764 * t17;
-  const double t23 = t21 - 0.866025403784438646764 * t16;
-  const double t24 = t20 - 0.866025403784438646764 * t17;
-  const double t25 = t21 + 0.866025403784438646764 * t16;
-  a[0] = t18;
-  b[2 * s] = t19;
-  a[s] = t22;
-  b[s] = t23;
-  b[0] = t24;
-  a[2 * s] = -t25;
+template <class P>
+inline void RealTw03(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+                    const double* ws) {
+  using T = typename P::T;
+  const T t0 = p.Ld(a);
+  const T t1 = p.LdB(b);
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = t2 * t4 - t3 * t5;
+  const T t7 = t3 * t4 + t2 * t5;
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = t8 * t10 - t9 * t11;
+  const T t13 = t9 * t10 + t8 * t11;
+  const T t14 = t6 + t12;
+  const T t15 = t7 + t13;
+  const T t16 = t6 - t12;
+  const T t17 = t7 - t13;
+  const T t18 = t0 + t14;
+  const T t19 = t1 + t15;
+  const T t20 = t18 - 1.5 * t14;
+  const T t21 = t19 - 1.5 * t15;
+  const T t22 = t20 + 0.866025403784438646764 * t17;
+  const T t23 = t21 - 0.866025403784438646764 * t16;
+  const T t24 = t20 - 0.866025403784438646764 * t17;
+  const T t25 = t21 + 0.866025403784438646764 * t16;
+  p.St(a, t18);
+  p.StB(b + 2 * s, t19);
+  p.St(a + s, t22);
+  p.StB(b + s, t23);
+  p.StB(b, t24);
+  p.St(a + 2 * s, -t25);
 }
 
-inline void RealHalf03(double* x, ptrdiff_t s) {
-  const double t0 = x[0];
-  const double t1 = x[s];
-  const double t2 = 0.5 * t1;
-  const double t3 = 0.866025403784438646764 * t1;
-  const double t4 = x[2 * s];
-  const double t5 = 0.5 * t4;
-  const double t6 = 0.866025403784438646764 * t4;
-  const double t7 = t2 - t5;
-  const double t8 = t3 + t6;
-  const double t10 = t6 - t3;
-  const double t11 = t0 + t7;
-  const double t12 = t11 - 1.5 * t7;
-  const double t14 = t12 + 0.866025403784438646764 * t10;
-  x[0] = t11;
-  x[2 * s] = -t8;
-  x[s] = t14;
+template <class P>
+inline void RealHalf03(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.5 * t1;
+  const T t3 = 0.866025403784438646764 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.5 * t4;
+  const T t6 = 0.866025403784438646764 * t4;
+  const T t7 = t2 - t5;
+  const T t8 = t3 + t6;
+  const T t10 = t6 - t3;
+  const T t11 = t0 + t7;
+  const T t12 = t11 - 1.5 * t7;
+  const T t14 = t12 + 0.866025403784438646764 * t10;
+  p.St(x, t11);
+  p.St(x + 2 * s, -t8);
+  p.St(x + s, t14);
 }
 
 }  // namespace
@@ -146,32 +158,68 @@ inline void RealHalf03(double* x, ptrdiff_t s) {
 void FftComplexLeaf03(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  for (ptrdiff_t t = 0; t < c; ++t) {
-    Dft03(inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
+  ptrdiff_t t = 0;
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const InterleavedAccess p{is, 3 * os, 0, 0};
+    for (; t + 1 < c; t += 2) {
+      Dft03(p, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
+    }
+  } else {
+    const LaneAccess p{is, 3 * os, 0, 0};
+    for (; t + 1 < c; t += 2) {
+      Dft03(p, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
+    }
+  }
+  for (; t < c; ++t) {
+    Dft03(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os,
+          outIm + t * 3 * os, os);
   }
 }
 
 void FftComplexTwiddle03(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft03(re, im, s, re, im, s);
-  for (ptrdiff_t k = 1; k < m; ++k) {
-    DftTw03(re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
+  Dft03(ScalarAccess{}, re, im, s, re, im, s);
+  ptrdiff_t k = 1;
+  if (im == re + 1) {
+    const InterleavedAccess p{os, os, 0, 2};
+    for (; k + 1 < m; k += 2) {
+      DftTw03(p, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
+    }
+  } else {
+    const LaneAccess p{os, os, 0, 2};
+    for (; k + 1 < m; k += 2) {
+      DftTw03(p, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
+    }
+  }
+  for (; k < m; ++k) {
+    DftTw03(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 2,
+           twSin + (k - 1) * 2);
   }
 }
 
 void FftRealLeaf03(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  for (ptrdiff_t t = 0; t < c; ++t) RealDft03(in + t * is, ls, out + t * 3 * os, os);
+  const LaneAccess p{is, 3 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 1 < c; t += 2) RealDft03(p, in + t * is, ls, out + t * 3 * os, os);
+  for (; t < c; ++t) RealDft03(ScalarAccess{}, in + t * is, ls, out + t * 3 * os, os);
 }
 
 void FftRealTwiddle03(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  RealDft03(data, s, data, s);
-  for (ptrdiff_t k = 1; 2 * k < m; ++k) {
-    RealTw03(data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
+  RealDft03(ScalarAccess{}, data, s, data, s);
+  const LaneAccess p{os, os, -os, 2};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 1) < m; k += 2) {
+    RealTw03(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 2,
+            twSin + (k - 1) * 2);
   }
-  if (m % 2 == 0) RealHalf03(data + (m / 2) * os, s);
+  for (; 2 * k < m; ++k) {
+    RealTw03(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 2,
+            twSin + (k - 1) * 2);
+  }
+  if (m % 2 == 0) RealHalf03(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

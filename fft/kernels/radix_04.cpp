@@ -4,180 +4,190 @@
 // twiddled complex DFT 22, 12; real DFT 6, 0; real combining group 22, 12.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count.
+// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
+// or butterflies run in the two lanes of a vector, a last odd one alone.
 // clang-format off
+#include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
 
 namespace {
 
-inline void Dft04(const double* xr, const double* xi, ptrdiff_t is, double* yr, double* yi,
-                 ptrdiff_t os) {
-  const double t0 = xr[0];
-  const double t1 = xi[0];
-  const double t2 = xr[is];
-  const double t3 = xi[is];
-  const double t4 = xr[2 * is];
-  const double t5 = xi[2 * is];
-  const double t6 = xr[3 * is];
-  const double t7 = xi[3 * is];
-  const double t8 = t0 + t4;
-  const double t9 = t1 + t5;
-  const double t10 = t0 - t4;
-  const double t11 = t1 - t5;
-  const double t12 = t2 + t6;
-  const double t13 = t3 + t7;
-  const double t14 = t2 - t6;
-  const double t15 = t3 - t7;
-  const double t16 = t8 + t12;
-  const double t17 = t9 + t13;
-  const double t18 = t8 - t12;
-  const double t19 = t9 - t13;
-  const double t20 = t10 + t15;
-  const double t21 = t11 - t14;
-  const double t22 = t10 - t15;
-  const double t23 = t11 + t14;
-  yr[0] = t16;
-  yi[0] = t17;
-  yr[os] = t20;
-  yi[os] = t21;
-  yr[2 * os] = t18;
-  yi[2 * os] = t19;
-  yr[3 * os] = t22;
-  yi[3 * os] = t23;
+using fftk::InterleavedAccess;
+using fftk::LaneAccess;
+using fftk::ScalarAccess;
+
+template <class P>
+inline void Dft04(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+                 double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  const T t8 = t0 + t4;
+  const T t9 = t1 + t5;
+  const T t10 = t0 - t4;
+  const T t11 = t1 - t5;
+  const T t12 = t2 + t6;
+  const T t13 = t3 + t7;
+  const T t14 = t2 - t6;
+  const T t15 = t3 - t7;
+  const T t16 = t8 + t12;
+  const T t17 = t9 + t13;
+  const T t18 = t8 - t12;
+  const T t19 = t9 - t13;
+  const T t20 = t10 + t15;
+  const T t21 = t11 - t14;
+  const T t22 = t10 - t15;
+  const T t23 = t11 + t14;
+  p.StC(yr, yi, t16, t17);
+  p.StC(yr + os, yi + os, t20, t21);
+  p.StC(yr + 2 * os, yi + 2 * os, t18, t19);
+  p.StC(yr + 3 * os, yi + 3 * os, t22, t23);
 }
 
-inline void DftTw04(double* re, double* im, ptrdiff_t s, const double* wc, const double* ws) {
-  const double t0 = re[0];
-  const double t1 = im[0];
-  const double t2 = re[s];
-  const double t3 = im[s];
-  const double t4 = wc[0];
-  const double t5 = ws[0];
-  const double t6 = t2 * t4 - t3 * t5;
-  const double t7 = t3 * t4 + t2 * t5;
-  const double t8 = re[2 * s];
-  const double t9 = im[2 * s];
-  const double t10 = wc[1];
-  const double t11 = ws[1];
-  const double t12 = t8 * t10 - t9 * t11;
-  const double t13 = t9 * t10 + t8 * t11;
-  const double t14 = re[3 * s];
-  const double t15 = im[3 * s];
-  const double t16 = wc[2];
-  const double t17 = ws[2];
-  const double t18 = t14 * t16 - t15 * t17;
-  const double t19 = t15 * t16 + t14 * t17;
-  const double t20 = t0 + t12;
-  const double t21 = t1 + t13;
-  const double t22 = t0 - t12;
-  const double t23 = t1 - t13;
-  const double t24 = t6 + t18;
-  const double t25 = t7 + t19;
-  const double t26 = t6 - t18;
-  const double t27 = t7 - t19;
-  const double t28 = t20 + t24;
-  const double t29 = t21 + t25;
-  const double t30 = t20 - t24;
-  const double t31 = t21 - t25;
-  const double t32 = t22 + t27;
-  const double t33 = t23 - t26;
-  const double t34 = t22 - t27;
-  const double t35 = t23 + t26;
-  re[0] = t28;
-  im[0] = t29;
-  re[s] = t32;
-  im[s] = t33;
-  re[2 * s] = t30;
-  im[2 * s] = t31;
-  re[3 * s] = t34;
-  im[3 * s] = t35;
+template <class P>
+inline void DftTw04(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+                   const double* ws) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = t2 * t4 - t3 * t5;
+  const T t7 = t3 * t4 + t2 * t5;
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = t8 * t10 - t9 * t11;
+  const T t13 = t9 * t10 + t8 * t11;
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = t14 * t16 - t15 * t17;
+  const T t19 = t15 * t16 + t14 * t17;
+  const T t20 = t0 + t12;
+  const T t21 = t1 + t13;
+  const T t22 = t0 - t12;
+  const T t23 = t1 - t13;
+  const T t24 = t6 + t18;
+  const T t25 = t7 + t19;
+  const T t26 = t6 - t18;
+  const T t27 = t7 - t19;
+  const T t28 = t20 + t24;
+  const T t29 = t21 + t25;
+  const T t30 = t20 - t24;
+  const T t31 = t21 - t25;
+  const T t32 = t22 + t27;
+  const T t33 = t23 - t26;
+  const T t34 = t22 - t27;
+  const T t35 = t23 + t26;
+  p.StC(re, im, t28, t29);
+  p.StC(re + s, im + s, t32, t33);
+  p.StC(re + 2 * s, im + 2 * s, t30, t31);
+  p.StC(re + 3 * s, im + 3 * s, t34, t35);
 }
 
-inline void RealDft04(const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
-  const double t0 = x[0];
-  const double t1 = x[is];
-  const double t2 = x[2 * is];
-  const double t3 = x[3 * is];
-  const double t4 = t0 + t2;
-  const double t5 = t0 - t2;
-  const double t6 = t1 + t3;
-  const double t7 = t1 - t3;
-  const double t8 = t4 + t6;
-  const double t9 = t4 - t6;
-  y[0] = t8;
-  y[os] = t5;
-  y[2 * os] = t9;
-  y[3 * os] = -t7;
+template <class P>
+inline void RealDft04(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t1 = p.Ld(x + is);
+  const T t2 = p.Ld(x + 2 * is);
+  const T t3 = p.Ld(x + 3 * is);
+  const T t4 = t0 + t2;
+  const T t5 = t0 - t2;
+  const T t6 = t1 + t3;
+  const T t7 = t1 - t3;
+  const T t8 = t4 + t6;
+  const T t9 = t4 - t6;
+  p.St(y, t8);
+  p.St(y + os, t5);
+  p.St(y + 2 * os, t9);
+  p.St(y + 3 * os, -t7);
 }
 
-inline void RealTw04(double* a, double* b, ptrdiff_t s, const double* wc, const double* ws) {
-  const double t0 = a[0];
-  const double t1 = b[0];
-  const double t2 = a[s];
-  const double t3 = b[s];
-  const double t4 = wc[0];
-  const double t5 = ws[0];
-  const double t6 = t2 * t4 - t3 * t5;
-  const double t7 = t3 * t4 + t2 * t5;
-  const double t8 = a[2 * s];
-  const double t9 = b[2 * s];
-  const double t10 = wc[1];
-  const double t11 = ws[1];
-  const double t12 = t8 * t10 - t9 * t11;
-  const double t13 = t9 * t10 + t8 * t11;
-  const double t14 = a[3 * s];
-  const double t15 = b[3 * s];
-  const double t16 = wc[2];
-  const double t17 = ws[2];
-  const double t18 = t14 * t16 - t15 * t17;
-  const double t19 = t15 * t16 + t14 * t17;
-  const double t20 = t0 + t12;
-  const double t21 = t1 + t13;
-  const double t22 = t0 - t12;
-  const double t23 = t1 - t13;
-  const double t24 = t6 + t18;
-  const double t25 = t7 + t19;
-  const double t26 = t6 - t18;
-  const double t27 = t7 - t19;
-  const double t28 = t20 + t24;
-  const double t29 = t21 + t25;
-  const double t30 = t20 - t24;
-  const double t31 = t21 - t25;
-  const double t32 = t22 + t27;
-  const double t33 = t23 - t26;
-  const double t34 = t22 - t27;
-  const double t35 = t23 + t26;
-  a[0] = t28;
-  b[3 * s] = t29;
-  a[s] = t32;
-  b[2 * s] = t33;
-  b[s] = t30;
-  a[2 * s] = -t31;
-  b[0] = t34;
-  a[3 * s] = -t35;
+template <class P>
+inline void RealTw04(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+                    const double* ws) {
+  using T = typename P::T;
+  const T t0 = p.Ld(a);
+  const T t1 = p.LdB(b);
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = t2 * t4 - t3 * t5;
+  const T t7 = t3 * t4 + t2 * t5;
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = t8 * t10 - t9 * t11;
+  const T t13 = t9 * t10 + t8 * t11;
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = t14 * t16 - t15 * t17;
+  const T t19 = t15 * t16 + t14 * t17;
+  const T t20 = t0 + t12;
+  const T t21 = t1 + t13;
+  const T t22 = t0 - t12;
+  const T t23 = t1 - t13;
+  const T t24 = t6 + t18;
+  const T t25 = t7 + t19;
+  const T t26 = t6 - t18;
+  const T t27 = t7 - t19;
+  const T t28 = t20 + t24;
+  const T t29 = t21 + t25;
+  const T t30 = t20 - t24;
+  const T t31 = t21 - t25;
+  const T t32 = t22 + t27;
+  const T t33 = t23 - t26;
+  const T t34 = t22 - t27;
+  const T t35 = t23 + t26;
+  p.St(a, t28);
+  p.StB(b + 3 * s, t29);
+  p.St(a + s, t32);
+  p.StB(b + 2 * s, t33);
+  p.StB(b + s, t30);
+  p.St(a + 2 * s, -t31);
+  p.StB(b, t34);
+  p.St(a + 3 * s, -t35);
 }
 
-inline void RealHalf04(double* x, ptrdiff_t s) {
-  const double t0 = x[0];
-  const double t1 = x[s];
-  const double t2 = 0.707106781186547524401 * t1;
-  const double t3 = 0.707106781186547524401 * t1;
-  const double t4 = x[2 * s];
-  const double t5 = x[3 * s];
-  const double t6 = 0.707106781186547524401 * t5;
-  const double t7 = 0.707106781186547524401 * t5;
-  const double t8 = t2 - t6;
-  const double t9 = t3 + t7;
-  const double t10 = t2 + t6;
-  const double t11 = t7 - t3;
-  const double t12 = t0 + t8;
-  const double t13 = t4 + t9;
-  const double t16 = t0 + t11;
-  const double t17 = t4 - t10;
-  x[0] = t12;
-  x[3 * s] = -t13;
-  x[s] = t16;
-  x[2 * s] = t17;
+template <class P>
+inline void RealHalf04(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.707106781186547524401 * t1;
+  const T t3 = 0.707106781186547524401 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = p.Ld(x + 3 * s);
+  const T t6 = 0.707106781186547524401 * t5;
+  const T t7 = 0.707106781186547524401 * t5;
+  const T t8 = t2 - t6;
+  const T t9 = t3 + t7;
+  const T t10 = t2 + t6;
+  const T t11 = t7 - t3;
+  const T t12 = t0 + t8;
+  const T t13 = t4 + t9;
+  const T t16 = t0 + t11;
+  const T t17 = t4 - t10;
+  p.St(x, t12);
+  p.St(x + 3 * s, -t13);
+  p.St(x + s, t16);
+  p.St(x + 2 * s, t17);
 }
 
 }  // namespace
@@ -185,32 +195,68 @@ inline void RealHalf04(double* x, ptrdiff_t s) {
 void FftComplexLeaf04(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  for (ptrdiff_t t = 0; t < c; ++t) {
-    Dft04(inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
+  ptrdiff_t t = 0;
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const InterleavedAccess p{is, 4 * os, 0, 0};
+    for (; t + 1 < c; t += 2) {
+      Dft04(p, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
+    }
+  } else {
+    const LaneAccess p{is, 4 * os, 0, 0};
+    for (; t + 1 < c; t += 2) {
+      Dft04(p, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
+    }
+  }
+  for (; t < c; ++t) {
+    Dft04(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os,
+          outIm + t * 4 * os, os);
   }
 }
 
 void FftComplexTwiddle04(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft04(re, im, s, re, im, s);
-  for (ptrdiff_t k = 1; k < m; ++k) {
-    DftTw04(re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
+  Dft04(ScalarAccess{}, re, im, s, re, im, s);
+  ptrdiff_t k = 1;
+  if (im == re + 1) {
+    const InterleavedAccess p{os, os, 0, 3};
+    for (; k + 1 < m; k += 2) {
+      DftTw04(p, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
+    }
+  } else {
+    const LaneAccess p{os, os, 0, 3};
+    for (; k + 1 < m; k += 2) {
+      DftTw04(p, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
+    }
+  }
+  for (; k < m; ++k) {
+    DftTw04(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 3,
+           twSin + (k - 1) * 3);
   }
 }
 
 void FftRealLeaf04(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  for (ptrdiff_t t = 0; t < c; ++t) RealDft04(in + t * is, ls, out + t * 4 * os, os);
+  const LaneAccess p{is, 4 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 1 < c; t += 2) RealDft04(p, in + t * is, ls, out + t * 4 * os, os);
+  for (; t < c; ++t) RealDft04(ScalarAccess{}, in + t * is, ls, out + t * 4 * os, os);
 }
 
 void FftRealTwiddle04(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  RealDft04(data, s, data, s);
-  for (ptrdiff_t k = 1; 2 * k < m; ++k) {
-    RealTw04(data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
+  RealDft04(ScalarAccess{}, data, s, data, s);
+  const LaneAccess p{os, os, -os, 3};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 1) < m; k += 2) {
+    RealTw04(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 3,
+            twSin + (k - 1) * 3);
   }
-  if (m % 2 == 0) RealHalf04(data + (m / 2) * os, s);
+  for (; 2 * k < m; ++k) {
+    RealTw04(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 3,
+            twSin + (k - 1) * 3);
+  }
+  if (m % 2 == 0) RealHalf04(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

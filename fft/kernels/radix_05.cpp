@@ -4,252 +4,260 @@
 // twiddled complex DFT 40, 32; real DFT 12, 8; real combining group 40, 32.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count.
+// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
+// or butterflies run in the two lanes of a vector, a last odd one alone.
 // clang-format off
+#include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
 
 namespace {
 
-inline void Dft05(const double* xr, const double* xi, ptrdiff_t is, double* yr, double* yi,
-                 ptrdiff_t os) {
-  const double t0 = xr[0];
-  const double t1 = xi[0];
-  const double t2 = xr[is];
-  const double t3 = xi[is];
-  const double t4 = xr[2 * is];
-  const double t5 = xi[2 * is];
-  const double t6 = xr[3 * is];
-  const double t7 = xi[3 * is];
-  const double t8 = xr[4 * is];
-  const double t9 = xi[4 * is];
-  const double t10 = t2 + t8;
-  const double t11 = t3 + t9;
-  const double t12 = t4 + t6;
-  const double t13 = t5 + t7;
-  const double t14 = t2 - t8;
-  const double t15 = t3 - t9;
-  const double t16 = t4 - t6;
-  const double t17 = t5 - t7;
-  const double t18 = t0 + t10 + t12;
-  const double t19 = t1 + t11 + t13;
-  const double t20 = t0 + 0.309016994374947424102 * t10 - 0.809016994374947424102 * t12;
-  const double t21 = t1 + 0.309016994374947424102 * t11 - 0.809016994374947424102 * t13;
-  const double t22 = 0.951056516295153572116 * t15 + 0.587785252292473129169 * t17;
-  const double t23 = 0.951056516295153572116 * t14 + 0.587785252292473129169 * t16;
-  const double t24 = t20 + t22;
-  const double t25 = t21 - t23;
-  const double t26 = t20 - t22;
-  const double t27 = t21 + t23;
-  const double t28 = t0 - 0.809016994374947424102 * t10 + 0.309016994374947424102 * t12;
-  const double t29 = t1 - 0.809016994374947424102 * t11 + 0.309016994374947424102 * t13;
-  const double t30 = 0.587785252292473129169 * t15 - 0.951056516295153572116 * t17;
-  const double t31 = 0.587785252292473129169 * t14 - 0.951056516295153572116 * t16;
-  const double t32 = t28 + t30;
-  const double t33 = t29 - t31;
-  const double t34 = t28 - t30;
-  const double t35 = t29 + t31;
-  yr[0] = t18;
-  yi[0] = t19;
-  yr[os] = t24;
-  yi[os] = t25;
-  yr[2 * os] = t32;
-  yi[2 * os] = t33;
-  yr[3 * os] = t34;
-  yi[3 * os] = t35;
-  yr[4 * os] = t26;
-  yi[4 * os] = t27;
+using fftk::InterleavedAccess;
+using fftk::LaneAccess;
+using fftk::ScalarAccess;
+
+template <class P>
+inline void Dft05(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+                 double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  const T t10 = t2 + t8;
+  const T t11 = t3 + t9;
+  const T t12 = t4 + t6;
+  const T t13 = t5 + t7;
+  const T t14 = t2 - t8;
+  const T t15 = t3 - t9;
+  const T t16 = t4 - t6;
+  const T t17 = t5 - t7;
+  const T t18 = t0 + t10 + t12;
+  const T t19 = t1 + t11 + t13;
+  const T t20 = t0 + 0.309016994374947424102 * t10 - 0.809016994374947424102 * t12;
+  const T t21 = t1 + 0.309016994374947424102 * t11 - 0.809016994374947424102 * t13;
+  const T t22 = 0.951056516295153572116 * t15 + 0.587785252292473129169 * t17;
+  const T t23 = 0.951056516295153572116 * t14 + 0.587785252292473129169 * t16;
+  const T t24 = t20 + t22;
+  const T t25 = t21 - t23;
+  const T t26 = t20 - t22;
+  const T t27 = t21 + t23;
+  const T t28 = t0 - 0.809016994374947424102 * t10 + 0.309016994374947424102 * t12;
+  const T t29 = t1 - 0.809016994374947424102 * t11 + 0.309016994374947424102 * t13;
+  const T t30 = 0.587785252292473129169 * t15 - 0.951056516295153572116 * t17;
+  const T t31 = 0.587785252292473129169 * t14 - 0.951056516295153572116 * t16;
+  const T t32 = t28 + t30;
+  const T t33 = t29 - t31;
+  const T t34 = t28 - t30;
+  const T t35 = t29 + t31;
+  p.StC(yr, yi, t18, t19);
+  p.StC(yr + os, yi + os, t24, t25);
+  p.StC(yr + 2 * os, yi + 2 * os, t32, t33);
+  p.StC(yr + 3 * os, yi + 3 * os, t34, t35);
+  p.StC(yr + 4 * os, yi + 4 * os, t26, t27);
 }
 
-inline void DftTw05(double* re, double* im, ptrdiff_t s, const double* wc, const double* ws) {
-  const double t0 = re[0];
-  const double t1 = im[0];
-  const double t2 = re[s];
-  const double t3 = im[s];
-  const double t4 = wc[0];
-  const double t5 = ws[0];
-  const double t6 = t2 * t4 - t3 * t5;
-  const double t7 = t3 * t4 + t2 * t5;
-  const double t8 = re[2 * s];
-  const double t9 = im[2 * s];
-  const double t10 = wc[1];
-  const double t11 = ws[1];
-  const double t12 = t8 * t10 - t9 * t11;
-  const double t13 = t9 * t10 + t8 * t11;
-  const double t14 = re[3 * s];
-  const double t15 = im[3 * s];
-  const double t16 = wc[2];
-  const double t17 = ws[2];
-  const double t18 = t14 * t16 - t15 * t17;
-  const double t19 = t15 * t16 + t14 * t17;
-  const double t20 = re[4 * s];
-  const double t21 = im[4 * s];
-  const double t22 = wc[3];
-  const double t23 = ws[3];
-  const double t24 = t20 * t22 - t21 * t23;
-  const double t25 = t21 * t22 + t20 * t23;
-  const double t26 = t6 + t24;
-  const double t27 = t7 + t25;
-  const double t28 = t12 + t18;
-  const double t29 = t13 + t19;
-  const double t30 = t6 - t24;
-  const double t31 = t7 - t25;
-  const double t32 = t12 - t18;
-  const double t33 = t13 - t19;
-  const double t34 = t0 + t26 + t28;
-  const double t35 = t1 + t27 + t29;
-  const double t36 = t0 + 0.309016994374947424102 * t26 - 0.809016994374947424102 * t28;
-  const double t37 = t1 + 0.309016994374947424102 * t27 - 0.809016994374947424102 * t29;
-  const double t38 = 0.951056516295153572116 * t31 + 0.587785252292473129169 * t33;
-  const double t39 = 0.951056516295153572116 * t30 + 0.587785252292473129169 * t32;
-  const double t40 = t36 + t38;
-  const double t41 = t37 - t39;
-  const double t42 = t36 - t38;
-  const double t43 = t37 + t39;
-  const double t44 = t0 - 0.809016994374947424102 * t26 + 0.309016994374947424102 * t28;
-  const double t45 = t1 - 0.809016994374947424102 * t27 + 0.309016994374947424102 * t29;
-  const double t46 = 0.587785252292473129169 * t31 - 0.951056516295153572116 * t33;
-  const double t47 = 0.587785252292473129169 * t30 - 0.951056516295153572116 * t32;
-  const double t48 = t44 + t46;
-  const double t49 = t45 - t47;
-  const double t50 = t44 - t46;
-  const double t51 = t45 + t47;
-  re[0] = t34;
-  im[0] = t35;
-  re[s] = t40;
-  im[s] = t41;
-  re[2 * s] = t48;
-  im[2 * s] = t49;
-  re[3 * s] = t50;
-  im[3 * s] = t51;
-  re[4 * s] = t42;
-  im[4 * s] = t43;
+template <class P>
+inline void DftTw05(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+                   const double* ws) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = t2 * t4 - t3 * t5;
+  const T t7 = t3 * t4 + t2 * t5;
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = t8 * t10 - t9 * t11;
+  const T t13 = t9 * t10 + t8 * t11;
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = t14 * t16 - t15 * t17;
+  const T t19 = t15 * t16 + t14 * t17;
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = t20 * t22 - t21 * t23;
+  const T t25 = t21 * t22 + t20 * t23;
+  const T t26 = t6 + t24;
+  const T t27 = t7 + t25;
+  const T t28 = t12 + t18;
+  const T t29 = t13 + t19;
+  const T t30 = t6 - t24;
+  const T t31 = t7 - t25;
+  const T t32 = t12 - t18;
+  const T t33 = t13 - t19;
+  const T t34 = t0 + t26 + t28;
+  const T t35 = t1 + t27 + t29;
+  const T t36 = t0 + 0.309016994374947424102 * t26 - 0.809016994374947424102 * t28;
+  const T t37 = t1 + 0.309016994374947424102 * t27 - 0.809016994374947424102 * t29;
+  const T t38 = 0.951056516295153572116 * t31 + 0.587785252292473129169 * t33;
+  const T t39 = 0.951056516295153572116 * t30 + 0.587785252292473129169 * t32;
+  const T t40 = t36 + t38;
+  const T t41 = t37 - t39;
+  const T t42 = t36 - t38;
+  const T t43 = t37 + t39;
+  const T t44 = t0 - 0.809016994374947424102 * t26 + 0.309016994374947424102 * t28;
+  const T t45 = t1 - 0.809016994374947424102 * t27 + 0.309016994374947424102 * t29;
+  const T t46 = 0.587785252292473129169 * t31 - 0.951056516295153572116 * t33;
+  const T t47 = 0.587785252292473129169 * t30 - 0.951056516295153572116 * t32;
+  const T t48 = t44 + t46;
+  const T t49 = t45 - t47;
+  const T t50 = t44 - t46;
+  const T t51 = t45 + t47;
+  p.StC(re, im, t34, t35);
+  p.StC(re + s, im + s, t40, t41);
+  p.StC(re + 2 * s, im + 2 * s, t48, t49);
+  p.StC(re + 3 * s, im + 3 * s, t50, t51);
+  p.StC(re + 4 * s, im + 4 * s, t42, t43);
 }
 
-inline void RealDft05(const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
-  const double t0 = x[0];
-  const double t1 = x[is];
-  const double t2 = x[2 * is];
-  const double t3 = x[3 * is];
-  const double t4 = x[4 * is];
-  const double t5 = t1 + t4;
-  const double t6 = t2 + t3;
-  const double t7 = t1 - t4;
-  const double t8 = t2 - t3;
-  const double t9 = t0 + t5 + t6;
-  const double t10 = t0 + 0.309016994374947424102 * t5 - 0.809016994374947424102 * t6;
-  const double t11 = 0.951056516295153572116 * t7 + 0.587785252292473129169 * t8;
-  const double t12 = t0 - 0.809016994374947424102 * t5 + 0.309016994374947424102 * t6;
-  const double t13 = 0.587785252292473129169 * t7 - 0.951056516295153572116 * t8;
-  y[0] = t9;
-  y[os] = t10;
-  y[2 * os] = t12;
-  y[4 * os] = -t11;
-  y[3 * os] = -t13;
+template <class P>
+inline void RealDft05(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t1 = p.Ld(x + is);
+  const T t2 = p.Ld(x + 2 * is);
+  const T t3 = p.Ld(x + 3 * is);
+  const T t4 = p.Ld(x + 4 * is);
+  const T t5 = t1 + t4;
+  const T t6 = t2 + t3;
+  const T t7 = t1 - t4;
+  const T t8 = t2 - t3;
+  const T t9 = t0 + t5 + t6;
+  const T t10 = t0 + 0.309016994374947424102 * t5 - 0.809016994374947424102 * t6;
+  const T t11 = 0.951056516295153572116 * t7 + 0.587785252292473129169 * t8;
+  const T t12 = t0 - 0.809016994374947424102 * t5 + 0.309016994374947424102 * t6;
+  const T t13 = 0.587785252292473129169 * t7 - 0.951056516295153572116 * t8;
+  p.St(y, t9);
+  p.St(y + os, t10);
+  p.St(y + 2 * os, t12);
+  p.St(y + 4 * os, -t11);
+  p.St(y + 3 * os, -t13);
 }
 
-inline void RealTw05(double* a, double* b, ptrdiff_t s, const double* wc, const double* ws) {
-  const double t0 = a[0];
-  const double t1 = b[0];
-  const double t2 = a[s];
-  const double t3 = b[s];
-  const double t4 = wc[0];
-  const double t5 = ws[0];
-  const double t6 = t2 * t4 - t3 * t5;
-  const double t7 = t3 * t4 + t2 * t5;
-  const double t8 = a[2 * s];
-  const double t9 = b[2 * s];
-  const double t10 = wc[1];
-  const double t11 = ws[1];
-  const double t12 = t8 * t10 - t9 * t11;
-  const double t13 = t9 * t10 + t8 * t11;
-  const double t14 = a[3 * s];
-  const double t15 = b[3 * s];
-  const double t16 = wc[2];
-  const double t17 = ws[2];
-  const double t18 = t14 * t16 - t15 * t17;
-  const double t19 = t15 * t16 + t14 * t17;
-  const double t20 = a[4 * s];
-  const double t21 = b[4 * s];
-  const double t22 = wc[3];
-  const double t23 = ws[3];
-  const double t24 = t20 * t22 - t21 * t23;
-  const double t25 = t21 * t22 + t20 * t23;
-  const double t26 = t6 + t24;
-  const double t27 = t7 + t25;
-  const double t28 = t12 + t18;
-  const double t29 = t13 + t19;
-  const double t30 = t6 - t24;
-  const double t31 = t7 - t25;
-  const double t32 = t12 - t18;
-  const double t33 = t13 - t19;
-  const double t34 = t0 + t26 + t28;
-  const double t35 = t1 + t27 + t29;
-  const double t36 = t0 + 0.309016994374947424102 * t26 - 0.809016994374947424102 * t28;
-  const double t37 = t1 + 0.309016994374947424102 * t27 - 0.809016994374947424102 * t29;
-  const double t38 = 0.951056516295153572116 * t31 + 0.587785252292473129169 * t33;
-  const double t39 = 0.951056516295153572116 * t30 + 0.587785252292473129169 * t32;
-  const double t40 = t36 + t38;
-  const double t41 = t37 - t39;
-  const double t42 = t36 - t38;
-  const double t43 = t37 + t39;
-  const double t44 = t0 - 0.809016994374947424102 * t26 + 0.309016994374947424102 * t28;
-  const double t45 = t1 - 0.809016994374947424102 * t27 + 0.309016994374947424102 * t29;
-  const double t46 = 0.587785252292473129169 * t31 - 0.951056516295153572116 * t33;
-  const double t47 = 0.587785252292473129169 * t30 - 0.951056516295153572116 * t32;
-  const double t48 = t44 + t46;
-  const double t49 = t45 - t47;
-  const double t50 = t44 - t46;
-  const double t51 = t45 + t47;
-  a[0] = t34;
-  b[4 * s] = t35;
-  a[s] = t40;
-  b[3 * s] = t41;
-  a[2 * s] = t48;
-  b[2 * s] = t49;
-  b[s] = t50;
-  a[3 * s] = -t51;
-  b[0] = t42;
-  a[4 * s] = -t43;
+template <class P>
+inline void RealTw05(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+                    const double* ws) {
+  using T = typename P::T;
+  const T t0 = p.Ld(a);
+  const T t1 = p.LdB(b);
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = t2 * t4 - t3 * t5;
+  const T t7 = t3 * t4 + t2 * t5;
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = t8 * t10 - t9 * t11;
+  const T t13 = t9 * t10 + t8 * t11;
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = t14 * t16 - t15 * t17;
+  const T t19 = t15 * t16 + t14 * t17;
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = t20 * t22 - t21 * t23;
+  const T t25 = t21 * t22 + t20 * t23;
+  const T t26 = t6 + t24;
+  const T t27 = t7 + t25;
+  const T t28 = t12 + t18;
+  const T t29 = t13 + t19;
+  const T t30 = t6 - t24;
+  const T t31 = t7 - t25;
+  const T t32 = t12 - t18;
+  const T t33 = t13 - t19;
+  const T t34 = t0 + t26 + t28;
+  const T t35 = t1 + t27 + t29;
+  const T t36 = t0 + 0.309016994374947424102 * t26 - 0.809016994374947424102 * t28;
+  const T t37 = t1 + 0.309016994374947424102 * t27 - 0.809016994374947424102 * t29;
+  const T t38 = 0.951056516295153572116 * t31 + 0.587785252292473129169 * t33;
+  const T t39 = 0.951056516295153572116 * t30 + 0.587785252292473129169 * t32;
+  const T t40 = t36 + t38;
+  const T t41 = t37 - t39;
+  const T t42 = t36 - t38;
+  const T t43 = t37 + t39;
+  const T t44 = t0 - 0.809016994374947424102 * t26 + 0.309016994374947424102 * t28;
+  const T t45 = t1 - 0.809016994374947424102 * t27 + 0.309016994374947424102 * t29;
+  const T t46 = 0.587785252292473129169 * t31 - 0.951056516295153572116 * t33;
+  const T t47 = 0.587785252292473129169 * t30 - 0.951056516295153572116 * t32;
+  const T t48 = t44 + t46;
+  const T t49 = t45 - t47;
+  const T t50 = t44 - t46;
+  const T t51 = t45 + t47;
+  p.St(a, t34);
+  p.StB(b + 4 * s, t35);
+  p.St(a + s, t40);
+  p.StB(b + 3 * s, t41);
+  p.St(a + 2 * s, t48);
+  p.StB(b + 2 * s, t49);
+  p.StB(b + s, t50);
+  p.St(a + 3 * s, -t51);
+  p.StB(b, t42);
+  p.St(a + 4 * s, -t43);
 }
 
-inline void RealHalf05(double* x, ptrdiff_t s) {
-  const double t0 = x[0];
-  const double t1 = x[s];
-  const double t2 = 0.809016994374947424102 * t1;
-  const double t3 = 0.587785252292473129169 * t1;
-  const double t4 = x[2 * s];
-  const double t5 = 0.309016994374947424102 * t4;
-  const double t6 = 0.951056516295153572116 * t4;
-  const double t7 = x[3 * s];
-  const double t8 = 0.309016994374947424102 * t7;
-  const double t9 = 0.951056516295153572116 * t7;
-  const double t10 = x[4 * s];
-  const double t11 = 0.809016994374947424102 * t10;
-  const double t12 = 0.587785252292473129169 * t10;
-  const double t13 = t2 - t11;
-  const double t14 = t3 + t12;
-  const double t15 = t5 - t8;
-  const double t16 = t6 + t9;
-  const double t17 = t2 + t11;
-  const double t18 = t12 - t3;
-  const double t19 = t5 + t8;
-  const double t20 = t9 - t6;
-  const double t21 = t0 + t13 + t15;
-  const double t22 = t14 + t16;
-  const double t23 = t0 + 0.309016994374947424102 * t13 - 0.809016994374947424102 * t15;
-  const double t24 = 0.809016994374947424102 * t16 - 0.309016994374947424102 * t14;
-  const double t25 = 0.951056516295153572116 * t18 + 0.587785252292473129169 * t20;
-  const double t26 = 0.951056516295153572116 * t17 + 0.587785252292473129169 * t19;
-  const double t27 = t23 + t25;
-  const double t28 = t24 - t26;
-  const double t31 = t0 - 0.809016994374947424102 * t13 + 0.309016994374947424102 * t15;
-  const double t33 = 0.587785252292473129169 * t18 - 0.951056516295153572116 * t20;
-  const double t35 = t31 + t33;
-  x[0] = t21;
-  x[4 * s] = -t22;
-  x[s] = t27;
-  x[3 * s] = t28;
-  x[2 * s] = t35;
+template <class P>
+inline void RealHalf05(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.809016994374947424102 * t1;
+  const T t3 = 0.587785252292473129169 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.309016994374947424102 * t4;
+  const T t6 = 0.951056516295153572116 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.309016994374947424102 * t7;
+  const T t9 = 0.951056516295153572116 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.809016994374947424102 * t10;
+  const T t12 = 0.587785252292473129169 * t10;
+  const T t13 = t2 - t11;
+  const T t14 = t3 + t12;
+  const T t15 = t5 - t8;
+  const T t16 = t6 + t9;
+  const T t17 = t2 + t11;
+  const T t18 = t12 - t3;
+  const T t19 = t5 + t8;
+  const T t20 = t9 - t6;
+  const T t21 = t0 + t13 + t15;
+  const T t22 = t14 + t16;
+  const T t23 = t0 + 0.309016994374947424102 * t13 - 0.809016994374947424102 * t15;
+  const T t24 = 0.809016994374947424102 * t16 - 0.309016994374947424102 * t14;
+  const T t25 = 0.951056516295153572116 * t18 + 0.587785252292473129169 * t20;
+  const T t26 = 0.951056516295153572116 * t17 + 0.587785252292473129169 * t19;
+  const T t27 = t23 + t25;
+  const T t28 = t24 - t26;
+  const T t31 = t0 - 0.809016994374947424102 * t13 + 0.309016994374947424102 * t15;
+  const T t33 = 0.587785252292473129169 * t18 - 0.951056516295153572116 * t20;
+  const T t35 = t31 + t33;
+  p.St(x, t21);
+  p.St(x + 4 * s, -t22);
+  p.St(x + s, t27);
+  p.St(x + 3 * s, t28);
+  p.St(x + 2 * s, t35);
 }
 
 }  // namespace
@@ -257,32 +265,68 @@ inline void RealHalf05(double* x, ptrdiff_t s) {
 void FftComplexLeaf05(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  for (ptrdiff_t t = 0; t < c; ++t) {
-    Dft05(inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
+  ptrdiff_t t = 0;
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const InterleavedAccess p{is, 5 * os, 0, 0};
+    for (; t + 1 < c; t += 2) {
+      Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
+    }
+  } else {
+    const LaneAccess p{is, 5 * os, 0, 0};
+    for (; t + 1 < c; t += 2) {
+      Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
+    }
+  }
+  for (; t < c; ++t) {
+    Dft05(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os,
+          outIm + t * 5 * os, os);
   }
 }
 
 void FftComplexTwiddle05(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft05(re, im, s, re, im, s);
-  for (ptrdiff_t k = 1; k < m; ++k) {
-    DftTw05(re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+  Dft05(ScalarAccess{}, re, im, s, re, im, s);
+  ptrdiff_t k = 1;
+  if (im == re + 1) {
+    const InterleavedAccess p{os, os, 0, 4};
+    for (; k + 1 < m; k += 2) {
+      DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+    }
+  } else {
+    const LaneAccess p{os, os, 0, 4};
+    for (; k + 1 < m; k += 2) {
+      DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+    }
+  }
+  for (; k < m; ++k) {
+    DftTw05(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 4,
+           twSin + (k - 1) * 4);
   }
 }
 
 void FftRealLeaf05(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  for (ptrdiff_t t = 0; t < c; ++t) RealDft05(in + t * is, ls, out + t * 5 * os, os);
+  const LaneAccess p{is, 5 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 1 < c; t += 2) RealDft05(p, in + t * is, ls, out + t * 5 * os, os);
+  for (; t < c; ++t) RealDft05(ScalarAccess{}, in + t * is, ls, out + t * 5 * os, os);
 }
 
 void FftRealTwiddle05(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  RealDft05(data, s, data, s);
-  for (ptrdiff_t k = 1; 2 * k < m; ++k) {
-    RealTw05(data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+  RealDft05(ScalarAccess{}, data, s, data, s);
+  const LaneAccess p{os, os, -os, 4};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 1) < m; k += 2) {
+    RealTw05(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4,
+            twSin + (k - 1) * 4);
   }
-  if (m % 2 == 0) RealHalf05(data + (m / 2) * os, s);
+  for (; 2 * k < m; ++k) {
+    RealTw05(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4,
+            twSin + (k - 1) * 4);
+  }
+  if (m % 2 == 0) RealHalf05(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

@@ -1,0 +1,122 @@
+// Parametric power spectra of a data record: an AR model by the covariance
+// method or by principal components, evaluated on the spectrum grid
+// (ar_spectrum.cpp). The PCAR form also reports the modes of the roots
+// nearest the unit circle. The drivers always ask for the reciprocal power
+// and no window.
+#include "estimation/estimation.h"
+#include "numeric/work.h"
+
+namespace {
+
+constexpr int32_t kReciprocal = 1;
+constexpr int32_t kNoWindow = 3;
+
+// Overloads that pick the real or complex twin of each building block.
+StatusCode CovarianceAr(const double* x, int32_t n, int32_t p, double* a, Complex* r,
+                        double* v) {
+  return CovarianceArReal(x, n, p, a, r, v);
+}
+StatusCode CovarianceAr(const Complex* x, int32_t n, int32_t p, Complex* a, Complex* r,
+                        double* v) {
+  return CovarianceArComplex(x, n, p, a, r, v);
+}
+StatusCode PcarEstimate(const double* x, int32_t n, int32_t p, int32_t k, double* a,
+                        Complex* roots) {
+  return PcarEstimateReal(x, n, p, k, a, roots);
+}
+StatusCode PcarEstimate(const Complex* x, int32_t n, int32_t p, int32_t k, Complex* a,
+                        Complex* roots) {
+  return PcarEstimateComplex(x, n, p, k, a, roots);
+}
+StatusCode ModeAmplitudes(const double* x, int32_t n, const Complex* z, int32_t k, Complex* A,
+                          double* E) {
+  return ModeAmplitudesReal(x, n, z, k, A, E);
+}
+StatusCode ModeAmplitudes(const Complex* x, int32_t n, const Complex* z, int32_t k, Complex* A,
+                          double* E) {
+  return ModeAmplitudesComplex(x, n, z, k, A, E);
+}
+StatusCode ArSpectrum(double* a, int32_t m, double fs, int32_t N, SpectrumResult* result) {
+  return ArSpectrumReal(a, m, kReciprocal, fs, N, kNoWindow, result);
+}
+StatusCode ArSpectrum(Complex* a, int32_t m, double fs, int32_t N, SpectrumResult* result) {
+  return ArSpectrumComplex(a, m, kReciprocal, fs, N, kNoWindow, result);
+}
+
+template <typename T>
+StatusCode CovPowerSpectrum(const T* x, int32_t n, int32_t p, int32_t N, double fs,
+                            SpectrumResult* result, double* variance) {
+  if (n < 1) return status::kEmptyInput;
+  if (p < 0 || p > MaxOrder(n)) return status::kBadOrder;
+  if (N < 2) return status::kBadSpectrumSize;
+  if (fs <= 0.0) return status::kBadSampleRate;  // a NaN rate passes on purpose
+
+  const size_t order = static_cast<size_t>(p);
+  WorkArray<T> a = AllocWork<T>(order + 1);
+  WorkArray<Complex> poles = AllocWork<Complex>(order);
+  if (!a || !poles) return status::kNoMemory;
+
+  // p = 0 passes the checks here; the estimator decides what an order of 0
+  // means (it refuses it).
+  const StatusCode st = CovarianceAr(x, n, p, a.get(), poles.get(), variance);
+  if (st != status::kOk) return st;
+  return ArSpectrum(a.get(), p + 1, fs, N, result);
+}
+
+template <typename T>
+StatusCode PcarPowerSpectrum(const T* x, int32_t n, int32_t p, int32_t k, int32_t N, double fs,
+                             int32_t realFlag, double* amp, double* phase, double* freq,
+                             double* fitError, SpectrumResult* result, int32_t* count) {
+  if (n < 1) return status::kEmptyInput;
+  if (p < 0 || p > MaxOrder(n)) return status::kBadOrder;
+  if (k < 1) return status::kBadCount;
+  if (k > p) return status::kCountAboveOrder;
+  if (N < 2) return status::kBadSpectrumSize;
+  if (fs <= 0.0) return status::kBadSampleRate;
+
+  const size_t order = static_cast<size_t>(p), modes = static_cast<size_t>(k);
+  WorkArray<T> a = AllocWork<T>(order + 1);
+  WorkArray<Complex> roots = AllocWork<Complex>(order);
+  WorkArray<Complex> selected = AllocWork<Complex>(modes);
+  WorkArray<Complex> amplitudes = AllocWork<Complex>(modes);
+  WorkArray<double> damping = AllocWork<double>(modes);  // computed, not reported
+  if (!a || !roots || !selected || !amplitudes || !damping) return status::kNoMemory;
+
+  StatusCode st = PcarEstimate(x, n, p, k, a.get(), roots.get());
+  if (st != status::kOk) return st;
+  st = SelectRootsNearUnitCircle(roots.get(), p, k, selected.get());
+  if (st != status::kOk) return st;
+  st = ModeAmplitudes(x, n, selected.get(), k, amplitudes.get(), fitError);
+  if (st != status::kOk) return st;
+  st = ModeParameters(amplitudes.get(), k, selected.get(), k, fs, realFlag, amp, phase,
+                      damping.get(), freq, count);
+  if (st != status::kOk) return st;
+  return ArSpectrum(a.get(), p + 1, fs, N, result);
+}
+
+}  // namespace
+
+StatusCode CovPowerSpectrumComplex(const Complex* x, int32_t n, int32_t p, int32_t N, double fs,
+                                   SpectrumResult* result, double* variance) {
+  return CovPowerSpectrum(x, n, p, N, fs, result, variance);
+}
+
+StatusCode CovPowerSpectrumReal(const double* x, int32_t n, int32_t p, int32_t N, double fs,
+                                SpectrumResult* result, double* variance) {
+  return CovPowerSpectrum(x, n, p, N, fs, result, variance);
+}
+
+StatusCode PcarPowerSpectrumComplex(const Complex* x, int32_t n, int32_t p, int32_t k, int32_t N,
+                                    double fs, double* amp, double* phase, double* freq,
+                                    double* fitError, SpectrumResult* result, int32_t* count) {
+  // Complex data have no conjugate pairs to fold: every selected mode is reported.
+  return PcarPowerSpectrum(x, n, p, k, N, fs, 0, amp, phase, freq, fitError, result, count);
+}
+
+StatusCode PcarPowerSpectrumReal(const double* x, int32_t n, int32_t p, int32_t k, int32_t N,
+                                 double fs, int32_t realFlag, double* amp, double* phase,
+                                 double* freq, double* fitError, SpectrumResult* result,
+                                 int32_t* count) {
+  return PcarPowerSpectrum(x, n, p, k, N, fs, realFlag, amp, phase, freq, fitError, result,
+                           count);
+}

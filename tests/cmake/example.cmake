@@ -1,0 +1,155 @@
+# Tests of the example host program (qdm_example): bad input must end in a
+# non-zero exit and exactly one line on stderr naming what is wrong, never a
+# crash; a good run must print valid JSON.
+#
+# The file serves twice: included by tests/CMakeLists.txt it defines the
+# tests; run with `cmake -P` it is the checker each test runs.
+
+if(CMAKE_SCRIPT_MODE_FILE)
+  # ---- checker: EXE, ARGS ('|'-separated), MODE (fail | json), EXPECT, and
+  # EMULATOR ('|'-separated; the cross-compiling emulator, e.g. wine) ---------
+  string(REPLACE "|" ";" args "${ARGS}")
+  string(REPLACE "|" ";" emulator "${EMULATOR}")
+  execute_process(COMMAND ${emulator} ${EXE} ${args} RESULT_VARIABLE rc OUTPUT_VARIABLE out
+                  ERROR_VARIABLE err)
+  if(NOT rc MATCHES "^[0-9]+$")
+    message(FATAL_ERROR "qdm_example did not exit normally: ${rc}\n${err}")
+  endif()
+  if(MODE STREQUAL "fail")
+    if(rc EQUAL 0)
+      message(FATAL_ERROR "expected a non-zero exit, got 0\nstdout: ${out}")
+    endif()
+    string(REGEX REPLACE "\n$" "" line "${err}")
+    if(line STREQUAL "" OR line MATCHES "\n")
+      message(FATAL_ERROR "expected exactly one line on stderr, got:\n${err}")
+    endif()
+    if(NOT line MATCHES "^qdm_example: ")
+      message(FATAL_ERROR "stderr line not prefixed with the program name: ${line}")
+    endif()
+    if(NOT line MATCHES "${EXPECT}")
+      message(FATAL_ERROR "stderr line does not match '${EXPECT}': ${line}")
+    endif()
+    message(STATUS "exit ${rc}: ${line}")
+  elseif(MODE STREQUAL "json")
+    if(NOT rc EQUAL 0)
+      message(FATAL_ERROR "exit ${rc}: ${err}")
+    endif()
+    if(NOT err STREQUAL "")
+      message(FATAL_ERROR "unexpected stderr: ${err}")
+    endif()
+    string(JSON status ERROR_VARIABLE jerr GET "${out}" status)
+    if(jerr)
+      message(FATAL_ERROR "output is not the expected JSON (${jerr}):\n${out}")
+    endif()
+    if(NOT status EQUAL 0)
+      message(FATAL_ERROR "status ${status}")
+    endif()
+    # EXPECT: '|'-separated "path.to.member=value" checks; a value of #N checks
+    # the length of an array.
+    string(REPLACE "|" ";" checks "${EXPECT}")
+    foreach(check ${checks})
+      string(REGEX MATCH "^([^=]+)=(.*)$" _ "${check}")
+      set(member "${CMAKE_MATCH_1}")
+      set(want "${CMAKE_MATCH_2}")
+      string(REPLACE "." ";" path "${member}")
+      if(want MATCHES "^#([0-9]+)$")
+        set(want "${CMAKE_MATCH_1}")
+        string(JSON got ERROR_VARIABLE jerr LENGTH "${out}" ${path})
+      else()
+        string(JSON got ERROR_VARIABLE jerr GET "${out}" ${path})
+      endif()
+      if(jerr OR NOT got STREQUAL want)
+        message(FATAL_ERROR "${member}: expected ${want}, got '${got}' ${jerr}")
+      endif()
+    endforeach()
+  else()
+    message(FATAL_ERROR "unknown MODE ${MODE}")
+  endif()
+  return()
+endif()
+
+# ---- test definitions -------------------------------------------------------------
+if(NOT TARGET qdm_example)
+  return()
+endif()
+
+set(_ex_data ${CMAKE_CURRENT_BINARY_DIR}/example_data)
+file(MAKE_DIRECTORY ${_ex_data})
+file(WRITE ${_ex_data}/nonnumeric.csv "re,im\n1.0,2.0\n3.0,abc\n")
+file(WRITE ${_ex_data}/ragged.csv "1.0,2.0\n3.0,4.0\n5.0\n")
+file(WRITE ${_ex_data}/three_columns.csv "1,2,3\n4,5,6\n")
+file(WRITE ${_ex_data}/empty_field.csv "1.0,2.0\n3.0,\n")
+file(WRITE ${_ex_data}/empty.csv "# no samples\n")
+set(_ex_marple ${CMAKE_SOURCE_DIR}/tests/data/marple64.csv)
+string(REPLACE ";" "|" _ex_emulator "${CMAKE_CROSSCOMPILING_EMULATOR}")
+
+# qdm_example_fails(name regex args...): non-zero exit, one stderr line matching regex.
+function(qdm_example_fails name regex)
+  string(REPLACE ";" "|" joined "${ARGN}")
+  add_test(NAME example.${name}
+           COMMAND ${CMAKE_COMMAND} -DEXE=$<TARGET_FILE:qdm_example> "-DARGS=${joined}"
+                   "-DEMULATOR=${_ex_emulator}" -DMODE=fail "-DEXPECT=${regex}" -P ${CMAKE_CURRENT_LIST_FILE})
+endfunction()
+# qdm_example_json(name checks args...): exit 0, JSON with status 0 and the checks.
+function(qdm_example_json name checks)
+  string(REPLACE ";" "|" joined "${ARGN}")
+  add_test(NAME example.${name}
+           COMMAND ${CMAKE_COMMAND} -DEXE=$<TARGET_FILE:qdm_example> "-DARGS=${joined}"
+                   "-DEMULATOR=${_ex_emulator}" -DMODE=json "-DEXPECT=${checks}" -P ${CMAKE_CURRENT_LIST_FILE})
+endfunction()
+
+# Bad command lines.
+qdm_example_fails(no_method "no method given")
+qdm_example_fails(unknown_method "unknown method 'fourier'" fourier)
+qdm_example_fails(unknown_option "unknown option '--ordr'" covariance --ordr 4)
+qdm_example_fails(missing_value "--order needs a value" covariance --order)
+qdm_example_fails(non_integer_value "--order: 'twelve' is not an integer" covariance --order twelve)
+qdm_example_fails(fractional_order "--order: '2.5' is not an integer" prony --order 2.5)
+qdm_example_fails(out_of_range_value "--points: '99999999999' is out of" covspectrum --points 99999999999)
+qdm_example_fails(non_numeric_rate "--rate: 'fast' is not a number" prony --rate fast)
+qdm_example_fails(option_for_other_method "--points does not apply to method covariance"
+                  covariance --points 8)
+qdm_example_fails(bad_example_kind "--example: 'both' is not 'real' or 'complex'"
+                  covariance --example both)
+qdm_example_fails(extra_argument "unexpected argument 'more.csv'" covariance a.csv more.csv)
+qdm_example_fails(missing_library "cannot load the library" covariance --library
+                  ${_ex_data}/no_such_libqdm.so)
+
+# Bad data files.
+qdm_example_fails(missing_file "cannot open data file .*no_such_file.csv" covariance
+                  ${_ex_data}/no_such_file.csv)
+qdm_example_fails(non_numeric_field "nonnumeric.csv:3: field 2 'abc' is not a number" covariance
+                  ${_ex_data}/nonnumeric.csv)
+qdm_example_fails(ragged_columns "ragged.csv:3: 1 field, expected 2 as on line 1" covariance
+                  ${_ex_data}/ragged.csv)
+qdm_example_fails(three_columns "three_columns.csv:1: 3 columns; expected 1" covariance
+                  ${_ex_data}/three_columns.csv)
+qdm_example_fails(empty_field "empty_field.csv:2: field 2 is empty" covariance
+                  ${_ex_data}/empty_field.csv)
+qdm_example_fails(real_signal_on_complex_data "--real-signal applies to real data only" prony
+                  ${_ex_marple} --real-signal)
+
+# Statuses from the library, printed with their meaning.
+qdm_example_fails(status_empty_input "QdmReCovarianceH returned -42401: empty input" covariance
+                  ${_ex_data}/empty.csv)
+qdm_example_fails(status_bad_order "QdmCxCovarianceH returned -42412: order" covariance
+                  ${_ex_marple} --order 0)
+qdm_example_fails(status_bad_rate "QdmReCovPowerSpectrH returned -42418: sampling rate not positive"
+                  covspectrum --rate 0 --no-plot --csv ${_ex_data}/unused.csv)
+qdm_example_fails(status_components_above_order
+                  "QdmRePCARPowerSpectrumH returned -42413: components" pcarspectrum --order 4
+                  --components 5 --no-plot --csv ${_ex_data}/unused.csv)
+qdm_example_fails(status_json_still_one_line "returned -42417: spectrum size below 2"
+                  covspectrum --points 1 --json --no-plot --csv ${_ex_data}/unused.csv)
+
+# Good runs, as JSON.
+qdm_example_json(json_marple64_covariance
+                 "method=covariance|signal.type=complex|signal.samples=64|parameters.order=4|results.coefficients=#5|results.poles=#4"
+                 covariance ${_ex_marple} --order 4 --json)
+qdm_example_json(json_marple64_covspectrum
+                 "signal.type=complex|results.spectrum.length=128|results.spectrum.db=#128|results.spectrum.df_hz=0.0078125"
+                 covspectrum ${_ex_marple} --order 8 --points 100 --json --no-plot
+                 --csv ${_ex_data}/marple64_spectrum.csv)
+qdm_example_json(json_builtin_pcarspectrum
+                 "signal.type=real|signal.samples=128|results.mode_count=3|results.modes=#3|results.spectrum.length=512"
+                 pcarspectrum --real-signal --json --no-plot --csv ${_ex_data}/builtin_spectrum.csv)
