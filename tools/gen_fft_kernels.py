@@ -439,6 +439,7 @@ def radix_file(r):
     out += h_lines
     out += ["}", "", "}  // namespace", ""]
     out += [
+        "FFTK_CLONES",
         "void FftComplexLeaf%s(const double* inRe, const double* inIm, double* outRe, double* outIm," % rr,
         "                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {",
         "  const ptrdiff_t ls = c * is;",
@@ -460,6 +461,7 @@ def radix_file(r):
         "  }",
         "}",
         "",
+        "FFTK_CLONES",
         "void FftComplexTwiddle%s(double* re, double* im, const double* twCos, const double* twSin," % rr,
         "                         ptrdiff_t os, ptrdiff_t m) {",
         "  const ptrdiff_t s = m * os;",
@@ -482,6 +484,7 @@ def radix_file(r):
         "  }",
         "}",
         "",
+        "FFTK_CLONES",
         "void FftRealLeaf%s(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {" % rr,
         "  const ptrdiff_t ls = c * is;",
         "  const LaneAccess p{is, %d * os, 0, 0};" % r,
@@ -490,6 +493,7 @@ def radix_file(r):
         "  for (; t < c; ++t) RealDft%s(ScalarAccess{}, in + t * is, ls, out + t * %d * os, os);" % (rr, r),
         "}",
         "",
+        "FFTK_CLONES",
         "void FftRealTwiddle%s(double* data, const double* twCos, const double* twSin, ptrdiff_t os," % rr,
         "                      ptrdiff_t m) {",
         "  const ptrdiff_t s = m * os;",

@@ -96,6 +96,7 @@ inline void RealHalf02(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf02(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -117,6 +118,7 @@ void FftComplexLeaf02(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle02(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -139,6 +141,7 @@ void FftComplexTwiddle02(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf02(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 2 * os, 0, 0};
@@ -147,6 +150,7 @@ void FftRealLeaf02(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft02(ScalarAccess{}, in + t * is, ls, out + t * 2 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle02(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

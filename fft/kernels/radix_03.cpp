@@ -155,6 +155,7 @@ inline void RealHalf03(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf03(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -176,6 +177,7 @@ void FftComplexLeaf03(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle03(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -198,6 +200,7 @@ void FftComplexTwiddle03(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf03(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 3 * os, 0, 0};
@@ -206,6 +209,7 @@ void FftRealLeaf03(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft03(ScalarAccess{}, in + t * is, ls, out + t * 3 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle03(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

@@ -192,6 +192,7 @@ inline void RealHalf04(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf04(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -213,6 +214,7 @@ void FftComplexLeaf04(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle04(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -235,6 +237,7 @@ void FftComplexTwiddle04(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf04(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 4 * os, 0, 0};
@@ -243,6 +246,7 @@ void FftRealLeaf04(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft04(ScalarAccess{}, in + t * is, ls, out + t * 4 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle04(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

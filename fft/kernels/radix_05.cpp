@@ -262,6 +262,7 @@ inline void RealHalf05(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf05(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -283,6 +284,7 @@ void FftComplexLeaf05(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle05(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -305,6 +307,7 @@ void FftComplexTwiddle05(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf05(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 5 * os, 0, 0};
@@ -313,6 +316,7 @@ void FftRealLeaf05(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft05(ScalarAccess{}, in + t * is, ls, out + t * 5 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle05(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;
