@@ -7,37 +7,18 @@
 #include <type_traits>
 
 #include "estimation/estimation.h"
+#include "estimation/twins.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
 namespace {
 
-template <typename T>
-constexpr bool kIsComplex = std::is_same_v<T, Complex>;
+using namespace twin;
 
 // Iteration limits per root handed to the root finder. The complex estimator
 // deliberately allows twenty times more than the real one.
 constexpr int32_t kRootIterationsReal = 1000;
 constexpr int32_t kRootIterationsComplex = 20000;
-
-StatusCode BuildForward(const double* x, int32_t n, int32_t p, double* b, double* A) {
-  return BuildForwardMatrixReal(x, n, p, b, A);
-}
-StatusCode BuildForward(const Complex* x, int32_t n, int32_t p, Complex* b, Complex* A) {
-  return BuildForwardMatrixComplex(x, n, p, b, A);
-}
-StatusCode Product(const double* A, const double* w, int32_t m, int32_t k, double* out) {
-  return MatMulReal(A, w, m, k, 1, out);
-}
-StatusCode Product(const Complex* A, const Complex* w, int32_t m, int32_t k, Complex* out) {
-  return MatMulComplex(A, w, m, k, 1, out);
-}
-StatusCode Difference(const double* u, const double* v, int32_t count, double* out) {
-  return VecSubReal(u, v, count, out);
-}
-StatusCode Difference(const Complex* u, const Complex* v, int32_t count, Complex* out) {
-  return VecSubComplex(u, v, count, out);
-}
 
 template <typename T>
 StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, double* variance) {
@@ -85,7 +66,7 @@ StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, doub
   a[0] = T(1.0);
   for (size_t k = 0; k < cols; ++k) a[k + 1] = -w[k];
 
-  StatusCode st = Product(A.get(), w.get(), M, p, Aw.get());
+  StatusCode st = MatMul(A.get(), w.get(), M, p, 1, Aw.get());
   if (st != status::kOk) return st;
   st = Difference(Aw.get(), b.get(), M, e.get());
   if (st != status::kOk) return st;

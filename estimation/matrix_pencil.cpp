@@ -11,73 +11,13 @@
 #include <type_traits>
 
 #include "estimation/estimation.h"
+#include "estimation/twins.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
 namespace {
 
-template <typename T>
-constexpr bool kIsComplex = std::is_same_v<T, Complex>;
-
-// ---- real/complex dispatch ----------------------------------------------------------
-StatusCode BuildForward(const double* x, int32_t n, int32_t p, double* b, double* A) {
-  return BuildForwardMatrixReal(x, n, p, b, A);
-}
-StatusCode BuildForward(const Complex* x, int32_t n, int32_t p, Complex* b, Complex* A) {
-  return BuildForwardMatrixComplex(x, n, p, b, A);
-}
-StatusCode BuildBackward(const double* x, int32_t n, int32_t p, double* b, double* A) {
-  return BuildBackwardMatrixReal(x, n, p, b, A);
-}
-StatusCode BuildBackward(const Complex* x, int32_t n, int32_t p, Complex* b, Complex* A) {
-  return BuildBackwardMatrixComplex(x, n, p, b, A);
-}
-StatusCode Reverse(const double* src, double* dst, int32_t count) {
-  return ReverseReal(src, dst, count);
-}
-StatusCode Reverse(const Complex* src, Complex* dst, int32_t count) {
-  return ReverseComplex(src, dst, count);
-}
-StatusCode AdjointInto(double* A, int32_t m, int32_t n, double* out) {
-  return TransposeReal(A, m, n, out);
-}
-StatusCode AdjointInto(Complex* A, int32_t m, int32_t n, Complex* out) {
-  return ConjTransposeComplex(A, m, n, out);
-}
-StatusCode Svd(const double* A, int32_t m, int32_t n, double* U, double* S, double* V) {
-  return SvdReal(A, m, n, U, S, V, 0);
-}
-StatusCode Svd(const Complex* A, int32_t m, int32_t n, Complex* U, double* S, Complex* V) {
-  return SvdComplex(A, m, n, U, S, V, 0);
-}
-StatusCode MatMul(const double* A, const double* B, int32_t m, int32_t k, int32_t n, double* C) {
-  return MatMulReal(A, B, m, k, n, C);
-}
-StatusCode MatMul(const Complex* A, const Complex* B, int32_t m, int32_t k, int32_t n,
-                  Complex* C) {
-  return MatMulComplex(A, B, m, k, n, C);
-}
-StatusCode ScaleRowsByInverse(double* A, int32_t rows, int32_t cols, const double* s) {
-  return ScaleRowsByInverseReal(A, rows, cols, s);
-}
-StatusCode ScaleRowsByInverse(Complex* A, int32_t rows, int32_t cols, const double* s) {
-  return ScaleRowsByInverseComplex(A, rows, cols, s);
-}
-// Eigenvalues only; the matrix is left as it is.
-StatusCode EigenvaluesOf(double* A, int32_t n, Complex* eigenvalues) {
-  return EigGeneralReal(A, n, 0, eigenvalues, nullptr);
-}
-StatusCode EigenvaluesOf(Complex* A, int32_t n, Complex* eigenvalues) {
-  return EigGeneralComplex(A, n, 0, eigenvalues, nullptr);
-}
-StatusCode ModeAmplitudes(const double* x, int32_t n, const Complex* z, int32_t k, Complex* A,
-                          double* E) {
-  return ModeAmplitudesReal(x, n, z, k, A, E);
-}
-StatusCode ModeAmplitudes(const Complex* x, int32_t n, const Complex* z, int32_t k, Complex* A,
-                          double* E) {
-  return ModeAmplitudesComplex(x, n, z, k, A, E);
-}
+using namespace twin;
 
 // ---- reduced pencil ---------------------------------------------------------------------
 template <typename T>

@@ -10,39 +10,17 @@
 #include <type_traits>
 
 #include "estimation/estimation.h"
+#include "estimation/twins.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
 namespace {
 
-template <typename T>
-constexpr bool kIsComplex = std::is_same_v<T, Complex>;
+using namespace twin;
 
 constexpr double kPenalty = 10.0;        // weight of m ln n
 constexpr double kStartScore = 10000.0;  // a score must fall below this to be chosen
 constexpr double kPerfectFit = 2.2e-16;  // |E| below this stops the search
-
-// ---- real/complex dispatch ----------------------------------------------------------
-StatusCode PencilMatrix(const double* x, int32_t n, int32_t L, int32_t M, double* K) {
-  return PencilMatrixReal(x, n, L, M, K);
-}
-StatusCode PencilMatrix(const Complex* x, int32_t n, int32_t L, int32_t M, Complex* K) {
-  return PencilMatrixComplex(x, n, L, M, K);
-}
-StatusCode EigenvaluesOf(double* A, int32_t n, Complex* eigenvalues) {
-  return EigGeneralReal(A, n, 0, eigenvalues, nullptr);
-}
-StatusCode EigenvaluesOf(Complex* A, int32_t n, Complex* eigenvalues) {
-  return EigGeneralComplex(A, n, 0, eigenvalues, nullptr);
-}
-StatusCode ModeAmplitudes(const double* x, int32_t n, const Complex* z, int32_t k, Complex* A,
-                          double* E) {
-  return ModeAmplitudesReal(x, n, z, k, A, E);
-}
-StatusCode ModeAmplitudes(const Complex* x, int32_t n, const Complex* z, int32_t k, Complex* A,
-                          double* E) {
-  return ModeAmplitudesComplex(x, n, z, k, A, E);
-}
 
 template <typename T>
 StatusCode MdlOrder(const T* x, int32_t n, int32_t L, int32_t minOrder, int32_t* order) {

@@ -11,47 +11,13 @@
 #include <type_traits>
 
 #include "estimation/estimation.h"
+#include "estimation/twins.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
 namespace {
 
-template <typename T>
-constexpr bool kIsComplex = std::is_same_v<T, Complex>;
-
-// ---- real/complex dispatch ----------------------------------------------------------
-StatusCode BuildForward(const double* x, int32_t n, int32_t p, double* b, double* A) {
-  return BuildForwardMatrixReal(x, n, p, b, A);
-}
-StatusCode BuildForward(const Complex* x, int32_t n, int32_t p, Complex* b, Complex* A) {
-  return BuildForwardMatrixComplex(x, n, p, b, A);
-}
-StatusCode BuildBackward(const double* x, int32_t n, int32_t p, double* b, double* A) {
-  return BuildBackwardMatrixReal(x, n, p, b, A);
-}
-StatusCode BuildBackward(const Complex* x, int32_t n, int32_t p, Complex* b, Complex* A) {
-  return BuildBackwardMatrixComplex(x, n, p, b, A);
-}
-// Transpose for real data, conjugate transpose for complex data.
-StatusCode AdjointInto(double* A, int32_t m, int32_t n, double* out) {
-  return TransposeReal(A, m, n, out);
-}
-StatusCode AdjointInto(Complex* A, int32_t m, int32_t n, Complex* out) {
-  return ConjTransposeComplex(A, m, n, out);
-}
-StatusCode MatMul(const double* A, const double* B, int32_t m, int32_t k, int32_t n, double* C) {
-  return MatMulReal(A, B, m, k, n, C);
-}
-StatusCode MatMul(const Complex* A, const Complex* B, int32_t m, int32_t k, int32_t n,
-                  Complex* C) {
-  return MatMulComplex(A, B, m, k, n, C);
-}
-StatusCode PseudoInverse(double* A, int32_t m, int32_t n, double tol) {
-  return PseudoInverseReal(A, m, n, tol, nullptr);
-}
-StatusCode PseudoInverse(Complex* A, int32_t m, int32_t n, double tol) {
-  return PseudoInverseComplex(A, m, n, tol, nullptr);
-}
+using namespace twin;
 
 // ---- truncation threshold -----------------------------------------------------------------
 // tau lies halfway between the k-th and (k+1)-th singular values of A (half the

@@ -4,38 +4,17 @@
 // nearest the unit circle. The drivers always ask for the reciprocal power
 // and no window.
 #include "estimation/estimation.h"
+#include "estimation/twins.h"
 #include "numeric/work.h"
 
 namespace {
 
+using namespace twin;
+
 constexpr int32_t kReciprocal = 1;
 constexpr int32_t kNoWindow = 3;
 
-// Overloads that pick the real or complex twin of each building block.
-StatusCode CovarianceAr(const double* x, int32_t n, int32_t p, double* a, Complex* r,
-                        double* v) {
-  return CovarianceArReal(x, n, p, a, r, v);
-}
-StatusCode CovarianceAr(const Complex* x, int32_t n, int32_t p, Complex* a, Complex* r,
-                        double* v) {
-  return CovarianceArComplex(x, n, p, a, r, v);
-}
-StatusCode PcarEstimate(const double* x, int32_t n, int32_t p, int32_t k, double* a,
-                        Complex* roots) {
-  return PcarEstimateReal(x, n, p, k, a, roots);
-}
-StatusCode PcarEstimate(const Complex* x, int32_t n, int32_t p, int32_t k, Complex* a,
-                        Complex* roots) {
-  return PcarEstimateComplex(x, n, p, k, a, roots);
-}
-StatusCode ModeAmplitudes(const double* x, int32_t n, const Complex* z, int32_t k, Complex* A,
-                          double* E) {
-  return ModeAmplitudesReal(x, n, z, k, A, E);
-}
-StatusCode ModeAmplitudes(const Complex* x, int32_t n, const Complex* z, int32_t k, Complex* A,
-                          double* E) {
-  return ModeAmplitudesComplex(x, n, z, k, A, E);
-}
+// The evaluator of the matching type, as the drivers call it.
 StatusCode ArSpectrum(double* a, int32_t m, double fs, int32_t N, SpectrumResult* result) {
   return ArSpectrumReal(a, m, kReciprocal, fs, N, kNoWindow, result);
 }

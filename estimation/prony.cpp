@@ -6,26 +6,12 @@
 #include <type_traits>
 
 #include "estimation/estimation.h"
+#include "estimation/twins.h"
 #include "numeric/work.h"
 
 namespace {
 
-StatusCode CovarianceAr(const double* x, int32_t n, int32_t p, double* a, Complex* r,
-                        double* variance) {
-  return CovarianceArReal(x, n, p, a, r, variance);
-}
-StatusCode CovarianceAr(const Complex* x, int32_t n, int32_t p, Complex* a, Complex* r,
-                        double* variance) {
-  return CovarianceArComplex(x, n, p, a, r, variance);
-}
-StatusCode ModeAmplitudes(const double* x, int32_t n, const Complex* z, int32_t k, Complex* A,
-                          double* E) {
-  return ModeAmplitudesReal(x, n, z, k, A, E);
-}
-StatusCode ModeAmplitudes(const Complex* x, int32_t n, const Complex* z, int32_t k, Complex* A,
-                          double* E) {
-  return ModeAmplitudesComplex(x, n, z, k, A, E);
-}
+using namespace twin;
 
 // realFlag selects real-signal reporting (one mode per conjugate pair); the
 // complex form always passes 0.

@@ -69,19 +69,20 @@ void GenericDft(const FftStage* st, int32_t r, const double* xr, const double* x
 // One DFT of prime size r through a cyclic convolution of length r-1:
 // b_q = x[g^q], X[g^-p] = x0 + (b * h)_p with h_t = exp(-2 pi i g^-t / r).
 // The convolution is conj(DFT(conj(DFT(b) . H))) with H = DFT(h)/(r-1), so both
-// transforms are forward ones on the sub-plan. Output legs 1..r-1 serve as the
-// second buffer, so y must not overlap the scratch (2(r-1) values); y may
-// equal x. Legs j >= 1 are twiddled by (wc[j-1] + i ws[j-1]) when wc is non-null.
+// transforms are forward ones on the sub-plan. The scratch (2(r-1) values)
+// holds b interleaved (re, im), so that interleaved data runs the sub-plan's
+// paired-load kernels throughout. Output legs 1..r-1 serve as the second
+// buffer, so y must not overlap the scratch; y may equal x. Legs j >= 1 are
+// twiddled by (wc[j-1] + i ws[j-1]) when wc is non-null.
 StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const double* xi,
                     ptrdiff_t is, double* yr, double* yi, ptrdiff_t os, const double* wc,
                     const double* ws, double* scratch) {
   const int32_t len = r - 1;
-  double* br = scratch;
-  double* bi = scratch + len;
+  double* br = scratch;  // interleaved: element q at 2q
+  double* bi = scratch + 1;
   const int32_t* gather = st->raderInverseIndex + 1;  // g^q
   const int32_t* scatter = st->raderIndex + 1;        // g^-p
   const double x0r = xr[0], x0i = xi[0];
-  double sum_r = x0r, sum_i = x0i;
   for (int32_t q = 0; q < len; ++q) {
     const int32_t j = gather[q];
     double ar = xr[j * is], ai = xi[j * is];
@@ -91,15 +92,14 @@ StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const doubl
       ai = ai * c + ar * s;
       ar = tr;
     }
-    br[q] = ar;
-    bi[q] = ai;
-    sum_r += ar;
-    sum_i += ai;
+    br[2 * q] = ar;
+    bi[2 * q] = ai;
   }
   double* cr = yr + os;  // legs 1..r-1 as the transform buffer
   double* ci = yi + os;
-  StatusCode status = FftComplex(st->raderPlan, br, bi, cr, ci, 1, os, len);
+  StatusCode status = FftComplex(st->raderPlan, br, bi, cr, ci, 2, os, len);
   if (status < 0) return status;
+  const double sum_r = x0r + cr[0], sum_i = x0i + ci[0];  // bin 0 is the sum of the b_q
   const double* kr = st->raderKernelRe;
   const double* ki = st->raderKernelIm;
   for (int32_t p = 0; p < len; ++p) {
@@ -107,12 +107,12 @@ StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const doubl
     cr[p * os] = ur * kr[p] - ui * ki[p];
     ci[p * os] = -(ur * ki[p] + ui * kr[p]);  // conjugate of the product
   }
-  status = FftComplex(st->raderPlan, cr, ci, br, bi, os, 1, len);
+  status = FftComplex(st->raderPlan, cr, ci, br, bi, os, 2, len);
   if (status < 0) return status;
   for (int32_t p = 0; p < len; ++p) {
     const ptrdiff_t k = scatter[p];
-    yr[k * os] = x0r + br[p];
-    yi[k * os] = x0i - bi[p];
+    yr[k * os] = x0r + br[2 * p];
+    yi[k * os] = x0i - bi[2 * p];
   }
   yr[0] = sum_r;
   yi[0] = sum_i;
@@ -120,7 +120,7 @@ StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const doubl
 }
 
 // ---- real-input passes on top of a complex DFT of size r ----------------------------
-// `Dft(zr, zi, yr, yi, scratch)` transforms r contiguous complex values.
+// `Dft(zr, zi, yr, yi, scratch)` transforms r interleaved complex values.
 
 // Real leaf: c transforms of r reals each, written in packed half-complex order.
 template <typename DftFn>
@@ -128,23 +128,23 @@ StatusCode RealLeaf(int32_t r, const double* in, double* out, ptrdiff_t is, ptrd
                     ptrdiff_t c, size_t scratch_count, DftFn dft) {
   WorkArray<double> work = AllocWork<double>(4 * static_cast<size_t>(r) + scratch_count);
   if (!work) return status::kNoMemory;
-  double* zr = work.get();
-  double* zi = zr + r;
-  double* yr = zi + r;
-  double* yi = yr + r;
-  double* scratch = yi + r;
+  double* zr = work.get();  // z and y interleaved: element q at 2q
+  double* zi = zr + 1;
+  double* yr = zr + 2 * r;
+  double* yi = yr + 1;
+  double* scratch = zr + 4 * r;
   for (ptrdiff_t t = 0; t < c; ++t) {
     for (int32_t q = 0; q < r; ++q) {
-      zr[q] = in[t * is + q * c * is];
-      zi[q] = 0.0;
+      zr[2 * q] = in[t * is + q * c * is];
+      zi[2 * q] = 0.0;
     }
     const StatusCode st = dft(zr, zi, yr, yi, scratch);
     if (st < 0) return st;
     double* y = out + t * r * os;
     y[0] = yr[0];
     for (int32_t q = 1; 2 * q < r; ++q) {
-      y[q * os] = yr[q];
-      y[(r - q) * os] = yi[q];
+      y[q * os] = yr[2 * q];
+      y[(r - q) * os] = yi[2 * q];
     }
   }
   return status::kOk;
@@ -160,23 +160,23 @@ StatusCode RealTwiddle(int32_t r, double* data, const double* twCos, const doubl
                        ptrdiff_t os, ptrdiff_t m, size_t scratch_count, DftFn dft) {
   WorkArray<double> work = AllocWork<double>(4 * static_cast<size_t>(r) + scratch_count);
   if (!work) return status::kNoMemory;
-  double* zr = work.get();
-  double* zi = zr + r;
-  double* yr = zi + r;
-  double* yi = yr + r;
-  double* scratch = yi + r;
+  double* zr = work.get();  // z and y interleaved: element q at 2q
+  double* zi = zr + 1;
+  double* yr = zr + 2 * r;
+  double* yi = yr + 1;
+  double* scratch = zr + 4 * r;
   const ptrdiff_t s = m * os;
   // group 0
   for (int32_t j = 0; j < r; ++j) {
-    zr[j] = data[j * s];
-    zi[j] = 0.0;
+    zr[2 * j] = data[j * s];
+    zi[2 * j] = 0.0;
   }
   StatusCode st = dft(zr, zi, yr, yi, scratch);
   if (st < 0) return st;
   data[0] = yr[0];
   for (int32_t q = 1; 2 * q < r; ++q) {
-    data[q * s] = yr[q];
-    data[(r - q) * s] = yi[q];
+    data[q * s] = yr[2 * q];
+    data[(r - q) * s] = yi[2 * q];
   }
   for (ptrdiff_t k = 1; 2 * k <= m; ++k) {
     const double* wc = twCos + (k - 1) * (r - 1);
@@ -191,25 +191,25 @@ StatusCode RealTwiddle(int32_t r, double* data, const double* twCos, const doubl
         zr[0] = re;
         zi[0] = im;
       } else {
-        zr[j] = re * wc[j - 1] - im * ws[j - 1];
-        zi[j] = im * wc[j - 1] + re * ws[j - 1];
+        zr[2 * j] = re * wc[j - 1] - im * ws[j - 1];
+        zi[2 * j] = im * wc[j - 1] + re * ws[j - 1];
       }
     }
     st = dft(zr, zi, yr, yi, scratch);
     if (st < 0) return st;
     if (middle) {
       for (int32_t q = 0; 2 * q + 1 <= r; ++q) {
-        a[q * s] = yr[q];
-        if (2 * q + 1 < r) a[(r - 1 - q) * s] = yi[q];
+        a[q * s] = yr[2 * q];
+        if (2 * q + 1 < r) a[(r - 1 - q) * s] = yi[2 * q];
       }
     } else {
       for (int32_t q = 0; q < r; ++q) {
         if (2 * q < r) {
-          a[q * s] = yr[q];
-          b[(r - 1 - q) * s] = yi[q];
+          a[q * s] = yr[2 * q];
+          b[(r - 1 - q) * s] = yi[2 * q];
         } else {
-          b[(r - 1 - q) * s] = yr[q];
-          a[q * s] = -yi[q];
+          b[(r - 1 - q) * s] = yr[2 * q];
+          a[q * s] = -yi[2 * q];
         }
       }
     }
@@ -287,7 +287,7 @@ StatusCode FftGenericTwiddleReal(const FftStage* st, int32_t r, double* data, co
   return RealTwiddle(r, data, twCos, twSin, os, m, 2 * static_cast<size_t>(r),
                      [st, r](const double* zr, const double* zi, double* yr, double* yi,
                              double* scratch) {
-                       GenericDft(st, r, zr, zi, 1, yr, yi, 1, nullptr, nullptr, scratch);
+                       GenericDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
                        return status::kOk;
                      });
 }
@@ -328,7 +328,7 @@ StatusCode FftRaderLeafReal(const FftStage* st, int32_t r, const double* in, dou
   return RealLeaf(r, in, out, is, os, c, 2 * static_cast<size_t>(r - 1),
                   [st, r](const double* zr, const double* zi, double* yr, double* yi,
                           double* scratch) {
-                    return RaderDft(st, r, zr, zi, 1, yr, yi, 1, nullptr, nullptr, scratch);
+                    return RaderDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
                   });
 }
 
@@ -337,6 +337,6 @@ StatusCode FftRaderTwiddleReal(const FftStage* st, int32_t r, double* data, cons
   return RealTwiddle(r, data, twCos, twSin, os, m, 2 * static_cast<size_t>(r - 1),
                      [st, r](const double* zr, const double* zi, double* yr, double* yi,
                              double* scratch) {
-                       return RaderDft(st, r, zr, zi, 1, yr, yi, 1, nullptr, nullptr, scratch);
+                       return RaderDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
                      });
 }

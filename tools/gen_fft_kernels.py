@@ -143,8 +143,6 @@ class Block:
     def render(self, stores, indent="  "):
         """Live statements and the stores as C++ lines. A store is
         (method, pointer, value) or ("StC", re pointer, im pointer, re, im)."""
-        def text(val):
-            return "0.0" if val is None else ("-" if val[1] else "") + val[0]
         live = set()
         for st in stores:
             for val in st[2:] if st[0] != "StC" else st[3:]:
@@ -154,27 +152,53 @@ class Block:
         for name, expr, deps in reversed(self.stmts):
             names = name if isinstance(name, tuple) else (name,)
             if any(n in live for n in names):
-                kept.append((name, expr))
+                kept.append((name, expr, deps))
                 live.update(deps)
         kept.reverse()
+        # Short live ranges: each load moves to just before its first use, and
+        # each store to just after its value is complete (never before the
+        # last load, so in-place forms read every leg before writing any).
+        loads = [st for st in kept if not st[2]]
+        order = [st for st in kept if st[2]]
+        for st in loads:
+            names = st[0] if isinstance(st[0], tuple) else (st[0],)
+            at = next((i for i, o in enumerate(order) if any(n in o[2] for n in names)),
+                      len(order))
+            order.insert(at, st)
+        last_load = max(i for i, o in enumerate(order) if not o[2])
+        where = {}
+        for i, o in enumerate(order):
+            for n in (o[0] if isinstance(o[0], tuple) else (o[0],)):
+                where[n] = i
+        after = [[] for _ in order]
+        for st in stores:
+            vals = st[2:] if st[0] != "StC" else st[3:]
+            at = max([last_load] + [where[v[0]] for v in vals if v is not None])
+            after[at].append(st)
         ops = [0, 0]
         lines = []
-        for name, expr in kept:
-            if isinstance(name, tuple):
-                lines.append("%sT %s, %s;" % (indent, name[0], name[1]))
-                lines.append("%s%s" % (indent, expr))
-                continue
-            lines.append("%sconst T %s = %s;" % (indent, name, expr))
-            if expr.startswith("p."):
-                continue  # a load
+        for i, (name, expr, _) in enumerate(order):
+            lines += self._stmt(name, expr, indent, ops)
+            for st in after[i]:
+                lines.append(self._store(st, indent))
+        return lines, ops
+
+    @staticmethod
+    def _store(st, indent):
+        def text(val):
+            return "0.0" if val is None else ("-" if val[1] else "") + val[0]
+        if st[0] == "StC":
+            return "%sp.StC(%s, %s, %s, %s);" % (indent, st[1], st[2], text(st[3]), text(st[4]))
+        return "%sp.%s(%s, %s);" % (indent, st[0], st[1], text(st[2]))
+
+    @staticmethod
+    def _stmt(name, expr, indent, ops):
+        if isinstance(name, tuple):  # a pair load
+            return ["%sT %s, %s;" % (indent, name[0], name[1]), "%s%s" % (indent, expr)]
+        if not expr.startswith("p."):  # not a load
             ops[0] += expr.count(" + ") + expr.count(" - ")
             ops[1] += expr.count(" * ")
-        for st in stores:
-            if st[0] == "StC":
-                lines.append("%sp.StC(%s, %s, %s, %s);" % (indent, st[1], st[2], text(st[3]), text(st[4])))
-            else:
-                lines.append("%sp.%s(%s, %s);" % (indent, st[0], st[1], text(st[2])))
-        return lines, ops
+        return ["%sconst T %s = %s;" % (indent, name, expr)]
 
 
 def neg(v):
@@ -415,6 +439,7 @@ def radix_file(r):
     out += h_lines
     out += ["}", "", "}  // namespace", ""]
     out += [
+        "FFTK_CLONES",
         "void FftComplexLeaf%s(const double* inRe, const double* inIm, double* outRe, double* outIm," % rr,
         "                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {",
         "  const ptrdiff_t ls = c * is;",
@@ -436,6 +461,7 @@ def radix_file(r):
         "  }",
         "}",
         "",
+        "FFTK_CLONES",
         "void FftComplexTwiddle%s(double* re, double* im, const double* twCos, const double* twSin," % rr,
         "                         ptrdiff_t os, ptrdiff_t m) {",
         "  const ptrdiff_t s = m * os;",
@@ -458,6 +484,7 @@ def radix_file(r):
         "  }",
         "}",
         "",
+        "FFTK_CLONES",
         "void FftRealLeaf%s(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {" % rr,
         "  const ptrdiff_t ls = c * is;",
         "  const LaneAccess p{is, %d * os, 0, 0};" % r,
@@ -466,6 +493,7 @@ def radix_file(r):
         "  for (; t < c; ++t) RealDft%s(ScalarAccess{}, in + t * is, ls, out + t * %d * os, os);" % (rr, r),
         "}",
         "",
+        "FFTK_CLONES",
         "void FftRealTwiddle%s(double* data, const double* twCos, const double* twSin, ptrdiff_t os," % rr,
         "                      ptrdiff_t m) {",
         "  const ptrdiff_t s = m * os;",

@@ -26,9 +26,9 @@ inline void Dft02(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   p.LdC(xr + is, xi + is, t2, t3);
   const T t4 = t0 + t2;
   const T t5 = t1 + t3;
+  p.StC(yr, yi, t4, t5);
   const T t6 = t0 - t2;
   const T t7 = t1 - t3;
-  p.StC(yr, yi, t4, t5);
   p.StC(yr + os, yi + os, t6, t7);
 }
 
@@ -36,19 +36,19 @@ template <class P>
 inline void DftTw02(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
                    const double* ws) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(re, im, t0, t1);
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
   const T t6 = t2 * t4 - t3 * t5;
   const T t7 = t3 * t4 + t2 * t5;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
   const T t8 = t0 + t6;
   const T t9 = t1 + t7;
+  p.StC(re, im, t8, t9);
   const T t10 = t0 - t6;
   const T t11 = t1 - t7;
-  p.StC(re, im, t8, t9);
   p.StC(re + s, im + s, t10, t11);
 }
 
@@ -58,8 +58,8 @@ inline void RealDft02(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
   const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + is);
   const T t2 = t0 + t1;
-  const T t3 = t0 - t1;
   p.St(y, t2);
+  const T t3 = t0 - t1;
   p.St(y + os, t3);
 }
 
@@ -67,21 +67,21 @@ template <class P>
 inline void RealTw02(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
                     const double* ws) {
   using T = typename P::T;
-  const T t0 = p.Ld(a);
-  const T t1 = p.LdB(b);
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
   const T t6 = t2 * t4 - t3 * t5;
   const T t7 = t3 * t4 + t2 * t5;
+  const T t0 = p.Ld(a);
   const T t8 = t0 + t6;
-  const T t9 = t1 + t7;
-  const T t10 = t0 - t6;
-  const T t11 = t1 - t7;
+  const T t1 = p.LdB(b);
   p.St(a, t8);
+  const T t9 = t1 + t7;
   p.StB(b + s, t9);
+  const T t10 = t0 - t6;
   p.StB(b, t10);
+  const T t11 = t1 - t7;
   p.St(a + s, -t11);
 }
 
@@ -96,6 +96,7 @@ inline void RealHalf02(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf02(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -117,6 +118,7 @@ void FftComplexLeaf02(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle02(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -139,6 +141,7 @@ void FftComplexTwiddle02(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf02(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 2 * os, 0, 0};
@@ -147,6 +150,7 @@ void FftRealLeaf02(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft02(ScalarAccess{}, in + t * is, ls, out + t * 2 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle02(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

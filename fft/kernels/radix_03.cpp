@@ -20,8 +20,6 @@ template <class P>
 inline void Dft03(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
                  double* yi, ptrdiff_t os) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(xr, xi, t0, t1);
   T t2, t3;
   p.LdC(xr + is, xi + is, t2, t3);
   T t4, t5;
@@ -30,16 +28,18 @@ inline void Dft03(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t7 = t3 + t5;
   const T t8 = t2 - t4;
   const T t9 = t3 - t5;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
   const T t10 = t0 + t6;
   const T t11 = t1 + t7;
+  p.StC(yr, yi, t10, t11);
   const T t12 = t10 - 1.5 * t6;
   const T t13 = t11 - 1.5 * t7;
   const T t14 = t12 + 0.866025403784438646764 * t9;
   const T t15 = t13 - 0.866025403784438646764 * t8;
+  p.StC(yr + os, yi + os, t14, t15);
   const T t16 = t12 - 0.866025403784438646764 * t9;
   const T t17 = t13 + 0.866025403784438646764 * t8;
-  p.StC(yr, yi, t10, t11);
-  p.StC(yr + os, yi + os, t14, t15);
   p.StC(yr + 2 * os, yi + 2 * os, t16, t17);
 }
 
@@ -47,8 +47,6 @@ template <class P>
 inline void DftTw03(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
                    const double* ws) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(re, im, t0, t1);
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
@@ -65,32 +63,34 @@ inline void DftTw03(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t15 = t7 + t13;
   const T t16 = t6 - t12;
   const T t17 = t7 - t13;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
   const T t18 = t0 + t14;
   const T t19 = t1 + t15;
+  p.StC(re, im, t18, t19);
   const T t20 = t18 - 1.5 * t14;
   const T t21 = t19 - 1.5 * t15;
   const T t22 = t20 + 0.866025403784438646764 * t17;
   const T t23 = t21 - 0.866025403784438646764 * t16;
+  p.StC(re + s, im + s, t22, t23);
   const T t24 = t20 - 0.866025403784438646764 * t17;
   const T t25 = t21 + 0.866025403784438646764 * t16;
-  p.StC(re, im, t18, t19);
-  p.StC(re + s, im + s, t22, t23);
   p.StC(re + 2 * s, im + 2 * s, t24, t25);
 }
 
 template <class P>
 inline void RealDft03(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
-  const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + is);
   const T t2 = p.Ld(x + 2 * is);
   const T t3 = t1 + t2;
   const T t4 = t1 - t2;
+  const T t0 = p.Ld(x);
   const T t5 = t0 + t3;
-  const T t6 = t5 - 1.5 * t3;
-  const T t7 = 0.866025403784438646764 * t4;
   p.St(y, t5);
+  const T t6 = t5 - 1.5 * t3;
   p.St(y + os, t6);
+  const T t7 = 0.866025403784438646764 * t4;
   p.St(y + 2 * os, -t7);
 }
 
@@ -98,8 +98,6 @@ template <class P>
 inline void RealTw03(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
                     const double* ws) {
   using T = typename P::T;
-  const T t0 = p.Ld(a);
-  const T t1 = p.LdB(b);
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
@@ -116,26 +114,27 @@ inline void RealTw03(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t15 = t7 + t13;
   const T t16 = t6 - t12;
   const T t17 = t7 - t13;
+  const T t0 = p.Ld(a);
   const T t18 = t0 + t14;
+  const T t1 = p.LdB(b);
+  p.St(a, t18);
   const T t19 = t1 + t15;
+  p.StB(b + 2 * s, t19);
   const T t20 = t18 - 1.5 * t14;
   const T t21 = t19 - 1.5 * t15;
   const T t22 = t20 + 0.866025403784438646764 * t17;
-  const T t23 = t21 - 0.866025403784438646764 * t16;
-  const T t24 = t20 - 0.866025403784438646764 * t17;
-  const T t25 = t21 + 0.866025403784438646764 * t16;
-  p.St(a, t18);
-  p.StB(b + 2 * s, t19);
   p.St(a + s, t22);
+  const T t23 = t21 - 0.866025403784438646764 * t16;
   p.StB(b + s, t23);
+  const T t24 = t20 - 0.866025403784438646764 * t17;
   p.StB(b, t24);
+  const T t25 = t21 + 0.866025403784438646764 * t16;
   p.St(a + 2 * s, -t25);
 }
 
 template <class P>
 inline void RealHalf03(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
-  const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + s);
   const T t2 = 0.5 * t1;
   const T t3 = 0.866025403784438646764 * t1;
@@ -145,16 +144,18 @@ inline void RealHalf03(const P& p, double* x, ptrdiff_t s) {
   const T t7 = t2 - t5;
   const T t8 = t3 + t6;
   const T t10 = t6 - t3;
+  const T t0 = p.Ld(x);
+  p.St(x + 2 * s, -t8);
   const T t11 = t0 + t7;
+  p.St(x, t11);
   const T t12 = t11 - 1.5 * t7;
   const T t14 = t12 + 0.866025403784438646764 * t10;
-  p.St(x, t11);
-  p.St(x + 2 * s, -t8);
   p.St(x + s, t14);
 }
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf03(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -176,6 +177,7 @@ void FftComplexLeaf03(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle03(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -198,6 +200,7 @@ void FftComplexTwiddle03(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf03(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 3 * os, 0, 0};
@@ -206,6 +209,7 @@ void FftRealLeaf03(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft03(ScalarAccess{}, in + t * is, ls, out + t * 3 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle03(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

@@ -22,31 +22,31 @@ inline void Dft04(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
-  T t2, t3;
-  p.LdC(xr + is, xi + is, t2, t3);
   T t4, t5;
   p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
-  T t6, t7;
-  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
   const T t8 = t0 + t4;
   const T t9 = t1 + t5;
   const T t10 = t0 - t4;
   const T t11 = t1 - t5;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
   const T t12 = t2 + t6;
   const T t13 = t3 + t7;
   const T t14 = t2 - t6;
   const T t15 = t3 - t7;
   const T t16 = t8 + t12;
   const T t17 = t9 + t13;
+  p.StC(yr, yi, t16, t17);
   const T t18 = t8 - t12;
   const T t19 = t9 - t13;
+  p.StC(yr + 2 * os, yi + 2 * os, t18, t19);
   const T t20 = t10 + t15;
   const T t21 = t11 - t14;
+  p.StC(yr + os, yi + os, t20, t21);
   const T t22 = t10 - t15;
   const T t23 = t11 + t14;
-  p.StC(yr, yi, t16, t17);
-  p.StC(yr + os, yi + os, t20, t21);
-  p.StC(yr + 2 * os, yi + 2 * os, t18, t19);
   p.StC(yr + 3 * os, yi + 3 * os, t22, t23);
 }
 
@@ -54,8 +54,6 @@ template <class P>
 inline void DftTw04(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
                    const double* ws) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(re, im, t0, t1);
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
@@ -74,6 +72,8 @@ inline void DftTw04(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t17 = p.LdW(ws + 2);
   const T t18 = t14 * t16 - t15 * t17;
   const T t19 = t15 * t16 + t14 * t17;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
   const T t20 = t0 + t12;
   const T t21 = t1 + t13;
   const T t22 = t0 - t12;
@@ -84,15 +84,15 @@ inline void DftTw04(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t27 = t7 - t19;
   const T t28 = t20 + t24;
   const T t29 = t21 + t25;
+  p.StC(re, im, t28, t29);
   const T t30 = t20 - t24;
   const T t31 = t21 - t25;
+  p.StC(re + 2 * s, im + 2 * s, t30, t31);
   const T t32 = t22 + t27;
   const T t33 = t23 - t26;
+  p.StC(re + s, im + s, t32, t33);
   const T t34 = t22 - t27;
   const T t35 = t23 + t26;
-  p.StC(re, im, t28, t29);
-  p.StC(re + s, im + s, t32, t33);
-  p.StC(re + 2 * s, im + 2 * s, t30, t31);
   p.StC(re + 3 * s, im + 3 * s, t34, t35);
 }
 
@@ -100,27 +100,25 @@ template <class P>
 inline void RealDft04(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t0 = p.Ld(x);
-  const T t1 = p.Ld(x + is);
   const T t2 = p.Ld(x + 2 * is);
-  const T t3 = p.Ld(x + 3 * is);
   const T t4 = t0 + t2;
   const T t5 = t0 - t2;
+  const T t1 = p.Ld(x + is);
+  const T t3 = p.Ld(x + 3 * is);
+  p.St(y + os, t5);
   const T t6 = t1 + t3;
   const T t7 = t1 - t3;
-  const T t8 = t4 + t6;
-  const T t9 = t4 - t6;
-  p.St(y, t8);
-  p.St(y + os, t5);
-  p.St(y + 2 * os, t9);
   p.St(y + 3 * os, -t7);
+  const T t8 = t4 + t6;
+  p.St(y, t8);
+  const T t9 = t4 - t6;
+  p.St(y + 2 * os, t9);
 }
 
 template <class P>
 inline void RealTw04(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
                     const double* ws) {
   using T = typename P::T;
-  const T t0 = p.Ld(a);
-  const T t1 = p.LdB(b);
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
@@ -139,7 +137,9 @@ inline void RealTw04(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t17 = p.LdW(ws + 2);
   const T t18 = t14 * t16 - t15 * t17;
   const T t19 = t15 * t16 + t14 * t17;
+  const T t0 = p.Ld(a);
   const T t20 = t0 + t12;
+  const T t1 = p.LdB(b);
   const T t21 = t1 + t13;
   const T t22 = t0 - t12;
   const T t23 = t1 - t13;
@@ -148,31 +148,29 @@ inline void RealTw04(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t26 = t6 - t18;
   const T t27 = t7 - t19;
   const T t28 = t20 + t24;
-  const T t29 = t21 + t25;
-  const T t30 = t20 - t24;
-  const T t31 = t21 - t25;
-  const T t32 = t22 + t27;
-  const T t33 = t23 - t26;
-  const T t34 = t22 - t27;
-  const T t35 = t23 + t26;
   p.St(a, t28);
+  const T t29 = t21 + t25;
   p.StB(b + 3 * s, t29);
-  p.St(a + s, t32);
-  p.StB(b + 2 * s, t33);
+  const T t30 = t20 - t24;
   p.StB(b + s, t30);
+  const T t31 = t21 - t25;
   p.St(a + 2 * s, -t31);
+  const T t32 = t22 + t27;
+  p.St(a + s, t32);
+  const T t33 = t23 - t26;
+  p.StB(b + 2 * s, t33);
+  const T t34 = t22 - t27;
   p.StB(b, t34);
+  const T t35 = t23 + t26;
   p.St(a + 3 * s, -t35);
 }
 
 template <class P>
 inline void RealHalf04(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
-  const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + s);
   const T t2 = 0.707106781186547524401 * t1;
   const T t3 = 0.707106781186547524401 * t1;
-  const T t4 = p.Ld(x + 2 * s);
   const T t5 = p.Ld(x + 3 * s);
   const T t6 = 0.707106781186547524401 * t5;
   const T t7 = 0.707106781186547524401 * t5;
@@ -180,18 +178,21 @@ inline void RealHalf04(const P& p, double* x, ptrdiff_t s) {
   const T t9 = t3 + t7;
   const T t10 = t2 + t6;
   const T t11 = t7 - t3;
+  const T t0 = p.Ld(x);
   const T t12 = t0 + t8;
-  const T t13 = t4 + t9;
-  const T t16 = t0 + t11;
-  const T t17 = t4 - t10;
+  const T t4 = p.Ld(x + 2 * s);
   p.St(x, t12);
+  const T t13 = t4 + t9;
   p.St(x + 3 * s, -t13);
+  const T t16 = t0 + t11;
   p.St(x + s, t16);
+  const T t17 = t4 - t10;
   p.St(x + 2 * s, t17);
 }
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf04(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -213,6 +214,7 @@ void FftComplexLeaf04(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle04(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -235,6 +237,7 @@ void FftComplexTwiddle04(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf04(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 4 * os, 0, 0};
@@ -243,6 +246,7 @@ void FftRealLeaf04(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft04(ScalarAccess{}, in + t * is, ls, out + t * 4 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle04(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

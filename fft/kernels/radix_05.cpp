@@ -20,55 +20,53 @@ template <class P>
 inline void Dft05(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
                  double* yi, ptrdiff_t os) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(xr, xi, t0, t1);
   T t2, t3;
   p.LdC(xr + is, xi + is, t2, t3);
-  T t4, t5;
-  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
-  T t6, t7;
-  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
   T t8, t9;
   p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
   const T t10 = t2 + t8;
   const T t11 = t3 + t9;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
   const T t12 = t4 + t6;
   const T t13 = t5 + t7;
   const T t14 = t2 - t8;
   const T t15 = t3 - t9;
   const T t16 = t4 - t6;
   const T t17 = t5 - t7;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
   const T t18 = t0 + t10 + t12;
   const T t19 = t1 + t11 + t13;
+  p.StC(yr, yi, t18, t19);
   const T t20 = t0 + 0.309016994374947424102 * t10 - 0.809016994374947424102 * t12;
   const T t21 = t1 + 0.309016994374947424102 * t11 - 0.809016994374947424102 * t13;
   const T t22 = 0.951056516295153572116 * t15 + 0.587785252292473129169 * t17;
   const T t23 = 0.951056516295153572116 * t14 + 0.587785252292473129169 * t16;
   const T t24 = t20 + t22;
   const T t25 = t21 - t23;
+  p.StC(yr + os, yi + os, t24, t25);
   const T t26 = t20 - t22;
   const T t27 = t21 + t23;
+  p.StC(yr + 4 * os, yi + 4 * os, t26, t27);
   const T t28 = t0 - 0.809016994374947424102 * t10 + 0.309016994374947424102 * t12;
   const T t29 = t1 - 0.809016994374947424102 * t11 + 0.309016994374947424102 * t13;
   const T t30 = 0.587785252292473129169 * t15 - 0.951056516295153572116 * t17;
   const T t31 = 0.587785252292473129169 * t14 - 0.951056516295153572116 * t16;
   const T t32 = t28 + t30;
   const T t33 = t29 - t31;
+  p.StC(yr + 2 * os, yi + 2 * os, t32, t33);
   const T t34 = t28 - t30;
   const T t35 = t29 + t31;
-  p.StC(yr, yi, t18, t19);
-  p.StC(yr + os, yi + os, t24, t25);
-  p.StC(yr + 2 * os, yi + 2 * os, t32, t33);
   p.StC(yr + 3 * os, yi + 3 * os, t34, t35);
-  p.StC(yr + 4 * os, yi + 4 * os, t26, t27);
 }
 
 template <class P>
 inline void DftTw05(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
                    const double* ws) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(re, im, t0, t1);
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
@@ -101,52 +99,54 @@ inline void DftTw05(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t31 = t7 - t25;
   const T t32 = t12 - t18;
   const T t33 = t13 - t19;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
   const T t34 = t0 + t26 + t28;
   const T t35 = t1 + t27 + t29;
+  p.StC(re, im, t34, t35);
   const T t36 = t0 + 0.309016994374947424102 * t26 - 0.809016994374947424102 * t28;
   const T t37 = t1 + 0.309016994374947424102 * t27 - 0.809016994374947424102 * t29;
   const T t38 = 0.951056516295153572116 * t31 + 0.587785252292473129169 * t33;
   const T t39 = 0.951056516295153572116 * t30 + 0.587785252292473129169 * t32;
   const T t40 = t36 + t38;
   const T t41 = t37 - t39;
+  p.StC(re + s, im + s, t40, t41);
   const T t42 = t36 - t38;
   const T t43 = t37 + t39;
+  p.StC(re + 4 * s, im + 4 * s, t42, t43);
   const T t44 = t0 - 0.809016994374947424102 * t26 + 0.309016994374947424102 * t28;
   const T t45 = t1 - 0.809016994374947424102 * t27 + 0.309016994374947424102 * t29;
   const T t46 = 0.587785252292473129169 * t31 - 0.951056516295153572116 * t33;
   const T t47 = 0.587785252292473129169 * t30 - 0.951056516295153572116 * t32;
   const T t48 = t44 + t46;
   const T t49 = t45 - t47;
+  p.StC(re + 2 * s, im + 2 * s, t48, t49);
   const T t50 = t44 - t46;
   const T t51 = t45 + t47;
-  p.StC(re, im, t34, t35);
-  p.StC(re + s, im + s, t40, t41);
-  p.StC(re + 2 * s, im + 2 * s, t48, t49);
   p.StC(re + 3 * s, im + 3 * s, t50, t51);
-  p.StC(re + 4 * s, im + 4 * s, t42, t43);
 }
 
 template <class P>
 inline void RealDft05(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
-  const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + is);
-  const T t2 = p.Ld(x + 2 * is);
-  const T t3 = p.Ld(x + 3 * is);
   const T t4 = p.Ld(x + 4 * is);
   const T t5 = t1 + t4;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t3 = p.Ld(x + 3 * is);
   const T t6 = t2 + t3;
   const T t7 = t1 - t4;
   const T t8 = t2 - t3;
+  const T t0 = p.Ld(x);
   const T t9 = t0 + t5 + t6;
-  const T t10 = t0 + 0.309016994374947424102 * t5 - 0.809016994374947424102 * t6;
-  const T t11 = 0.951056516295153572116 * t7 + 0.587785252292473129169 * t8;
-  const T t12 = t0 - 0.809016994374947424102 * t5 + 0.309016994374947424102 * t6;
-  const T t13 = 0.587785252292473129169 * t7 - 0.951056516295153572116 * t8;
   p.St(y, t9);
+  const T t10 = t0 + 0.309016994374947424102 * t5 - 0.809016994374947424102 * t6;
   p.St(y + os, t10);
-  p.St(y + 2 * os, t12);
+  const T t11 = 0.951056516295153572116 * t7 + 0.587785252292473129169 * t8;
   p.St(y + 4 * os, -t11);
+  const T t12 = t0 - 0.809016994374947424102 * t5 + 0.309016994374947424102 * t6;
+  p.St(y + 2 * os, t12);
+  const T t13 = 0.587785252292473129169 * t7 - 0.951056516295153572116 * t8;
   p.St(y + 3 * os, -t13);
 }
 
@@ -154,8 +154,6 @@ template <class P>
 inline void RealTw05(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
                     const double* ws) {
   using T = typename P::T;
-  const T t0 = p.Ld(a);
-  const T t1 = p.LdB(b);
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
@@ -188,40 +186,41 @@ inline void RealTw05(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t31 = t7 - t25;
   const T t32 = t12 - t18;
   const T t33 = t13 - t19;
+  const T t0 = p.Ld(a);
   const T t34 = t0 + t26 + t28;
+  const T t1 = p.LdB(b);
+  p.St(a, t34);
   const T t35 = t1 + t27 + t29;
+  p.StB(b + 4 * s, t35);
   const T t36 = t0 + 0.309016994374947424102 * t26 - 0.809016994374947424102 * t28;
   const T t37 = t1 + 0.309016994374947424102 * t27 - 0.809016994374947424102 * t29;
   const T t38 = 0.951056516295153572116 * t31 + 0.587785252292473129169 * t33;
   const T t39 = 0.951056516295153572116 * t30 + 0.587785252292473129169 * t32;
   const T t40 = t36 + t38;
+  p.St(a + s, t40);
   const T t41 = t37 - t39;
+  p.StB(b + 3 * s, t41);
   const T t42 = t36 - t38;
+  p.StB(b, t42);
   const T t43 = t37 + t39;
+  p.St(a + 4 * s, -t43);
   const T t44 = t0 - 0.809016994374947424102 * t26 + 0.309016994374947424102 * t28;
   const T t45 = t1 - 0.809016994374947424102 * t27 + 0.309016994374947424102 * t29;
   const T t46 = 0.587785252292473129169 * t31 - 0.951056516295153572116 * t33;
   const T t47 = 0.587785252292473129169 * t30 - 0.951056516295153572116 * t32;
   const T t48 = t44 + t46;
-  const T t49 = t45 - t47;
-  const T t50 = t44 - t46;
-  const T t51 = t45 + t47;
-  p.St(a, t34);
-  p.StB(b + 4 * s, t35);
-  p.St(a + s, t40);
-  p.StB(b + 3 * s, t41);
   p.St(a + 2 * s, t48);
+  const T t49 = t45 - t47;
   p.StB(b + 2 * s, t49);
+  const T t50 = t44 - t46;
   p.StB(b + s, t50);
+  const T t51 = t45 + t47;
   p.St(a + 3 * s, -t51);
-  p.StB(b, t42);
-  p.St(a + 4 * s, -t43);
 }
 
 template <class P>
 inline void RealHalf05(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
-  const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + s);
   const T t2 = 0.809016994374947424102 * t1;
   const T t3 = 0.587785252292473129169 * t1;
@@ -242,26 +241,28 @@ inline void RealHalf05(const P& p, double* x, ptrdiff_t s) {
   const T t18 = t12 - t3;
   const T t19 = t5 + t8;
   const T t20 = t9 - t6;
+  const T t0 = p.Ld(x);
   const T t21 = t0 + t13 + t15;
+  p.St(x, t21);
   const T t22 = t14 + t16;
+  p.St(x + 4 * s, -t22);
   const T t23 = t0 + 0.309016994374947424102 * t13 - 0.809016994374947424102 * t15;
   const T t24 = 0.809016994374947424102 * t16 - 0.309016994374947424102 * t14;
   const T t25 = 0.951056516295153572116 * t18 + 0.587785252292473129169 * t20;
   const T t26 = 0.951056516295153572116 * t17 + 0.587785252292473129169 * t19;
   const T t27 = t23 + t25;
+  p.St(x + s, t27);
   const T t28 = t24 - t26;
+  p.St(x + 3 * s, t28);
   const T t31 = t0 - 0.809016994374947424102 * t13 + 0.309016994374947424102 * t15;
   const T t33 = 0.587785252292473129169 * t18 - 0.951056516295153572116 * t20;
   const T t35 = t31 + t33;
-  p.St(x, t21);
-  p.St(x + 4 * s, -t22);
-  p.St(x + s, t27);
-  p.St(x + 3 * s, t28);
   p.St(x + 2 * s, t35);
 }
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf05(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -283,6 +284,7 @@ void FftComplexLeaf05(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle05(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -305,6 +307,7 @@ void FftComplexTwiddle05(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf05(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 5 * os, 0, 0};
@@ -313,6 +316,7 @@ void FftRealLeaf05(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft05(ScalarAccess{}, in + t * is, ls, out + t * 5 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle05(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

@@ -22,32 +22,32 @@ inline void Dft08(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
-  T t2, t3;
-  p.LdC(xr + is, xi + is, t2, t3);
-  T t4, t5;
-  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
-  T t6, t7;
-  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
   T t8, t9;
   p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
-  T t10, t11;
-  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
-  T t12, t13;
-  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
-  T t14, t15;
-  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
   const T t16 = t0 + t8;
   const T t17 = t1 + t9;
   const T t18 = t0 - t8;
   const T t19 = t1 - t9;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
   const T t20 = t2 + t10;
   const T t21 = t3 + t11;
   const T t22 = t2 - t10;
   const T t23 = t3 - t11;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
   const T t24 = t4 + t12;
   const T t25 = t5 + t13;
   const T t26 = t4 - t12;
   const T t27 = t5 - t13;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
   const T t28 = t6 + t14;
   const T t29 = t7 + t15;
   const T t30 = t6 - t14;
@@ -62,12 +62,16 @@ inline void Dft08(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t39 = t21 - t29;
   const T t40 = t32 + t36;
   const T t41 = t33 + t37;
+  p.StC(yr, yi, t40, t41);
   const T t42 = t32 - t36;
   const T t43 = t33 - t37;
+  p.StC(yr + 4 * os, yi + 4 * os, t42, t43);
   const T t44 = t34 + t39;
   const T t45 = t35 - t38;
+  p.StC(yr + 2 * os, yi + 2 * os, t44, t45);
   const T t46 = t34 - t39;
   const T t47 = t35 + t38;
+  p.StC(yr + 6 * os, yi + 6 * os, t46, t47);
   const T t48 = t22 + t23;
   const T t49 = 0.707106781186547524401 * t48;
   const T t50 = t23 - t22;
@@ -86,19 +90,15 @@ inline void Dft08(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t63 = t51 + t55;
   const T t64 = t56 + t60;
   const T t65 = t57 + t61;
+  p.StC(yr + os, yi + os, t64, t65);
   const T t66 = t56 - t60;
   const T t67 = t57 - t61;
+  p.StC(yr + 5 * os, yi + 5 * os, t66, t67);
   const T t68 = t58 + t63;
   const T t69 = t59 - t62;
+  p.StC(yr + 3 * os, yi + 3 * os, t68, t69);
   const T t70 = t58 - t63;
   const T t71 = t59 + t62;
-  p.StC(yr, yi, t40, t41);
-  p.StC(yr + os, yi + os, t64, t65);
-  p.StC(yr + 2 * os, yi + 2 * os, t44, t45);
-  p.StC(yr + 3 * os, yi + 3 * os, t68, t69);
-  p.StC(yr + 4 * os, yi + 4 * os, t42, t43);
-  p.StC(yr + 5 * os, yi + 5 * os, t66, t67);
-  p.StC(yr + 6 * os, yi + 6 * os, t46, t47);
   p.StC(yr + 7 * os, yi + 7 * os, t70, t71);
 }
 
@@ -106,8 +106,6 @@ template <class P>
 inline void DftTw08(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
                    const double* ws) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(re, im, t0, t1);
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
@@ -150,6 +148,8 @@ inline void DftTw08(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t41 = p.LdW(ws + 6);
   const T t42 = t38 * t40 - t39 * t41;
   const T t43 = t39 * t40 + t38 * t41;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
   const T t44 = t0 + t24;
   const T t45 = t1 + t25;
   const T t46 = t0 - t24;
@@ -176,12 +176,16 @@ inline void DftTw08(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t67 = t49 - t57;
   const T t68 = t60 + t64;
   const T t69 = t61 + t65;
+  p.StC(re, im, t68, t69);
   const T t70 = t60 - t64;
   const T t71 = t61 - t65;
+  p.StC(re + 4 * s, im + 4 * s, t70, t71);
   const T t72 = t62 + t67;
   const T t73 = t63 - t66;
+  p.StC(re + 2 * s, im + 2 * s, t72, t73);
   const T t74 = t62 - t67;
   const T t75 = t63 + t66;
+  p.StC(re + 6 * s, im + 6 * s, t74, t75);
   const T t76 = t50 + t51;
   const T t77 = 0.707106781186547524401 * t76;
   const T t78 = t51 - t50;
@@ -200,19 +204,15 @@ inline void DftTw08(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t91 = t79 + t83;
   const T t92 = t84 + t88;
   const T t93 = t85 + t89;
+  p.StC(re + s, im + s, t92, t93);
   const T t94 = t84 - t88;
   const T t95 = t85 - t89;
+  p.StC(re + 5 * s, im + 5 * s, t94, t95);
   const T t96 = t86 + t91;
   const T t97 = t87 - t90;
+  p.StC(re + 3 * s, im + 3 * s, t96, t97);
   const T t98 = t86 - t91;
   const T t99 = t87 + t90;
-  p.StC(re, im, t68, t69);
-  p.StC(re + s, im + s, t92, t93);
-  p.StC(re + 2 * s, im + 2 * s, t72, t73);
-  p.StC(re + 3 * s, im + 3 * s, t96, t97);
-  p.StC(re + 4 * s, im + 4 * s, t70, t71);
-  p.StC(re + 5 * s, im + 5 * s, t94, t95);
-  p.StC(re + 6 * s, im + 6 * s, t74, t75);
   p.StC(re + 7 * s, im + 7 * s, t98, t99);
 }
 
@@ -220,27 +220,31 @@ template <class P>
 inline void RealDft08(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t0 = p.Ld(x);
-  const T t1 = p.Ld(x + is);
-  const T t2 = p.Ld(x + 2 * is);
-  const T t3 = p.Ld(x + 3 * is);
   const T t4 = p.Ld(x + 4 * is);
-  const T t5 = p.Ld(x + 5 * is);
-  const T t6 = p.Ld(x + 6 * is);
-  const T t7 = p.Ld(x + 7 * is);
   const T t8 = t0 + t4;
   const T t9 = t0 - t4;
+  const T t1 = p.Ld(x + is);
+  const T t5 = p.Ld(x + 5 * is);
   const T t10 = t1 + t5;
   const T t11 = t1 - t5;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t6 = p.Ld(x + 6 * is);
   const T t12 = t2 + t6;
   const T t13 = t2 - t6;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t7 = p.Ld(x + 7 * is);
   const T t14 = t3 + t7;
   const T t15 = t3 - t7;
   const T t16 = t8 + t12;
   const T t17 = t8 - t12;
+  p.St(y + 2 * os, t17);
   const T t18 = t10 + t14;
   const T t19 = t10 - t14;
+  p.St(y + 6 * os, -t19);
   const T t20 = t16 + t18;
+  p.St(y, t20);
   const T t21 = t16 - t18;
+  p.St(y + 4 * os, t21);
   const T t22 = 0.707106781186547524401 * t11;
   const T t23 = 0.707106781186547524401 * t11;
   const T t24 = 0.707106781186547524401 * t15;
@@ -250,16 +254,12 @@ inline void RealDft08(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
   const T t28 = t22 + t24;
   const T t29 = t25 - t23;
   const T t30 = t9 + t26;
-  const T t31 = t13 + t27;
-  const T t34 = t9 + t29;
-  const T t35 = t13 - t28;
-  p.St(y, t20);
   p.St(y + os, t30);
-  p.St(y + 2 * os, t17);
-  p.St(y + 3 * os, t34);
-  p.St(y + 4 * os, t21);
+  const T t31 = t13 + t27;
   p.St(y + 7 * os, -t31);
-  p.St(y + 6 * os, -t19);
+  const T t34 = t9 + t29;
+  p.St(y + 3 * os, t34);
+  const T t35 = t13 - t28;
   p.St(y + 5 * os, t35);
 }
 
@@ -267,8 +267,6 @@ template <class P>
 inline void RealTw08(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
                     const double* ws) {
   using T = typename P::T;
-  const T t0 = p.Ld(a);
-  const T t1 = p.LdB(b);
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
@@ -311,7 +309,9 @@ inline void RealTw08(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t41 = p.LdW(ws + 6);
   const T t42 = t38 * t40 - t39 * t41;
   const T t43 = t39 * t40 + t38 * t41;
+  const T t0 = p.Ld(a);
   const T t44 = t0 + t24;
+  const T t1 = p.LdB(b);
   const T t45 = t1 + t25;
   const T t46 = t0 - t24;
   const T t47 = t1 - t25;
@@ -336,13 +336,21 @@ inline void RealTw08(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t66 = t48 - t56;
   const T t67 = t49 - t57;
   const T t68 = t60 + t64;
+  p.St(a, t68);
   const T t69 = t61 + t65;
+  p.StB(b + 7 * s, t69);
   const T t70 = t60 - t64;
+  p.StB(b + 3 * s, t70);
   const T t71 = t61 - t65;
+  p.St(a + 4 * s, -t71);
   const T t72 = t62 + t67;
+  p.St(a + 2 * s, t72);
   const T t73 = t63 - t66;
+  p.StB(b + 5 * s, t73);
   const T t74 = t62 - t67;
+  p.StB(b + s, t74);
   const T t75 = t63 + t66;
+  p.St(a + 6 * s, -t75);
   const T t76 = t50 + t51;
   const T t77 = 0.707106781186547524401 * t76;
   const T t78 = t51 - t50;
@@ -360,35 +368,26 @@ inline void RealTw08(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t90 = t77 - t81;
   const T t91 = t79 + t83;
   const T t92 = t84 + t88;
-  const T t93 = t85 + t89;
-  const T t94 = t84 - t88;
-  const T t95 = t85 - t89;
-  const T t96 = t86 + t91;
-  const T t97 = t87 - t90;
-  const T t98 = t86 - t91;
-  const T t99 = t87 + t90;
-  p.St(a, t68);
-  p.StB(b + 7 * s, t69);
   p.St(a + s, t92);
+  const T t93 = t85 + t89;
   p.StB(b + 6 * s, t93);
-  p.St(a + 2 * s, t72);
-  p.StB(b + 5 * s, t73);
-  p.St(a + 3 * s, t96);
-  p.StB(b + 4 * s, t97);
-  p.StB(b + 3 * s, t70);
-  p.St(a + 4 * s, -t71);
+  const T t94 = t84 - t88;
   p.StB(b + 2 * s, t94);
+  const T t95 = t85 - t89;
   p.St(a + 5 * s, -t95);
-  p.StB(b + s, t74);
-  p.St(a + 6 * s, -t75);
+  const T t96 = t86 + t91;
+  p.St(a + 3 * s, t96);
+  const T t97 = t87 - t90;
+  p.StB(b + 4 * s, t97);
+  const T t98 = t86 - t91;
   p.StB(b, t98);
+  const T t99 = t87 + t90;
   p.St(a + 7 * s, -t99);
 }
 
 template <class P>
 inline void RealHalf08(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
-  const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + s);
   const T t2 = 0.923879532511286756128 * t1;
   const T t3 = 0.382683432365089771728 * t1;
@@ -398,7 +397,6 @@ inline void RealHalf08(const P& p, double* x, ptrdiff_t s) {
   const T t7 = p.Ld(x + 3 * s);
   const T t8 = 0.382683432365089771728 * t7;
   const T t9 = 0.923879532511286756128 * t7;
-  const T t10 = p.Ld(x + 4 * s);
   const T t11 = p.Ld(x + 5 * s);
   const T t12 = 0.382683432365089771728 * t11;
   const T t13 = 0.923879532511286756128 * t11;
@@ -420,7 +418,9 @@ inline void RealHalf08(const P& p, double* x, ptrdiff_t s) {
   const T t29 = t9 + t19;
   const T t30 = t8 + t18;
   const T t31 = t19 - t9;
+  const T t0 = p.Ld(x);
   const T t32 = t0 + t24;
+  const T t10 = p.Ld(x + 4 * s);
   const T t33 = t10 + t25;
   const T t34 = t0 - t24;
   const T t35 = t25 - t10;
@@ -429,9 +429,13 @@ inline void RealHalf08(const P& p, double* x, ptrdiff_t s) {
   const T t38 = t20 - t28;
   const T t39 = t29 - t21;
   const T t40 = t32 + t36;
+  p.St(x, t40);
   const T t41 = t33 + t37;
+  p.St(x + 7 * s, -t41);
   const T t44 = t34 + t39;
+  p.St(x + 2 * s, t44);
   const T t45 = t35 - t38;
+  p.St(x + 5 * s, t45);
   const T t48 = t22 + t23;
   const T t49 = 0.707106781186547524401 * t48;
   const T t50 = t23 - t22;
@@ -449,21 +453,18 @@ inline void RealHalf08(const P& p, double* x, ptrdiff_t s) {
   const T t62 = t49 - t53;
   const T t63 = t51 + t55;
   const T t64 = t56 + t60;
-  const T t65 = t57 + t61;
-  const T t68 = t58 + t63;
-  const T t69 = t59 - t62;
-  p.St(x, t40);
-  p.St(x + 7 * s, -t41);
   p.St(x + s, t64);
+  const T t65 = t57 + t61;
   p.St(x + 6 * s, t65);
-  p.St(x + 2 * s, t44);
-  p.St(x + 5 * s, t45);
+  const T t68 = t58 + t63;
   p.St(x + 3 * s, t68);
+  const T t69 = t59 - t62;
   p.St(x + 4 * s, t69);
 }
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf08(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -485,6 +486,7 @@ void FftComplexLeaf08(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle08(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -507,6 +509,7 @@ void FftComplexTwiddle08(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf08(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 8 * os, 0, 0};
@@ -515,6 +518,7 @@ void FftRealLeaf08(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft08(ScalarAccess{}, in + t * is, ls, out + t * 8 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle08(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

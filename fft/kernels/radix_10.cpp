@@ -22,40 +22,40 @@ inline void Dft10(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
-  T t2, t3;
-  p.LdC(xr + is, xi + is, t2, t3);
-  T t4, t5;
-  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
-  T t6, t7;
-  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
-  T t8, t9;
-  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
   T t10, t11;
   p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
-  T t12, t13;
-  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
-  T t14, t15;
-  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
-  T t16, t17;
-  p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
-  T t18, t19;
-  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
   const T t20 = t0 + t10;
   const T t21 = t1 + t11;
   const T t22 = t0 - t10;
   const T t23 = t1 - t11;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
   const T t24 = t2 + t12;
   const T t25 = t3 + t13;
   const T t26 = t2 - t12;
   const T t27 = t3 - t13;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
   const T t28 = t4 + t14;
   const T t29 = t5 + t15;
   const T t30 = t4 - t14;
   const T t31 = t5 - t15;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t16, t17;
+  p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
   const T t32 = t6 + t16;
   const T t33 = t7 + t17;
   const T t34 = t6 - t16;
   const T t35 = t7 - t17;
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  T t18, t19;
+  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
   const T t36 = t8 + t18;
   const T t37 = t9 + t19;
   const T t38 = t8 - t18;
@@ -70,22 +70,27 @@ inline void Dft10(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t47 = t29 - t33;
   const T t48 = t20 + t40 + t42;
   const T t49 = t21 + t41 + t43;
+  p.StC(yr, yi, t48, t49);
   const T t50 = t20 + 0.309016994374947424102 * t40 - 0.809016994374947424102 * t42;
   const T t51 = t21 + 0.309016994374947424102 * t41 - 0.809016994374947424102 * t43;
   const T t52 = 0.951056516295153572116 * t45 + 0.587785252292473129169 * t47;
   const T t53 = 0.951056516295153572116 * t44 + 0.587785252292473129169 * t46;
   const T t54 = t50 + t52;
   const T t55 = t51 - t53;
+  p.StC(yr + 2 * os, yi + 2 * os, t54, t55);
   const T t56 = t50 - t52;
   const T t57 = t51 + t53;
+  p.StC(yr + 8 * os, yi + 8 * os, t56, t57);
   const T t58 = t20 - 0.809016994374947424102 * t40 + 0.309016994374947424102 * t42;
   const T t59 = t21 - 0.809016994374947424102 * t41 + 0.309016994374947424102 * t43;
   const T t60 = 0.587785252292473129169 * t45 - 0.951056516295153572116 * t47;
   const T t61 = 0.587785252292473129169 * t44 - 0.951056516295153572116 * t46;
   const T t62 = t58 + t60;
   const T t63 = t59 - t61;
+  p.StC(yr + 4 * os, yi + 4 * os, t62, t63);
   const T t64 = t58 - t60;
   const T t65 = t59 + t61;
+  p.StC(yr + 6 * os, yi + 6 * os, t64, t65);
   const T t66 = 0.809016994374947424102 * t26 + 0.587785252292473129169 * t27;
   const T t67 = 0.809016994374947424102 * t27 - 0.587785252292473129169 * t26;
   const T t68 = 0.309016994374947424102 * t30 + 0.951056516295153572116 * t31;
@@ -104,40 +109,33 @@ inline void Dft10(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t81 = t69 + t71;
   const T t82 = t22 + t74 + t76;
   const T t83 = t23 + t75 + t77;
+  p.StC(yr + os, yi + os, t82, t83);
   const T t84 = t22 + 0.309016994374947424102 * t74 - 0.809016994374947424102 * t76;
   const T t85 = t23 + 0.309016994374947424102 * t75 - 0.809016994374947424102 * t77;
   const T t86 = 0.951056516295153572116 * t79 + 0.587785252292473129169 * t81;
   const T t87 = 0.951056516295153572116 * t78 + 0.587785252292473129169 * t80;
   const T t88 = t84 + t86;
   const T t89 = t85 - t87;
+  p.StC(yr + 3 * os, yi + 3 * os, t88, t89);
   const T t90 = t84 - t86;
   const T t91 = t85 + t87;
+  p.StC(yr + 9 * os, yi + 9 * os, t90, t91);
   const T t92 = t22 - 0.809016994374947424102 * t74 + 0.309016994374947424102 * t76;
   const T t93 = t23 - 0.809016994374947424102 * t75 + 0.309016994374947424102 * t77;
   const T t94 = 0.587785252292473129169 * t79 - 0.951056516295153572116 * t81;
   const T t95 = 0.587785252292473129169 * t78 - 0.951056516295153572116 * t80;
   const T t96 = t92 + t94;
   const T t97 = t93 - t95;
+  p.StC(yr + 5 * os, yi + 5 * os, t96, t97);
   const T t98 = t92 - t94;
   const T t99 = t93 + t95;
-  p.StC(yr, yi, t48, t49);
-  p.StC(yr + os, yi + os, t82, t83);
-  p.StC(yr + 2 * os, yi + 2 * os, t54, t55);
-  p.StC(yr + 3 * os, yi + 3 * os, t88, t89);
-  p.StC(yr + 4 * os, yi + 4 * os, t62, t63);
-  p.StC(yr + 5 * os, yi + 5 * os, t96, t97);
-  p.StC(yr + 6 * os, yi + 6 * os, t64, t65);
   p.StC(yr + 7 * os, yi + 7 * os, t98, t99);
-  p.StC(yr + 8 * os, yi + 8 * os, t56, t57);
-  p.StC(yr + 9 * os, yi + 9 * os, t90, t91);
 }
 
 template <class P>
 inline void DftTw10(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
                    const double* ws) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(re, im, t0, t1);
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
@@ -192,6 +190,8 @@ inline void DftTw10(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t53 = p.LdW(ws + 8);
   const T t54 = t50 * t52 - t51 * t53;
   const T t55 = t51 * t52 + t50 * t53;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
   const T t56 = t0 + t30;
   const T t57 = t1 + t31;
   const T t58 = t0 - t30;
@@ -222,22 +222,27 @@ inline void DftTw10(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t83 = t65 - t69;
   const T t84 = t56 + t76 + t78;
   const T t85 = t57 + t77 + t79;
+  p.StC(re, im, t84, t85);
   const T t86 = t56 + 0.309016994374947424102 * t76 - 0.809016994374947424102 * t78;
   const T t87 = t57 + 0.309016994374947424102 * t77 - 0.809016994374947424102 * t79;
   const T t88 = 0.951056516295153572116 * t81 + 0.587785252292473129169 * t83;
   const T t89 = 0.951056516295153572116 * t80 + 0.587785252292473129169 * t82;
   const T t90 = t86 + t88;
   const T t91 = t87 - t89;
+  p.StC(re + 2 * s, im + 2 * s, t90, t91);
   const T t92 = t86 - t88;
   const T t93 = t87 + t89;
+  p.StC(re + 8 * s, im + 8 * s, t92, t93);
   const T t94 = t56 - 0.809016994374947424102 * t76 + 0.309016994374947424102 * t78;
   const T t95 = t57 - 0.809016994374947424102 * t77 + 0.309016994374947424102 * t79;
   const T t96 = 0.587785252292473129169 * t81 - 0.951056516295153572116 * t83;
   const T t97 = 0.587785252292473129169 * t80 - 0.951056516295153572116 * t82;
   const T t98 = t94 + t96;
   const T t99 = t95 - t97;
+  p.StC(re + 4 * s, im + 4 * s, t98, t99);
   const T t100 = t94 - t96;
   const T t101 = t95 + t97;
+  p.StC(re + 6 * s, im + 6 * s, t100, t101);
   const T t102 = 0.809016994374947424102 * t62 + 0.587785252292473129169 * t63;
   const T t103 = 0.809016994374947424102 * t63 - 0.587785252292473129169 * t62;
   const T t104 = 0.309016994374947424102 * t66 + 0.951056516295153572116 * t67;
@@ -256,55 +261,50 @@ inline void DftTw10(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t117 = t105 + t107;
   const T t118 = t58 + t110 + t112;
   const T t119 = t59 + t111 + t113;
+  p.StC(re + s, im + s, t118, t119);
   const T t120 = t58 + 0.309016994374947424102 * t110 - 0.809016994374947424102 * t112;
   const T t121 = t59 + 0.309016994374947424102 * t111 - 0.809016994374947424102 * t113;
   const T t122 = 0.951056516295153572116 * t115 + 0.587785252292473129169 * t117;
   const T t123 = 0.951056516295153572116 * t114 + 0.587785252292473129169 * t116;
   const T t124 = t120 + t122;
   const T t125 = t121 - t123;
+  p.StC(re + 3 * s, im + 3 * s, t124, t125);
   const T t126 = t120 - t122;
   const T t127 = t121 + t123;
+  p.StC(re + 9 * s, im + 9 * s, t126, t127);
   const T t128 = t58 - 0.809016994374947424102 * t110 + 0.309016994374947424102 * t112;
   const T t129 = t59 - 0.809016994374947424102 * t111 + 0.309016994374947424102 * t113;
   const T t130 = 0.587785252292473129169 * t115 - 0.951056516295153572116 * t117;
   const T t131 = 0.587785252292473129169 * t114 - 0.951056516295153572116 * t116;
   const T t132 = t128 + t130;
   const T t133 = t129 - t131;
+  p.StC(re + 5 * s, im + 5 * s, t132, t133);
   const T t134 = t128 - t130;
   const T t135 = t129 + t131;
-  p.StC(re, im, t84, t85);
-  p.StC(re + s, im + s, t118, t119);
-  p.StC(re + 2 * s, im + 2 * s, t90, t91);
-  p.StC(re + 3 * s, im + 3 * s, t124, t125);
-  p.StC(re + 4 * s, im + 4 * s, t98, t99);
-  p.StC(re + 5 * s, im + 5 * s, t132, t133);
-  p.StC(re + 6 * s, im + 6 * s, t100, t101);
   p.StC(re + 7 * s, im + 7 * s, t134, t135);
-  p.StC(re + 8 * s, im + 8 * s, t92, t93);
-  p.StC(re + 9 * s, im + 9 * s, t126, t127);
 }
 
 template <class P>
 inline void RealDft10(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t0 = p.Ld(x);
-  const T t1 = p.Ld(x + is);
-  const T t2 = p.Ld(x + 2 * is);
-  const T t3 = p.Ld(x + 3 * is);
-  const T t4 = p.Ld(x + 4 * is);
   const T t5 = p.Ld(x + 5 * is);
-  const T t6 = p.Ld(x + 6 * is);
-  const T t7 = p.Ld(x + 7 * is);
-  const T t8 = p.Ld(x + 8 * is);
-  const T t9 = p.Ld(x + 9 * is);
   const T t10 = t0 + t5;
   const T t11 = t0 - t5;
+  const T t1 = p.Ld(x + is);
+  const T t6 = p.Ld(x + 6 * is);
   const T t12 = t1 + t6;
   const T t13 = t1 - t6;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t7 = p.Ld(x + 7 * is);
   const T t14 = t2 + t7;
   const T t15 = t2 - t7;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t8 = p.Ld(x + 8 * is);
   const T t16 = t3 + t8;
   const T t17 = t3 - t8;
+  const T t4 = p.Ld(x + 4 * is);
+  const T t9 = p.Ld(x + 9 * is);
   const T t18 = t4 + t9;
   const T t19 = t4 - t9;
   const T t20 = t12 + t18;
@@ -312,10 +312,15 @@ inline void RealDft10(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
   const T t22 = t12 - t18;
   const T t23 = t14 - t16;
   const T t24 = t10 + t20 + t21;
+  p.St(y, t24);
   const T t25 = t10 + 0.309016994374947424102 * t20 - 0.809016994374947424102 * t21;
+  p.St(y + 2 * os, t25);
   const T t26 = 0.951056516295153572116 * t22 + 0.587785252292473129169 * t23;
+  p.St(y + 8 * os, -t26);
   const T t27 = t10 - 0.809016994374947424102 * t20 + 0.309016994374947424102 * t21;
+  p.St(y + 4 * os, t27);
   const T t28 = 0.587785252292473129169 * t22 - 0.951056516295153572116 * t23;
+  p.St(y + 6 * os, -t28);
   const T t29 = 0.809016994374947424102 * t13;
   const T t30 = 0.587785252292473129169 * t13;
   const T t31 = 0.309016994374947424102 * t15;
@@ -333,34 +338,27 @@ inline void RealDft10(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
   const T t43 = t31 + t33;
   const T t44 = t34 - t32;
   const T t45 = t11 + t37 + t39;
+  p.St(y + os, t45);
   const T t46 = t38 + t40;
+  p.St(y + 9 * os, -t46);
   const T t47 = t11 + 0.309016994374947424102 * t37 - 0.809016994374947424102 * t39;
   const T t48 = 0.809016994374947424102 * t40 - 0.309016994374947424102 * t38;
   const T t49 = 0.951056516295153572116 * t42 + 0.587785252292473129169 * t44;
   const T t50 = 0.951056516295153572116 * t41 + 0.587785252292473129169 * t43;
   const T t51 = t47 + t49;
+  p.St(y + 3 * os, t51);
   const T t52 = t48 - t50;
+  p.St(y + 7 * os, t52);
   const T t55 = t11 - 0.809016994374947424102 * t37 + 0.309016994374947424102 * t39;
   const T t57 = 0.587785252292473129169 * t42 - 0.951056516295153572116 * t44;
   const T t59 = t55 + t57;
-  p.St(y, t24);
-  p.St(y + os, t45);
-  p.St(y + 2 * os, t25);
-  p.St(y + 3 * os, t51);
-  p.St(y + 4 * os, t27);
   p.St(y + 5 * os, t59);
-  p.St(y + 9 * os, -t46);
-  p.St(y + 8 * os, -t26);
-  p.St(y + 7 * os, t52);
-  p.St(y + 6 * os, -t28);
 }
 
 template <class P>
 inline void RealTw10(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
                     const double* ws) {
   using T = typename P::T;
-  const T t0 = p.Ld(a);
-  const T t1 = p.LdB(b);
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
@@ -415,7 +413,9 @@ inline void RealTw10(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t53 = p.LdW(ws + 8);
   const T t54 = t50 * t52 - t51 * t53;
   const T t55 = t51 * t52 + t50 * t53;
+  const T t0 = p.Ld(a);
   const T t56 = t0 + t30;
+  const T t1 = p.LdB(b);
   const T t57 = t1 + t31;
   const T t58 = t0 - t30;
   const T t59 = t1 - t31;
@@ -444,23 +444,33 @@ inline void RealTw10(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t82 = t64 - t68;
   const T t83 = t65 - t69;
   const T t84 = t56 + t76 + t78;
+  p.St(a, t84);
   const T t85 = t57 + t77 + t79;
+  p.StB(b + 9 * s, t85);
   const T t86 = t56 + 0.309016994374947424102 * t76 - 0.809016994374947424102 * t78;
   const T t87 = t57 + 0.309016994374947424102 * t77 - 0.809016994374947424102 * t79;
   const T t88 = 0.951056516295153572116 * t81 + 0.587785252292473129169 * t83;
   const T t89 = 0.951056516295153572116 * t80 + 0.587785252292473129169 * t82;
   const T t90 = t86 + t88;
+  p.St(a + 2 * s, t90);
   const T t91 = t87 - t89;
+  p.StB(b + 7 * s, t91);
   const T t92 = t86 - t88;
+  p.StB(b + s, t92);
   const T t93 = t87 + t89;
+  p.St(a + 8 * s, -t93);
   const T t94 = t56 - 0.809016994374947424102 * t76 + 0.309016994374947424102 * t78;
   const T t95 = t57 - 0.809016994374947424102 * t77 + 0.309016994374947424102 * t79;
   const T t96 = 0.587785252292473129169 * t81 - 0.951056516295153572116 * t83;
   const T t97 = 0.587785252292473129169 * t80 - 0.951056516295153572116 * t82;
   const T t98 = t94 + t96;
+  p.St(a + 4 * s, t98);
   const T t99 = t95 - t97;
+  p.StB(b + 5 * s, t99);
   const T t100 = t94 - t96;
+  p.StB(b + 3 * s, t100);
   const T t101 = t95 + t97;
+  p.St(a + 6 * s, -t101);
   const T t102 = 0.809016994374947424102 * t62 + 0.587785252292473129169 * t63;
   const T t103 = 0.809016994374947424102 * t63 - 0.587785252292473129169 * t62;
   const T t104 = 0.309016994374947424102 * t66 + 0.951056516295153572116 * t67;
@@ -478,49 +488,38 @@ inline void RealTw10(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t116 = t104 - t106;
   const T t117 = t105 + t107;
   const T t118 = t58 + t110 + t112;
+  p.St(a + s, t118);
   const T t119 = t59 + t111 + t113;
+  p.StB(b + 8 * s, t119);
   const T t120 = t58 + 0.309016994374947424102 * t110 - 0.809016994374947424102 * t112;
   const T t121 = t59 + 0.309016994374947424102 * t111 - 0.809016994374947424102 * t113;
   const T t122 = 0.951056516295153572116 * t115 + 0.587785252292473129169 * t117;
   const T t123 = 0.951056516295153572116 * t114 + 0.587785252292473129169 * t116;
   const T t124 = t120 + t122;
+  p.St(a + 3 * s, t124);
   const T t125 = t121 - t123;
+  p.StB(b + 6 * s, t125);
   const T t126 = t120 - t122;
+  p.StB(b, t126);
   const T t127 = t121 + t123;
+  p.St(a + 9 * s, -t127);
   const T t128 = t58 - 0.809016994374947424102 * t110 + 0.309016994374947424102 * t112;
   const T t129 = t59 - 0.809016994374947424102 * t111 + 0.309016994374947424102 * t113;
   const T t130 = 0.587785252292473129169 * t115 - 0.951056516295153572116 * t117;
   const T t131 = 0.587785252292473129169 * t114 - 0.951056516295153572116 * t116;
   const T t132 = t128 + t130;
-  const T t133 = t129 - t131;
-  const T t134 = t128 - t130;
-  const T t135 = t129 + t131;
-  p.St(a, t84);
-  p.StB(b + 9 * s, t85);
-  p.St(a + s, t118);
-  p.StB(b + 8 * s, t119);
-  p.St(a + 2 * s, t90);
-  p.StB(b + 7 * s, t91);
-  p.St(a + 3 * s, t124);
-  p.StB(b + 6 * s, t125);
-  p.St(a + 4 * s, t98);
-  p.StB(b + 5 * s, t99);
   p.StB(b + 4 * s, t132);
+  const T t133 = t129 - t131;
   p.St(a + 5 * s, -t133);
-  p.StB(b + 3 * s, t100);
-  p.St(a + 6 * s, -t101);
+  const T t134 = t128 - t130;
   p.StB(b + 2 * s, t134);
+  const T t135 = t129 + t131;
   p.St(a + 7 * s, -t135);
-  p.StB(b + s, t92);
-  p.St(a + 8 * s, -t93);
-  p.StB(b, t126);
-  p.St(a + 9 * s, -t127);
 }
 
 template <class P>
 inline void RealHalf10(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
-  const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + s);
   const T t2 = 0.951056516295153572116 * t1;
   const T t3 = 0.309016994374947424102 * t1;
@@ -533,7 +532,6 @@ inline void RealHalf10(const P& p, double* x, ptrdiff_t s) {
   const T t10 = p.Ld(x + 4 * s);
   const T t11 = 0.309016994374947424102 * t10;
   const T t12 = 0.951056516295153572116 * t10;
-  const T t13 = p.Ld(x + 5 * s);
   const T t14 = p.Ld(x + 6 * s);
   const T t15 = 0.309016994374947424102 * t14;
   const T t16 = 0.951056516295153572116 * t14;
@@ -570,20 +568,28 @@ inline void RealHalf10(const P& p, double* x, ptrdiff_t s) {
   const T t47 = t39 - t27;
   const T t48 = t30 - t34;
   const T t49 = t35 - t31;
+  const T t0 = p.Ld(x);
   const T t50 = t0 + t42 + t44;
+  const T t13 = p.Ld(x + 5 * s);
+  p.St(x, t50);
   const T t51 = t13 + t43 + t45;
+  p.St(x + 9 * s, -t51);
   const T t52 = t0 + 0.309016994374947424102 * t42 - 0.809016994374947424102 * t44;
   const T t53 = t13 + 0.309016994374947424102 * t43 - 0.809016994374947424102 * t45;
   const T t54 = 0.951056516295153572116 * t47 + 0.587785252292473129169 * t49;
   const T t55 = 0.951056516295153572116 * t46 + 0.587785252292473129169 * t48;
   const T t56 = t52 + t54;
+  p.St(x + 2 * s, t56);
   const T t57 = t53 + t55;
+  p.St(x + 7 * s, -t57);
   const T t60 = t0 - 0.809016994374947424102 * t42 + 0.309016994374947424102 * t44;
   const T t61 = 0.809016994374947424102 * t43 - t13 - 0.309016994374947424102 * t45;
   const T t62 = 0.587785252292473129169 * t47 - 0.951056516295153572116 * t49;
   const T t63 = 0.587785252292473129169 * t46 - 0.951056516295153572116 * t48;
   const T t64 = t60 + t62;
+  p.St(x + 4 * s, t64);
   const T t65 = t61 - t63;
+  p.St(x + 5 * s, t65);
   const T t68 = 0.809016994374947424102 * t28 + 0.587785252292473129169 * t29;
   const T t69 = 0.809016994374947424102 * t29 - 0.587785252292473129169 * t28;
   const T t70 = 0.309016994374947424102 * t32 + 0.951056516295153572116 * t33;
@@ -601,27 +607,22 @@ inline void RealHalf10(const P& p, double* x, ptrdiff_t s) {
   const T t82 = t70 - t72;
   const T t83 = t71 + t73;
   const T t84 = t0 + t76 + t78;
+  p.St(x + s, t84);
   const T t85 = t13 + t77 + t79;
+  p.St(x + 8 * s, t85);
   const T t86 = t0 + 0.309016994374947424102 * t76 - 0.809016994374947424102 * t78;
   const T t87 = t13 + 0.309016994374947424102 * t77 - 0.809016994374947424102 * t79;
   const T t88 = 0.951056516295153572116 * t81 + 0.587785252292473129169 * t83;
   const T t89 = 0.951056516295153572116 * t80 + 0.587785252292473129169 * t82;
   const T t90 = t86 + t88;
-  const T t91 = t87 - t89;
-  p.St(x, t50);
-  p.St(x + 9 * s, -t51);
-  p.St(x + s, t84);
-  p.St(x + 8 * s, t85);
-  p.St(x + 2 * s, t56);
-  p.St(x + 7 * s, -t57);
   p.St(x + 3 * s, t90);
+  const T t91 = t87 - t89;
   p.St(x + 6 * s, t91);
-  p.St(x + 4 * s, t64);
-  p.St(x + 5 * s, t65);
 }
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf10(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -643,6 +644,7 @@ void FftComplexLeaf10(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle10(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -665,6 +667,7 @@ void FftComplexTwiddle10(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf10(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 10 * os, 0, 0};
@@ -673,6 +676,7 @@ void FftRealLeaf10(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft10(ScalarAccess{}, in + t * is, ls, out + t * 10 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle10(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

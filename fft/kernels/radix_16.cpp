@@ -22,40 +22,16 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
-  T t2, t3;
-  p.LdC(xr + is, xi + is, t2, t3);
-  T t4, t5;
-  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
-  T t6, t7;
-  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
-  T t8, t9;
-  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
-  T t10, t11;
-  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
-  T t12, t13;
-  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
-  T t14, t15;
-  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
   T t16, t17;
   p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
-  T t18, t19;
-  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
-  T t20, t21;
-  p.LdC(xr + 10 * is, xi + 10 * is, t20, t21);
-  T t22, t23;
-  p.LdC(xr + 11 * is, xi + 11 * is, t22, t23);
-  T t24, t25;
-  p.LdC(xr + 12 * is, xi + 12 * is, t24, t25);
-  T t26, t27;
-  p.LdC(xr + 13 * is, xi + 13 * is, t26, t27);
-  T t28, t29;
-  p.LdC(xr + 14 * is, xi + 14 * is, t28, t29);
-  T t30, t31;
-  p.LdC(xr + 15 * is, xi + 15 * is, t30, t31);
   const T t32 = t0 + t16;
   const T t33 = t1 + t17;
   const T t34 = t0 - t16;
   const T t35 = t1 - t17;
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  T t24, t25;
+  p.LdC(xr + 12 * is, xi + 12 * is, t24, t25);
   const T t36 = t8 + t24;
   const T t37 = t9 + t25;
   const T t38 = t8 - t24;
@@ -68,10 +44,18 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t45 = t35 - t38;
   const T t46 = t34 - t39;
   const T t47 = t35 + t38;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t18, t19;
+  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
   const T t48 = t2 + t18;
   const T t49 = t3 + t19;
   const T t50 = t2 - t18;
   const T t51 = t3 - t19;
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  T t26, t27;
+  p.LdC(xr + 13 * is, xi + 13 * is, t26, t27);
   const T t52 = t10 + t26;
   const T t53 = t11 + t27;
   const T t54 = t10 - t26;
@@ -84,10 +68,18 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t61 = t51 - t54;
   const T t62 = t50 - t55;
   const T t63 = t51 + t54;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t20, t21;
+  p.LdC(xr + 10 * is, xi + 10 * is, t20, t21);
   const T t64 = t4 + t20;
   const T t65 = t5 + t21;
   const T t66 = t4 - t20;
   const T t67 = t5 - t21;
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  T t28, t29;
+  p.LdC(xr + 14 * is, xi + 14 * is, t28, t29);
   const T t68 = t12 + t28;
   const T t69 = t13 + t29;
   const T t70 = t12 - t28;
@@ -100,10 +92,18 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t77 = t67 - t70;
   const T t78 = t66 - t71;
   const T t79 = t67 + t70;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t22, t23;
+  p.LdC(xr + 11 * is, xi + 11 * is, t22, t23);
   const T t80 = t6 + t22;
   const T t81 = t7 + t23;
   const T t82 = t6 - t22;
   const T t83 = t7 - t23;
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
+  T t30, t31;
+  p.LdC(xr + 15 * is, xi + 15 * is, t30, t31);
   const T t84 = t14 + t30;
   const T t85 = t15 + t31;
   const T t86 = t14 - t30;
@@ -126,12 +126,16 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t103 = t57 - t89;
   const T t104 = t96 + t100;
   const T t105 = t97 + t101;
+  p.StC(yr, yi, t104, t105);
   const T t106 = t96 - t100;
   const T t107 = t97 - t101;
+  p.StC(yr + 8 * os, yi + 8 * os, t106, t107);
   const T t108 = t98 + t103;
   const T t109 = t99 - t102;
+  p.StC(yr + 4 * os, yi + 4 * os, t108, t109);
   const T t110 = t98 - t103;
   const T t111 = t99 + t102;
+  p.StC(yr + 12 * os, yi + 12 * os, t110, t111);
   const T t112 = 0.923879532511286756128 * t60 + 0.382683432365089771728 * t61;
   const T t113 = 0.923879532511286756128 * t61 - 0.382683432365089771728 * t60;
   const T t114 = t76 + t77;
@@ -150,12 +154,16 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t127 = t113 - t119;
   const T t128 = t120 + t124;
   const T t129 = t121 + t125;
+  p.StC(yr + os, yi + os, t128, t129);
   const T t130 = t120 - t124;
   const T t131 = t121 - t125;
+  p.StC(yr + 9 * os, yi + 9 * os, t130, t131);
   const T t132 = t122 + t127;
   const T t133 = t123 - t126;
+  p.StC(yr + 5 * os, yi + 5 * os, t132, t133);
   const T t134 = t122 - t127;
   const T t135 = t123 + t126;
+  p.StC(yr + 13 * os, yi + 13 * os, t134, t135);
   const T t136 = t58 + t59;
   const T t137 = 0.707106781186547524401 * t136;
   const T t138 = t59 - t58;
@@ -174,12 +182,16 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t151 = t139 + t143;
   const T t152 = t144 + t148;
   const T t153 = t145 + t149;
+  p.StC(yr + 2 * os, yi + 2 * os, t152, t153);
   const T t154 = t144 - t148;
   const T t155 = t145 - t149;
+  p.StC(yr + 10 * os, yi + 10 * os, t154, t155);
   const T t156 = t146 + t151;
   const T t157 = t147 - t150;
+  p.StC(yr + 6 * os, yi + 6 * os, t156, t157);
   const T t158 = t146 - t151;
   const T t159 = t147 + t150;
+  p.StC(yr + 14 * os, yi + 14 * os, t158, t159);
   const T t160 = 0.382683432365089771728 * t62 + 0.923879532511286756128 * t63;
   const T t161 = 0.382683432365089771728 * t63 - 0.923879532511286756128 * t62;
   const T t162 = t79 - t78;
@@ -198,27 +210,15 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
   const T t175 = t161 - t167;
   const T t176 = t168 + t172;
   const T t177 = t169 + t173;
+  p.StC(yr + 3 * os, yi + 3 * os, t176, t177);
   const T t178 = t168 - t172;
   const T t179 = t169 - t173;
+  p.StC(yr + 11 * os, yi + 11 * os, t178, t179);
   const T t180 = t170 + t175;
   const T t181 = t171 - t174;
+  p.StC(yr + 7 * os, yi + 7 * os, t180, t181);
   const T t182 = t170 - t175;
   const T t183 = t171 + t174;
-  p.StC(yr, yi, t104, t105);
-  p.StC(yr + os, yi + os, t128, t129);
-  p.StC(yr + 2 * os, yi + 2 * os, t152, t153);
-  p.StC(yr + 3 * os, yi + 3 * os, t176, t177);
-  p.StC(yr + 4 * os, yi + 4 * os, t108, t109);
-  p.StC(yr + 5 * os, yi + 5 * os, t132, t133);
-  p.StC(yr + 6 * os, yi + 6 * os, t156, t157);
-  p.StC(yr + 7 * os, yi + 7 * os, t180, t181);
-  p.StC(yr + 8 * os, yi + 8 * os, t106, t107);
-  p.StC(yr + 9 * os, yi + 9 * os, t130, t131);
-  p.StC(yr + 10 * os, yi + 10 * os, t154, t155);
-  p.StC(yr + 11 * os, yi + 11 * os, t178, t179);
-  p.StC(yr + 12 * os, yi + 12 * os, t110, t111);
-  p.StC(yr + 13 * os, yi + 13 * os, t134, t135);
-  p.StC(yr + 14 * os, yi + 14 * os, t158, t159);
   p.StC(yr + 15 * os, yi + 15 * os, t182, t183);
 }
 
@@ -226,8 +226,6 @@ template <class P>
 inline void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
                    const double* ws) {
   using T = typename P::T;
-  T t0, t1;
-  p.LdC(re, im, t0, t1);
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
@@ -318,6 +316,8 @@ inline void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t89 = p.LdW(ws + 14);
   const T t90 = t86 * t88 - t87 * t89;
   const T t91 = t87 * t88 + t86 * t89;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
   const T t92 = t0 + t48;
   const T t93 = t1 + t49;
   const T t94 = t0 - t48;
@@ -392,12 +392,16 @@ inline void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t163 = t117 - t149;
   const T t164 = t156 + t160;
   const T t165 = t157 + t161;
+  p.StC(re, im, t164, t165);
   const T t166 = t156 - t160;
   const T t167 = t157 - t161;
+  p.StC(re + 8 * s, im + 8 * s, t166, t167);
   const T t168 = t158 + t163;
   const T t169 = t159 - t162;
+  p.StC(re + 4 * s, im + 4 * s, t168, t169);
   const T t170 = t158 - t163;
   const T t171 = t159 + t162;
+  p.StC(re + 12 * s, im + 12 * s, t170, t171);
   const T t172 = 0.923879532511286756128 * t120 + 0.382683432365089771728 * t121;
   const T t173 = 0.923879532511286756128 * t121 - 0.382683432365089771728 * t120;
   const T t174 = t136 + t137;
@@ -416,12 +420,16 @@ inline void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t187 = t173 - t179;
   const T t188 = t180 + t184;
   const T t189 = t181 + t185;
+  p.StC(re + s, im + s, t188, t189);
   const T t190 = t180 - t184;
   const T t191 = t181 - t185;
+  p.StC(re + 9 * s, im + 9 * s, t190, t191);
   const T t192 = t182 + t187;
   const T t193 = t183 - t186;
+  p.StC(re + 5 * s, im + 5 * s, t192, t193);
   const T t194 = t182 - t187;
   const T t195 = t183 + t186;
+  p.StC(re + 13 * s, im + 13 * s, t194, t195);
   const T t196 = t118 + t119;
   const T t197 = 0.707106781186547524401 * t196;
   const T t198 = t119 - t118;
@@ -440,12 +448,16 @@ inline void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t211 = t199 + t203;
   const T t212 = t204 + t208;
   const T t213 = t205 + t209;
+  p.StC(re + 2 * s, im + 2 * s, t212, t213);
   const T t214 = t204 - t208;
   const T t215 = t205 - t209;
+  p.StC(re + 10 * s, im + 10 * s, t214, t215);
   const T t216 = t206 + t211;
   const T t217 = t207 - t210;
+  p.StC(re + 6 * s, im + 6 * s, t216, t217);
   const T t218 = t206 - t211;
   const T t219 = t207 + t210;
+  p.StC(re + 14 * s, im + 14 * s, t218, t219);
   const T t220 = 0.382683432365089771728 * t122 + 0.923879532511286756128 * t123;
   const T t221 = 0.382683432365089771728 * t123 - 0.923879532511286756128 * t122;
   const T t222 = t139 - t138;
@@ -464,27 +476,15 @@ inline void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const doubl
   const T t235 = t221 - t227;
   const T t236 = t228 + t232;
   const T t237 = t229 + t233;
+  p.StC(re + 3 * s, im + 3 * s, t236, t237);
   const T t238 = t228 - t232;
   const T t239 = t229 - t233;
+  p.StC(re + 11 * s, im + 11 * s, t238, t239);
   const T t240 = t230 + t235;
   const T t241 = t231 - t234;
+  p.StC(re + 7 * s, im + 7 * s, t240, t241);
   const T t242 = t230 - t235;
   const T t243 = t231 + t234;
-  p.StC(re, im, t164, t165);
-  p.StC(re + s, im + s, t188, t189);
-  p.StC(re + 2 * s, im + 2 * s, t212, t213);
-  p.StC(re + 3 * s, im + 3 * s, t236, t237);
-  p.StC(re + 4 * s, im + 4 * s, t168, t169);
-  p.StC(re + 5 * s, im + 5 * s, t192, t193);
-  p.StC(re + 6 * s, im + 6 * s, t216, t217);
-  p.StC(re + 7 * s, im + 7 * s, t240, t241);
-  p.StC(re + 8 * s, im + 8 * s, t166, t167);
-  p.StC(re + 9 * s, im + 9 * s, t190, t191);
-  p.StC(re + 10 * s, im + 10 * s, t214, t215);
-  p.StC(re + 11 * s, im + 11 * s, t238, t239);
-  p.StC(re + 12 * s, im + 12 * s, t170, t171);
-  p.StC(re + 13 * s, im + 13 * s, t194, t195);
-  p.StC(re + 14 * s, im + 14 * s, t218, t219);
   p.StC(re + 15 * s, im + 15 * s, t242, t243);
 }
 
@@ -492,51 +492,55 @@ template <class P>
 inline void RealDft16(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t0 = p.Ld(x);
-  const T t1 = p.Ld(x + is);
-  const T t2 = p.Ld(x + 2 * is);
-  const T t3 = p.Ld(x + 3 * is);
-  const T t4 = p.Ld(x + 4 * is);
-  const T t5 = p.Ld(x + 5 * is);
-  const T t6 = p.Ld(x + 6 * is);
-  const T t7 = p.Ld(x + 7 * is);
   const T t8 = p.Ld(x + 8 * is);
-  const T t9 = p.Ld(x + 9 * is);
-  const T t10 = p.Ld(x + 10 * is);
-  const T t11 = p.Ld(x + 11 * is);
-  const T t12 = p.Ld(x + 12 * is);
-  const T t13 = p.Ld(x + 13 * is);
-  const T t14 = p.Ld(x + 14 * is);
-  const T t15 = p.Ld(x + 15 * is);
   const T t16 = t0 + t8;
   const T t17 = t0 - t8;
+  const T t4 = p.Ld(x + 4 * is);
+  const T t12 = p.Ld(x + 12 * is);
   const T t18 = t4 + t12;
   const T t19 = t4 - t12;
   const T t20 = t16 + t18;
   const T t21 = t16 - t18;
+  const T t1 = p.Ld(x + is);
+  const T t9 = p.Ld(x + 9 * is);
   const T t22 = t1 + t9;
   const T t23 = t1 - t9;
+  const T t5 = p.Ld(x + 5 * is);
+  const T t13 = p.Ld(x + 13 * is);
   const T t24 = t5 + t13;
   const T t25 = t5 - t13;
   const T t26 = t22 + t24;
   const T t27 = t22 - t24;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t10 = p.Ld(x + 10 * is);
   const T t28 = t2 + t10;
   const T t29 = t2 - t10;
+  const T t6 = p.Ld(x + 6 * is);
+  const T t14 = p.Ld(x + 14 * is);
   const T t30 = t6 + t14;
   const T t31 = t6 - t14;
   const T t32 = t28 + t30;
   const T t33 = t28 - t30;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t11 = p.Ld(x + 11 * is);
   const T t34 = t3 + t11;
   const T t35 = t3 - t11;
+  const T t7 = p.Ld(x + 7 * is);
+  const T t15 = p.Ld(x + 15 * is);
   const T t36 = t7 + t15;
   const T t37 = t7 - t15;
   const T t38 = t34 + t36;
   const T t39 = t34 - t36;
   const T t40 = t20 + t32;
   const T t41 = t20 - t32;
+  p.St(y + 4 * os, t41);
   const T t42 = t26 + t38;
   const T t43 = t26 - t38;
+  p.St(y + 12 * os, -t43);
   const T t44 = t40 + t42;
+  p.St(y, t44);
   const T t45 = t40 - t42;
+  p.St(y + 8 * os, t45);
   const T t46 = 0.923879532511286756128 * t23 - 0.382683432365089771728 * t25;
   const T t47 = 0.923879532511286756128 * t25 + 0.382683432365089771728 * t23;
   const T t48 = t29 - t31;
@@ -554,9 +558,13 @@ inline void RealDft16(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
   const T t60 = t46 - t52;
   const T t61 = t53 - t47;
   const T t62 = t54 + t58;
+  p.St(y + os, t62);
   const T t63 = t55 + t59;
+  p.St(y + 15 * os, -t63);
   const T t66 = t56 + t61;
+  p.St(y + 5 * os, t66);
   const T t67 = t57 - t60;
+  p.St(y + 11 * os, t67);
   const T t70 = 0.707106781186547524401 * t27;
   const T t71 = 0.707106781186547524401 * t27;
   const T t72 = 0.707106781186547524401 * t39;
@@ -566,9 +574,13 @@ inline void RealDft16(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
   const T t76 = t70 + t72;
   const T t77 = t73 - t71;
   const T t78 = t21 + t74;
+  p.St(y + 2 * os, t78);
   const T t79 = t33 + t75;
+  p.St(y + 14 * os, -t79);
   const T t82 = t21 + t77;
+  p.St(y + 6 * os, t82);
   const T t83 = t33 - t76;
+  p.St(y + 10 * os, t83);
   const T t86 = 0.382683432365089771728 * t23 + 0.923879532511286756128 * t25;
   const T t87 = 0.382683432365089771728 * t25 - 0.923879532511286756128 * t23;
   const T t88 = t31 - t29;
@@ -586,24 +598,12 @@ inline void RealDft16(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
   const T t100 = t86 + t92;
   const T t101 = t87 - t93;
   const T t102 = t94 + t98;
-  const T t103 = t95 + t99;
-  const T t106 = t96 + t101;
-  const T t107 = t97 - t100;
-  p.St(y, t44);
-  p.St(y + os, t62);
-  p.St(y + 2 * os, t78);
   p.St(y + 3 * os, t102);
-  p.St(y + 4 * os, t41);
-  p.St(y + 5 * os, t66);
-  p.St(y + 6 * os, t82);
-  p.St(y + 7 * os, t106);
-  p.St(y + 8 * os, t45);
-  p.St(y + 15 * os, -t63);
-  p.St(y + 14 * os, -t79);
+  const T t103 = t95 + t99;
   p.St(y + 13 * os, t103);
-  p.St(y + 12 * os, -t43);
-  p.St(y + 11 * os, t67);
-  p.St(y + 10 * os, t83);
+  const T t106 = t96 + t101;
+  p.St(y + 7 * os, t106);
+  const T t107 = t97 - t100;
   p.St(y + 9 * os, t107);
 }
 
@@ -611,8 +611,6 @@ template <class P>
 inline void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
                     const double* ws) {
   using T = typename P::T;
-  const T t0 = p.Ld(a);
-  const T t1 = p.LdB(b);
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
@@ -703,7 +701,9 @@ inline void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t89 = p.LdW(ws + 14);
   const T t90 = t86 * t88 - t87 * t89;
   const T t91 = t87 * t88 + t86 * t89;
+  const T t0 = p.Ld(a);
   const T t92 = t0 + t48;
+  const T t1 = p.LdB(b);
   const T t93 = t1 + t49;
   const T t94 = t0 - t48;
   const T t95 = t1 - t49;
@@ -776,13 +776,21 @@ inline void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t162 = t116 - t148;
   const T t163 = t117 - t149;
   const T t164 = t156 + t160;
+  p.St(a, t164);
   const T t165 = t157 + t161;
+  p.StB(b + 15 * s, t165);
   const T t166 = t156 - t160;
+  p.StB(b + 7 * s, t166);
   const T t167 = t157 - t161;
+  p.St(a + 8 * s, -t167);
   const T t168 = t158 + t163;
+  p.St(a + 4 * s, t168);
   const T t169 = t159 - t162;
+  p.StB(b + 11 * s, t169);
   const T t170 = t158 - t163;
+  p.StB(b + 3 * s, t170);
   const T t171 = t159 + t162;
+  p.St(a + 12 * s, -t171);
   const T t172 = 0.923879532511286756128 * t120 + 0.382683432365089771728 * t121;
   const T t173 = 0.923879532511286756128 * t121 - 0.382683432365089771728 * t120;
   const T t174 = t136 + t137;
@@ -800,13 +808,21 @@ inline void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t186 = t172 - t178;
   const T t187 = t173 - t179;
   const T t188 = t180 + t184;
+  p.St(a + s, t188);
   const T t189 = t181 + t185;
+  p.StB(b + 14 * s, t189);
   const T t190 = t180 - t184;
+  p.StB(b + 6 * s, t190);
   const T t191 = t181 - t185;
+  p.St(a + 9 * s, -t191);
   const T t192 = t182 + t187;
+  p.St(a + 5 * s, t192);
   const T t193 = t183 - t186;
+  p.StB(b + 10 * s, t193);
   const T t194 = t182 - t187;
+  p.StB(b + 2 * s, t194);
   const T t195 = t183 + t186;
+  p.St(a + 13 * s, -t195);
   const T t196 = t118 + t119;
   const T t197 = 0.707106781186547524401 * t196;
   const T t198 = t119 - t118;
@@ -824,13 +840,21 @@ inline void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t210 = t197 - t201;
   const T t211 = t199 + t203;
   const T t212 = t204 + t208;
+  p.St(a + 2 * s, t212);
   const T t213 = t205 + t209;
+  p.StB(b + 13 * s, t213);
   const T t214 = t204 - t208;
+  p.StB(b + 5 * s, t214);
   const T t215 = t205 - t209;
+  p.St(a + 10 * s, -t215);
   const T t216 = t206 + t211;
+  p.St(a + 6 * s, t216);
   const T t217 = t207 - t210;
+  p.StB(b + 9 * s, t217);
   const T t218 = t206 - t211;
+  p.StB(b + s, t218);
   const T t219 = t207 + t210;
+  p.St(a + 14 * s, -t219);
   const T t220 = 0.382683432365089771728 * t122 + 0.923879532511286756128 * t123;
   const T t221 = 0.382683432365089771728 * t123 - 0.923879532511286756128 * t122;
   const T t222 = t139 - t138;
@@ -848,51 +872,26 @@ inline void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double
   const T t234 = t220 + t226;
   const T t235 = t221 - t227;
   const T t236 = t228 + t232;
-  const T t237 = t229 + t233;
-  const T t238 = t228 - t232;
-  const T t239 = t229 - t233;
-  const T t240 = t230 + t235;
-  const T t241 = t231 - t234;
-  const T t242 = t230 - t235;
-  const T t243 = t231 + t234;
-  p.St(a, t164);
-  p.StB(b + 15 * s, t165);
-  p.St(a + s, t188);
-  p.StB(b + 14 * s, t189);
-  p.St(a + 2 * s, t212);
-  p.StB(b + 13 * s, t213);
   p.St(a + 3 * s, t236);
+  const T t237 = t229 + t233;
   p.StB(b + 12 * s, t237);
-  p.St(a + 4 * s, t168);
-  p.StB(b + 11 * s, t169);
-  p.St(a + 5 * s, t192);
-  p.StB(b + 10 * s, t193);
-  p.St(a + 6 * s, t216);
-  p.StB(b + 9 * s, t217);
-  p.St(a + 7 * s, t240);
-  p.StB(b + 8 * s, t241);
-  p.StB(b + 7 * s, t166);
-  p.St(a + 8 * s, -t167);
-  p.StB(b + 6 * s, t190);
-  p.St(a + 9 * s, -t191);
-  p.StB(b + 5 * s, t214);
-  p.St(a + 10 * s, -t215);
+  const T t238 = t228 - t232;
   p.StB(b + 4 * s, t238);
+  const T t239 = t229 - t233;
   p.St(a + 11 * s, -t239);
-  p.StB(b + 3 * s, t170);
-  p.St(a + 12 * s, -t171);
-  p.StB(b + 2 * s, t194);
-  p.St(a + 13 * s, -t195);
-  p.StB(b + s, t218);
-  p.St(a + 14 * s, -t219);
+  const T t240 = t230 + t235;
+  p.St(a + 7 * s, t240);
+  const T t241 = t231 - t234;
+  p.StB(b + 8 * s, t241);
+  const T t242 = t230 - t235;
   p.StB(b, t242);
+  const T t243 = t231 + t234;
   p.St(a + 15 * s, -t243);
 }
 
 template <class P>
 inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
-  const T t0 = p.Ld(x);
   const T t1 = p.Ld(x + s);
   const T t2 = 0.980785280403230449126 * t1;
   const T t3 = 0.195090322016128267848 * t1;
@@ -914,7 +913,6 @@ inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
   const T t19 = p.Ld(x + 7 * s);
   const T t20 = 0.195090322016128267848 * t19;
   const T t21 = 0.980785280403230449126 * t19;
-  const T t22 = p.Ld(x + 8 * s);
   const T t23 = p.Ld(x + 9 * s);
   const T t24 = 0.195090322016128267848 * t23;
   const T t25 = 0.980785280403230449126 * t23;
@@ -940,7 +938,9 @@ inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
   const T t45 = t12 + t34;
   const T t46 = t11 + t33;
   const T t47 = t34 - t12;
+  const T t0 = p.Ld(x);
   const T t48 = t0 + t44;
+  const T t22 = p.Ld(x + 8 * s);
   const T t49 = t22 + t45;
   const T t50 = t0 - t44;
   const T t51 = t45 - t22;
@@ -1005,9 +1005,13 @@ inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
   const T t110 = t64 - t96;
   const T t111 = t97 - t65;
   const T t112 = t104 + t108;
+  p.St(x, t112);
   const T t113 = t105 + t109;
+  p.St(x + 15 * s, -t113);
   const T t116 = t106 + t111;
+  p.St(x + 4 * s, t116);
   const T t117 = t107 - t110;
+  p.St(x + 11 * s, t117);
   const T t120 = 0.923879532511286756128 * t68 + 0.382683432365089771728 * t69;
   const T t121 = 0.923879532511286756128 * t69 - 0.382683432365089771728 * t68;
   const T t122 = t84 + t85;
@@ -1025,9 +1029,13 @@ inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
   const T t134 = t120 - t126;
   const T t135 = t121 - t127;
   const T t136 = t128 + t132;
+  p.St(x + s, t136);
   const T t137 = t129 + t133;
+  p.St(x + 14 * s, t137);
   const T t140 = t130 + t135;
+  p.St(x + 5 * s, t140);
   const T t141 = t131 - t134;
+  p.St(x + 10 * s, t141);
   const T t144 = t66 + t67;
   const T t145 = 0.707106781186547524401 * t144;
   const T t146 = t67 - t66;
@@ -1045,9 +1053,13 @@ inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
   const T t158 = t145 - t149;
   const T t159 = t147 + t151;
   const T t160 = t152 + t156;
+  p.St(x + 2 * s, t160);
   const T t161 = t153 + t157;
+  p.St(x + 13 * s, t161);
   const T t164 = t154 + t159;
+  p.St(x + 6 * s, t164);
   const T t165 = t155 - t158;
+  p.St(x + 9 * s, t165);
   const T t168 = 0.382683432365089771728 * t70 + 0.923879532511286756128 * t71;
   const T t169 = 0.382683432365089771728 * t71 - 0.923879532511286756128 * t70;
   const T t170 = t87 - t86;
@@ -1065,29 +1077,18 @@ inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
   const T t182 = t168 + t174;
   const T t183 = t169 - t175;
   const T t184 = t176 + t180;
-  const T t185 = t177 + t181;
-  const T t188 = t178 + t183;
-  const T t189 = t179 - t182;
-  p.St(x, t112);
-  p.St(x + 15 * s, -t113);
-  p.St(x + s, t136);
-  p.St(x + 14 * s, t137);
-  p.St(x + 2 * s, t160);
-  p.St(x + 13 * s, t161);
   p.St(x + 3 * s, t184);
+  const T t185 = t177 + t181;
   p.St(x + 12 * s, t185);
-  p.St(x + 4 * s, t116);
-  p.St(x + 11 * s, t117);
-  p.St(x + 5 * s, t140);
-  p.St(x + 10 * s, t141);
-  p.St(x + 6 * s, t164);
-  p.St(x + 9 * s, t165);
+  const T t188 = t178 + t183;
   p.St(x + 7 * s, t188);
+  const T t189 = t179 - t182;
   p.St(x + 8 * s, t189);
 }
 
 }  // namespace
 
+FFTK_CLONES
 void FftComplexLeaf16(const double* inRe, const double* inIm, double* outRe, double* outIm,
                       ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
@@ -1109,6 +1110,7 @@ void FftComplexLeaf16(const double* inRe, const double* inIm, double* outRe, dou
   }
 }
 
+FFTK_CLONES
 void FftComplexTwiddle16(double* re, double* im, const double* twCos, const double* twSin,
                          ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
@@ -1131,6 +1133,7 @@ void FftComplexTwiddle16(double* re, double* im, const double* twCos, const doub
   }
 }
 
+FFTK_CLONES
 void FftRealLeaf16(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   const LaneAccess p{is, 16 * os, 0, 0};
@@ -1139,6 +1142,7 @@ void FftRealLeaf16(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   for (; t < c; ++t) RealDft16(ScalarAccess{}, in + t * is, ls, out + t * 16 * os, os);
 }
 
+FFTK_CLONES
 void FftRealTwiddle16(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
                       ptrdiff_t m) {
   const ptrdiff_t s = m * os;

@@ -8,6 +8,7 @@
 #if defined(_WIN32)
 #include <cstdio>
 #else
+#include <fcntl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -25,9 +26,10 @@ inline ChildResult RunChild(const std::vector<std::string>& argv) {
   ChildResult result;
 #if defined(_WIN32)
   // stdout is discarded; stderr comes through the pipe.
-  std::string command;
+  // cmd /c strips one outer pair of quotes, hence the extra pair around it all.
+  std::string command = "\"";
   for (const std::string& arg : argv) command += "\"" + arg + "\" ";
-  command += "2>&1 1>NUL";
+  command += "2>&1 1>NUL\"";
   FILE* pipe = _popen(command.c_str(), "r");
   if (pipe == nullptr) return result;
   char buffer[512];
@@ -41,6 +43,8 @@ inline ChildResult RunChild(const std::vector<std::string>& argv) {
   if (pid < 0) return result;
   if (pid == 0) {
     dup2(fds[1], STDERR_FILENO);
+    const int devnull = open("/dev/null", O_WRONLY);
+    if (devnull >= 0) dup2(devnull, STDOUT_FILENO);
     close(fds[0]);
     close(fds[1]);
     std::vector<char*> args;

@@ -118,7 +118,9 @@ TEST(MatrixPencil, OrderAboveSingularValueCountDropsToIt) {
     const Result r = RunComplex(x, L, M, kFs);
     EXPECT_EQ(r.status, 0) << M;
     EXPECT_EQ(r.count, 10) << M;
-    if (M > 10) EXPECT_EQ(r.amp[10], -7.0) << M;  // nothing written past r
+    if (M > 10) {
+      EXPECT_EQ(r.amp[10], -7.0) << M;  // nothing written past r
+    }
   }
   // The r x r pencil comes out with row stride r, as for M = r.
   std::vector<std::complex<double>> K12(144), K10(100);
@@ -218,7 +220,9 @@ TEST(MatrixPencil, EveryFailedAllocationIsReportedWithoutLeak) {
         }
         EXPECT_TRUE(r.status == status::kNoMemory || r.status == 0) << k << ": " << r.status;
         if (r.status == status::kNoMemory) ++failures;
-        if (k <= 14) EXPECT_EQ(r.status, status::kNoMemory) << "twin " << twin << " k " << k;
+        if (k <= 14) {
+          EXPECT_EQ(r.status, status::kNoMemory) << "twin " << twin << " k " << k;
+        }
       }
       EXPECT_GT(failures, 14);
     }

@@ -137,7 +137,9 @@ TEST(MdlOrder, RealArgumentCodes) {
     SCOPED_TRACE(testing::Message() << "n=" << c.n << " L=" << c.L << " min=" << c.minOrder);
     const Outcome o = Real(x, c.L, c.minOrder, c.n);
     EXPECT_EQ(o.status, c.expected);
-    if (c.expected != 0) EXPECT_EQ(o.order, kUntouched);
+    if (c.expected != 0) {
+      EXPECT_EQ(o.order, kUntouched);
+    }
   }
 }
 
@@ -153,7 +155,9 @@ TEST(MdlOrder, ComplexArgumentCodes) {
     SCOPED_TRACE(testing::Message() << "n=" << c.n << " L=" << c.L << " min=" << c.minOrder);
     const Outcome o = Cplx(xc, c.L, c.minOrder, c.n);
     EXPECT_EQ(o.status, c.expected);
-    if (c.expected != 0) EXPECT_EQ(o.order, kUntouched);
+    if (c.expected != 0) {
+      EXPECT_EQ(o.order, kUntouched);
+    }
   }
   // minOrder 0 is not rejected here: the first candidate is an empty eigenproblem.
   EXPECT_EQ(Cplx(xc, 10, 0).status, status::kBadSize);
@@ -179,7 +183,9 @@ TEST(MdlOrder, EveryFailedAllocationIsReportedWithoutLeak) {
       // The mode fit does not report its least-squares solve; everything else does.
       EXPECT_TRUE(o.status == status::kNoMemory || o.status == 0) << k << ": " << o.status;
       if (o.status == status::kNoMemory) ++failures;
-      if (k <= 15) EXPECT_EQ(o.status, status::kNoMemory) << "twin " << twin << " k " << k;
+      if (k <= 15) {
+        EXPECT_EQ(o.status, status::kNoMemory) << "twin " << twin << " k " << k;
+      }
     }
     EXPECT_GT(failures, 15);
   }

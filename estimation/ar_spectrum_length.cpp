@@ -15,5 +15,5 @@ int32_t IntLog2(int32_t x) {
 // none in 32 bits (m > 2^30) or m < 1.
 int32_t SpectrumLength(int32_t m) {
   if (m < 1 || m > (INT32_C(1) << 30)) return 0;
-  return INT32_C(1) << IntLog2(2 * m - 1);
+  return INT32_C(1) << IntLog2(static_cast<int32_t>(2 * static_cast<int64_t>(m) - 1));
 }

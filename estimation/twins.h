@@ -1,0 +1,123 @@
+// Real/complex dispatch for the estimator templates. Each estimator is written
+// once as a template over its element type T (double or Complex); the calls it
+// makes into numeric support and into the other estimators go through these
+// overloads, so a template body never names a ...Real or ...Complex routine.
+// Where the twins deliberately differ, the template says so itself with
+// `if constexpr (kIsComplex<T>)`.
+#pragma once
+
+#include <type_traits>
+
+#include "estimation/estimation.h"
+#include "numeric/numeric.h"
+
+namespace twin {
+
+template <typename T>
+inline constexpr bool kIsComplex = std::is_same_v<T, Complex>;
+
+// ---- numeric support ----------------------------------------------------------------
+inline StatusCode MatMul(const double* A, const double* B, int32_t m, int32_t k, int32_t n,
+                         double* C) {
+  return MatMulReal(A, B, m, k, n, C);
+}
+inline StatusCode MatMul(const Complex* A, const Complex* B, int32_t m, int32_t k, int32_t n,
+                         Complex* C) {
+  return MatMulComplex(A, B, m, k, n, C);
+}
+// Transpose for real data, conjugate transpose for complex data.
+inline StatusCode AdjointInto(double* A, int32_t m, int32_t n, double* out) {
+  return TransposeReal(A, m, n, out);
+}
+inline StatusCode AdjointInto(Complex* A, int32_t m, int32_t n, Complex* out) {
+  return ConjTransposeComplex(A, m, n, out);
+}
+// Economy SVD.
+inline StatusCode Svd(const double* A, int32_t m, int32_t n, double* U, double* S, double* V) {
+  return SvdReal(A, m, n, U, S, V, 0);
+}
+inline StatusCode Svd(const Complex* A, int32_t m, int32_t n, Complex* U, double* S,
+                      Complex* V) {
+  return SvdComplex(A, m, n, U, S, V, 0);
+}
+// Pseudo-inverse with tolerance tol, over A's own storage.
+inline StatusCode PseudoInverse(double* A, int32_t m, int32_t n, double tol) {
+  return PseudoInverseReal(A, m, n, tol, nullptr);
+}
+inline StatusCode PseudoInverse(Complex* A, int32_t m, int32_t n, double tol) {
+  return PseudoInverseComplex(A, m, n, tol, nullptr);
+}
+// Eigenvalues only of a general matrix; the matrix is left as it is.
+inline StatusCode EigenvaluesOf(double* A, int32_t n, Complex* eigenvalues) {
+  return EigGeneralReal(A, n, 0, eigenvalues, nullptr);
+}
+inline StatusCode EigenvaluesOf(Complex* A, int32_t n, Complex* eigenvalues) {
+  return EigGeneralComplex(A, n, 0, eigenvalues, nullptr);
+}
+
+// ---- estimation building blocks -------------------------------------------------------
+inline StatusCode BuildForward(const double* x, int32_t n, int32_t p, double* b, double* A) {
+  return BuildForwardMatrixReal(x, n, p, b, A);
+}
+inline StatusCode BuildForward(const Complex* x, int32_t n, int32_t p, Complex* b, Complex* A) {
+  return BuildForwardMatrixComplex(x, n, p, b, A);
+}
+inline StatusCode BuildBackward(const double* x, int32_t n, int32_t p, double* b, double* A) {
+  return BuildBackwardMatrixReal(x, n, p, b, A);
+}
+inline StatusCode BuildBackward(const Complex* x, int32_t n, int32_t p, Complex* b,
+                                Complex* A) {
+  return BuildBackwardMatrixComplex(x, n, p, b, A);
+}
+inline StatusCode Reverse(const double* src, double* dst, int32_t count) {
+  return ReverseReal(src, dst, count);
+}
+inline StatusCode Reverse(const Complex* src, Complex* dst, int32_t count) {
+  return ReverseComplex(src, dst, count);
+}
+inline StatusCode Difference(const double* u, const double* v, int32_t count, double* out) {
+  return VecSubReal(u, v, count, out);
+}
+inline StatusCode Difference(const Complex* u, const Complex* v, int32_t count, Complex* out) {
+  return VecSubComplex(u, v, count, out);
+}
+inline StatusCode ScaleRowsByInverse(double* A, int32_t rows, int32_t cols, const double* s) {
+  return ScaleRowsByInverseReal(A, rows, cols, s);
+}
+inline StatusCode ScaleRowsByInverse(Complex* A, int32_t rows, int32_t cols, const double* s) {
+  return ScaleRowsByInverseComplex(A, rows, cols, s);
+}
+
+// ---- estimators used by other estimators --------------------------------------------------
+inline StatusCode ModeAmplitudes(const double* x, int32_t n, const Complex* z, int32_t k,
+                                 Complex* A, double* E) {
+  return ModeAmplitudesReal(x, n, z, k, A, E);
+}
+inline StatusCode ModeAmplitudes(const Complex* x, int32_t n, const Complex* z, int32_t k,
+                                 Complex* A, double* E) {
+  return ModeAmplitudesComplex(x, n, z, k, A, E);
+}
+inline StatusCode CovarianceAr(const double* x, int32_t n, int32_t p, double* a, Complex* r,
+                               double* variance) {
+  return CovarianceArReal(x, n, p, a, r, variance);
+}
+inline StatusCode CovarianceAr(const Complex* x, int32_t n, int32_t p, Complex* a, Complex* r,
+                               double* variance) {
+  return CovarianceArComplex(x, n, p, a, r, variance);
+}
+inline StatusCode PcarEstimate(const double* x, int32_t n, int32_t p, int32_t k, double* a,
+                               Complex* roots) {
+  return PcarEstimateReal(x, n, p, k, a, roots);
+}
+inline StatusCode PcarEstimate(const Complex* x, int32_t n, int32_t p, int32_t k, Complex* a,
+                               Complex* roots) {
+  return PcarEstimateComplex(x, n, p, k, a, roots);
+}
+inline StatusCode PencilMatrix(const double* x, int32_t n, int32_t L, int32_t M, double* K) {
+  return PencilMatrixReal(x, n, L, M, K);
+}
+inline StatusCode PencilMatrix(const Complex* x, int32_t n, int32_t L, int32_t M, Complex* K) {
+  return PencilMatrixComplex(x, n, L, M, K);
+}
+
+}  // namespace twin
