@@ -547,23 +547,23 @@ Options ParseCommandLine(int argc, char** argv) {
       value = arg.substr(eq + 1);
       inlineValue = true;
     }
-    const OptionSpec* spec = nullptr;
+    const OptionSpec* def = nullptr;
     for (const OptionSpec& s : kOptions)
-      if (name == s.name) spec = &s;
-    if (spec == nullptr) Fail(kExitInput, "unknown option '" + name + "' (see --help)");
-    if (spec->opt == Opt::kHelp) {
+      if (name == s.name) def = &s;
+    if (def == nullptr) Fail(kExitInput, "unknown option '" + name + "' (see --help)");
+    if (def->opt == Opt::kHelp) {
       PrintUsage();
       std::exit(kExitOk);
     }
-    if (spec->takesValue && !inlineValue) {
+    if (def->takesValue && !inlineValue) {
       if (i + 1 >= argc) Fail(kExitInput, name + " needs a value");
       value = argv[++i];
-    } else if (!spec->takesValue && inlineValue) {
+    } else if (!def->takesValue && inlineValue) {
       Fail(kExitInput, name + " takes no value");
     }
-    given.push_back(spec);
-    o.have[static_cast<int>(spec->opt)] = true;
-    switch (spec->opt) {
+    given.push_back(def);
+    o.have[static_cast<int>(def->opt)] = true;
+    switch (def->opt) {
       case Opt::kOrder: o.order = ParseInt(name, value); break;
       case Opt::kComponents: o.components = ParseInt(name, value); break;
       case Opt::kPencil: o.pencil = ParseInt(name, value); break;
@@ -588,7 +588,7 @@ Options ParseCommandLine(int argc, char** argv) {
       case Opt::kNoPlot: o.noPlot = true; break;
       case Opt::kHelp: break;
     }
-    if ((spec->opt == Opt::kCsv || spec->opt == Opt::kPng || spec->opt == Opt::kLibrary) &&
+    if ((def->opt == Opt::kCsv || def->opt == Opt::kPng || def->opt == Opt::kLibrary) &&
         value.empty())
       Fail(kExitInput, name + " needs a non-empty value");
   }

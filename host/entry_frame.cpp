@@ -34,89 +34,89 @@ size_t ElementBytes(int32_t typeCode) { return DoublesPerElement(typeCode) * siz
 
 // Steps 4 and 5: aligned copies, the estimator, results into the host blocks.
 // `handles` are the output handles as the resizes left them.
-StatusCode EstimateAndCopyOut(const EntrySpec& spec, const QdmArrayHandle* handles,
+StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* handles,
                               EstimatorCall estimate) {
-  const size_t n = spec.n < 0 ? 0 : static_cast<size_t>(spec.n);
-  WorkArray<double> input = AllocWork<double>(n * DoublesPerElement(spec.inputType));
+  const size_t n = entry.n < 0 ? 0 : static_cast<size_t>(entry.n);
+  WorkArray<double> input = AllocWork<double>(n * DoublesPerElement(entry.inputType));
   WorkArray<double> outputs[kMaxOutputs];
   bool have_all = static_cast<bool>(input);
-  for (size_t i = 0; i < spec.outputs.size(); ++i) {
-    const OutputArray& out = spec.outputs[i];
+  for (size_t i = 0; i < entry.outputs.size(); ++i) {
+    const OutputArray& out = entry.outputs[i];
     outputs[i] = AllocWork<double>(static_cast<size_t>(out.length) *
                                    DoublesPerElement(out.typeCode));
     have_all = have_all && outputs[i];
   }
   if (!have_all) return status::kNoMemory;
 
-  std::memcpy(input.get(), BlockElements(spec.input), n * ElementBytes(spec.inputType));
+  std::memcpy(input.get(), BlockElements(entry.input), n * ElementBytes(entry.inputType));
   EntryCall call{};
   call.input = input.get();
-  for (size_t i = 0; i < spec.outputs.size(); ++i) call.outputs[i] = outputs[i].get();
-  for (size_t j = 0; j < spec.outDoubles.size(); ++j) {
-    if (spec.outDoubles[j].role == OutDoubleRole::kPassThrough) {
-      std::memcpy(&call.outDoubles[j], spec.outDoubles[j].host, sizeof(double));
+  for (size_t i = 0; i < entry.outputs.size(); ++i) call.outputs[i] = outputs[i].get();
+  for (size_t j = 0; j < entry.outDoubles.size(); ++j) {
+    if (entry.outDoubles[j].role == OutDoubleRole::kPassThrough) {
+      std::memcpy(&call.outDoubles[j], entry.outDoubles[j].host, sizeof(double));
     }
   }
 
   const StatusCode s = estimate.invoke(estimate.estimator, call);
 
-  for (size_t j = 0; j < spec.outDoubles.size(); ++j) {
-    if (spec.outDoubles[j].role == OutDoubleRole::kPassThrough) {
-      std::memcpy(spec.outDoubles[j].host, &call.outDoubles[j], sizeof(double));
+  for (size_t j = 0; j < entry.outDoubles.size(); ++j) {
+    if (entry.outDoubles[j].role == OutDoubleRole::kPassThrough) {
+      std::memcpy(entry.outDoubles[j].host, &call.outDoubles[j], sizeof(double));
     }
   }
   if (s != status::kOk) return s;
 
-  for (size_t i = 0; i < spec.outputs.size(); ++i) {
-    const OutputArray& out = spec.outputs[i];
+  for (size_t i = 0; i < entry.outputs.size(); ++i) {
+    const OutputArray& out = entry.outputs[i];
     std::memcpy(BlockElements(handles[i]), outputs[i].get(),
                 static_cast<size_t>(out.length) * ElementBytes(out.typeCode));
     if (out.count == CountSource::kModes) SetBlockCount(handles[i], call.modes);
   }
-  for (size_t j = 0; j < spec.outDoubles.size(); ++j) {
+  for (size_t j = 0; j < entry.outDoubles.size(); ++j) {
     double value = call.outDoubles[j];
-    switch (spec.outDoubles[j].role) {
+    switch (entry.outDoubles[j].role) {
       case OutDoubleRole::kEstimator: break;
       case OutDoubleRole::kSpectrumF0: value = call.spectrum.f0; break;
       case OutDoubleRole::kSpectrumDf: value = call.spectrum.df; break;
       case OutDoubleRole::kPassThrough: continue;
     }
-    std::memcpy(spec.outDoubles[j].host, &value, sizeof value);
+    std::memcpy(entry.outDoubles[j].host, &value, sizeof value);
   }
   return status::kOk;
 }
 
 }  // namespace
 
-int32_t RunEntry(const EntrySpec& spec, EstimatorCall estimate) {
+int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
   // A resize may replace a null handle, as the host function does with any
   // handle passed by address; later steps use what it left.
   QdmArrayHandle handles[kMaxOutputs] = {};
-  for (size_t i = 0; i < spec.outputs.size(); ++i) handles[i] = spec.outputs[i].handle;
+  for (size_t i = 0; i < entry.outputs.size(); ++i) handles[i] = entry.outputs[i].handle;
 
-  StatusCode s = FirstFailedCheck(spec.checks);
-  for (size_t i = 0; s == status::kOk && i < spec.outputs.size(); ++i) {
-    const OutputArray& out = spec.outputs[i];
+  StatusCode s = FirstFailedCheck(entry.checks);
+  for (size_t i = 0; s == status::kOk && i < entry.outputs.size(); ++i) {
+    const OutputArray& out = entry.outputs[i];
     s = NumericArrayResize(out.typeCode, 1, &handles[i], static_cast<size_t>(out.length));
-    if (s != status::kOk && spec.onResizeFailure == ResizeFailure::kReturnAtOnce) {
+    if (s != status::kOk && entry.onResizeFailure == ResizeFailure::kReturnAtOnce) {
       return MapStatus(s);
     }
   }
   if (s == status::kOk) {
-    for (size_t i = 0; i < spec.outputs.size(); ++i) {
-      if (spec.outputs[i].count == CountSource::kLength) {
-        SetBlockCount(handles[i], spec.outputs[i].length);
+    for (size_t i = 0; i < entry.outputs.size(); ++i) {
+      if (entry.outputs[i].count == CountSource::kLength) {
+        SetBlockCount(handles[i], entry.outputs[i].length);
       }
     }
-    s = EstimateAndCopyOut(spec, handles, estimate);
+    s = EstimateAndCopyOut(entry, handles, estimate);
     if (s == status::kOk) return 0;
   }
 
-  for (size_t i = 0; i < spec.outputs.size(); ++i) {
-    (void)NumericArrayResize(spec.outputs[i].typeCode, 1, &handles[i], 0);
+  for (size_t i = 0; i < entry.outputs.size(); ++i) {
+    (void)NumericArrayResize(entry.outputs[i].typeCode, 1, &handles[i], 0);
     SetBlockCount(handles[i], 0);
   }
-  for (const OutDouble& out : spec.outDoubles) {
+  for (const OutDouble& out : entry.outDoubles) {
     if (out.role == OutDoubleRole::kPassThrough) continue;
     const double zero = 0.0;
     std::memcpy(out.host, &zero, sizeof zero);

@@ -104,8 +104,8 @@ struct EntrySpec {
 // ---- what the estimator sees -------------------------------------------------------
 
 // Aligned stand-ins for the host memory of one call. outputs[i] belongs to
-// spec.outputs[i] (zero-filled, `length` elements); outDoubles[j] to
-// spec.outDoubles[j]; `modes` is the count for CountSource::kModes outputs;
+// entry.outputs[i] (zero-filled, `length` elements); outDoubles[j] to
+// entry.outDoubles[j]; `modes` is the count for CountSource::kModes outputs;
 // `spectrum` is the record handed to the spectrum estimators.
 struct EntryCall {
   const void* input;
@@ -126,15 +126,15 @@ struct EstimatorCall {
   const void* estimator;
 };
 
-int32_t RunEntry(const EntrySpec& spec, EstimatorCall estimate);
+int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate);
 
 template <typename Estimator>
-int32_t RunEntry(const EntrySpec& spec, const Estimator& estimator) {
+int32_t RunEntry(const EntrySpec& entry, const Estimator& estimator) {
   const EstimatorCall call{[](const void* e, EntryCall& c) -> StatusCode {
                              return (*static_cast<const Estimator*>(e))(c);
                            },
                            &estimator};
-  return RunEntry(spec, call);
+  return RunEntry(entry, call);
 }
 
 // ---- the MDL pair ------------------------------------------------------------------
