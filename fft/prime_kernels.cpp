@@ -123,6 +123,9 @@ StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const doubl
 // `Dft(zr, zi, yr, yi, scratch)` transforms r interleaved complex values.
 
 // Real leaf: c transforms of r reals each, written in packed half-complex order.
+// Two real sequences a, b run as one complex DFT Z of z = a + i b, split by
+// A[k] = (Z[k] + conj Z[r-k]) / 2 and B[k] = (Z[k] - conj Z[r-k]) / 2i; an
+// odd last one runs alone with a zero imaginary part.
 template <typename DftFn>
 StatusCode RealLeaf(int32_t r, const double* in, double* out, ptrdiff_t is, ptrdiff_t os,
                     ptrdiff_t c, size_t scratch_count, DftFn dft) {
@@ -133,9 +136,33 @@ StatusCode RealLeaf(int32_t r, const double* in, double* out, ptrdiff_t is, ptrd
   double* yr = zr + 2 * r;
   double* yi = yr + 1;
   double* scratch = zr + 4 * r;
-  for (ptrdiff_t t = 0; t < c; ++t) {
+  const ptrdiff_t xs = c * is;
+  ptrdiff_t t = 0;
+  for (; t + 1 < c; t += 2) {
+    const double* xa = in + t * is;
+    const double* xb = xa + is;
     for (int32_t q = 0; q < r; ++q) {
-      zr[2 * q] = in[t * is + q * c * is];
+      zr[2 * q] = xa[q * xs];
+      zi[2 * q] = xb[q * xs];
+    }
+    const StatusCode st = dft(zr, zi, yr, yi, scratch);
+    if (st < 0) return st;
+    double* ya = out + t * r * os;
+    double* yb = ya + r * os;
+    ya[0] = yr[0];
+    yb[0] = yi[0];
+    for (int32_t q = 1; 2 * q < r; ++q) {
+      const double ar = yr[2 * q], ai = yi[2 * q];
+      const double br = yr[2 * (r - q)], bi = yi[2 * (r - q)];
+      ya[q * os] = 0.5 * (ar + br);
+      ya[(r - q) * os] = 0.5 * (ai - bi);
+      yb[q * os] = 0.5 * (ai + bi);
+      yb[(r - q) * os] = 0.5 * (br - ar);
+    }
+  }
+  for (; t < c; ++t) {
+    for (int32_t q = 0; q < r; ++q) {
+      zr[2 * q] = in[t * is + q * xs];
       zi[2 * q] = 0.0;
     }
     const StatusCode st = dft(zr, zi, yr, yi, scratch);
