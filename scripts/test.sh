@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # Builds and runs every test suite: the plain -O3 build, then the
-# AddressSanitizer + UndefinedBehaviorSanitizer build, then the Windows build
-# under wine (scripts/windows.sh). Installs what is
-# missing on a fresh Debian 12 machine (run as root). The last lines printed
-# are ctest's own summary; the exit status is non-zero if any suite failed.
+# AddressSanitizer + UndefinedBehaviorSanitizer build, then the Windows DLL
+# under wine (scripts/windows.sh). Installs what is missing on a fresh Debian
+# 12 machine (run as root). The last lines printed are ctest's own summary; the
+# exit status is non-zero if any suite failed.
 set -uo pipefail
 cd "$(dirname "$0")/.."
 scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \

@@ -136,6 +136,6 @@ say "running the tests under wine"
 # with their output, and ctest's summary.
 ctest --test-dir "$build" -j"$jobs" --output-on-failure --timeout 600 >"$build/ctest.log" 2>&1
 rc=$?
+say "tests finished (full log: build/windows/ctest.log)"
 grep -v -E '^ *Start +[0-9]+:|Test +#[0-9]+: .* Passed' "$build/ctest.log"
-say "done"
 exit $rc
