@@ -39,8 +39,13 @@ lapack_version() {
 lapack_ver=$(lapack_version)
 if [ -z "$lapack_ver" ]; then
   say "adding a deb-src entry"
-  sed 's/^Types: deb$/Types: deb-src/' /etc/apt/sources.list.d/debian.sources \
-    >/etc/apt/sources.list.d/qdm-deb-src.sources || die "deb-src entry"
+  if [ -f /etc/apt/sources.list.d/debian.sources ]; then
+    sed 's/^Types: deb$/Types: deb-src/' /etc/apt/sources.list.d/debian.sources \
+      >/etc/apt/sources.list.d/qdm-deb-src.sources || die "deb-src entry"
+  else  # one-line style
+    sed -n 's/^deb /deb-src /p' /etc/apt/sources.list >/etc/apt/sources.list.d/qdm-deb-src.list ||
+      die "deb-src entry"
+  fi
   quiet apt-get update || die "apt-get update"
   lapack_ver=$(lapack_version)
   [ -n "$lapack_ver" ] || die "no lapack source package"

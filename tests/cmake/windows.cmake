@@ -76,5 +76,6 @@ if(WIN32)
                              ${CMAKE_SOURCE_DIR}/include ${CMAKE_SOURCE_DIR}/emuhost)
   target_compile_definitions(e2e_windows_threads PRIVATE QDM_LIBRARY_PATH="$<TARGET_FILE:qdm>")
   add_dependencies(e2e_windows_threads qdm)
-  gtest_discover_tests(e2e_windows_threads DISCOVERY_MODE PRE_TEST TEST_PREFIX "e2e.")
+  gtest_discover_tests(e2e_windows_threads DISCOVERY_MODE PRE_TEST TEST_PREFIX "e2e."
+                       DISCOVERY_TIMEOUT 120)
 endif()
