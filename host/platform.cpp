@@ -108,6 +108,17 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE, DWORD reason, LPVOID) {
   if (reason == DLL_PROCESS_ATTACH) Attach();
   return TRUE;
 }
+
+// Linked into a program rather than a DLL (the unit tests), the code gets no
+// DllMain call: there the program's start-up attaches it instead.
+__attribute__((constructor)) static void QdmAttachInProgram() {
+  HMODULE self = nullptr;
+  if (GetModuleHandleExA(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
+                             GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
+                         reinterpret_cast<LPCSTR>(&QdmAttachInProgram), &self) &&
+      self == GetModuleHandleA(nullptr))
+    Attach();
+}
 #else
 __attribute__((constructor)) static void QdmAttach() { Attach(); }
 #endif

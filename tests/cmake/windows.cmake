@@ -66,3 +66,15 @@ if(WIN32 AND TARGET qdm_example AND QDM_LINUX_EXAMPLE)
                      -P ${CMAKE_SOURCE_DIR}/tools/compare_example_runs.cmake)
   endforeach()
 endif()
+
+# Windows threads (CreateThread) calling the DLL at once, and the DLL unloaded
+# and reloaded between rounds of such calls.
+if(WIN32)
+  add_executable(e2e_windows_threads ${CMAKE_SOURCE_DIR}/tests/windows/threads.cpp)
+  target_link_libraries(e2e_windows_threads PRIVATE gfrtemu GTest::gtest_main)
+  target_include_directories(e2e_windows_threads PRIVATE ${CMAKE_SOURCE_DIR}/tests
+                             ${CMAKE_SOURCE_DIR}/include ${CMAKE_SOURCE_DIR}/emuhost)
+  target_compile_definitions(e2e_windows_threads PRIVATE QDM_LIBRARY_PATH="$<TARGET_FILE:qdm>")
+  add_dependencies(e2e_windows_threads qdm)
+  gtest_discover_tests(e2e_windows_threads DISCOVERY_MODE PRE_TEST TEST_PREFIX "e2e.")
+endif()

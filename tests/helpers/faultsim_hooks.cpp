@@ -5,7 +5,11 @@
 
 #include "numeric/work.h"
 
+#if defined(_WIN32)
+#define QDM_TEST_HOOK extern "C" __declspec(dllexport)
+#else
 #define QDM_TEST_HOOK extern "C" __attribute__((visibility("default")))
+#endif
 
 // Makes the k-th work allocation from now fail (k >= 1); with `persistent`
 // every allocation from the k-th on. k = 0 switches injection off.

@@ -36,6 +36,8 @@ inline ChildResult RunChild(const std::vector<std::string>& argv) {
   size_t got;
   while ((got = fread(buffer, 1, sizeof buffer, pipe)) > 0) result.stderrText.append(buffer, got);
   result.exitCode = _pclose(pipe);
+  // The child's stderr is in text mode: line ends arrive as CR LF.
+  std::erase(result.stderrText, '\r');
 #else
   int fds[2];
   if (pipe(fds) != 0) return result;
