@@ -28,7 +28,7 @@ MAX_RADIX = 43
 # Composite radices as (n1, n2): n2 inner DFTs of size n1 over inputs n2*j1 + j2,
 # twiddled by W_n^(j2*k1), then n1 DFTs of size n2 (decimation in time).
 SPLITS = {4: (2, 2), 8: (2, 4), 9: (3, 3), 10: (2, 5), 14: (2, 7), 16: (4, 4),
-          18: (2, 9), 32: (4, 8)}
+          18: (2, 9), 32: (8, 4)}
 
 # ---- high-precision constants ------------------------------------------------------
 D = decimal.Decimal
