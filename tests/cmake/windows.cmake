@@ -79,3 +79,12 @@ if(WIN32)
   gtest_discover_tests(e2e_windows_threads DISCOVERY_MODE PRE_TEST TEST_PREFIX "e2e."
                        DISCOVERY_TIMEOUT 120)
 endif()
+
+# The library's own LAPACK and CBLAS error handlers (Windows build only).
+if(WIN32)
+  add_executable(unit_windows_lapack_errors ${CMAKE_SOURCE_DIR}/tests/windows/lapack_errors.cpp)
+  target_link_libraries(unit_windows_lapack_errors PRIVATE qdm_core ${QDM_LINALG_LIBS}
+                        GTest::gtest_main Threads::Threads)
+  gtest_discover_tests(unit_windows_lapack_errors DISCOVERY_MODE PRE_TEST TEST_PREFIX "unit."
+                       DISCOVERY_TIMEOUT 120)
+endif()
