@@ -10,6 +10,7 @@
 #include <limits>
 #include <vector>
 
+#include "support/ar_oracles.h"
 #include "support/qdm_host.h"
 
 namespace {
@@ -18,44 +19,8 @@ using qdmtest::HostArray;
 using qdmtest::HostCode;
 using qdmtest::Qdm;
 using C = std::complex<double>;
-using CL = std::complex<long double>;
-constexpr long double kPiL = 3.141592653589793238462643383279502884L;
 constexpr double kPi = 3.141592653589793;
 constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
-
-// 10 log10((1/|A(f_j)|^2) / peak) at f_j = -fs/2 + j fs/L, term by term.
-std::vector<double> OracleDb(const std::vector<C>& a, int32_t L) {
-  std::vector<long double> P(L);
-  long double peak = 0;
-  for (int32_t j = 0; j < L; ++j) {
-    const long double f = -0.5L + static_cast<long double>(j) / L;
-    CL A(0);
-    for (size_t k = 0; k < a.size(); ++k) {
-      const long double w = -2 * kPiL * f * static_cast<long double>(k);
-      A += CL(a[k].real(), a[k].imag()) * CL(std::cos(w), std::sin(w));
-    }
-    P[j] = 1 / std::norm(A);
-    peak = std::max(peak, P[j]);
-  }
-  std::vector<double> db(L);
-  for (int32_t j = 0; j < L; ++j) db[j] = double(10 * std::log10(P[j] / peak));
-  return db;
-}
-
-std::vector<C> ArFromPoles(const std::vector<C>& poles) {
-  std::vector<CL> c{CL(1)};
-  for (const C& r : poles) {
-    std::vector<CL> next(c.size() + 1, CL(0));
-    for (size_t k = 0; k < c.size(); ++k) {
-      next[k] += c[k];
-      next[k + 1] -= c[k] * CL(r);
-    }
-    c = next;
-  }
-  std::vector<C> a;
-  for (const CL& v : c) a.emplace_back(double(v.real()), double(v.imag()));
-  return a;
-}
 
 // A record that follows the AR recursion exactly after its start values;
 // real when the coefficients are.
@@ -168,12 +133,12 @@ TEST(SpectrumExports, CovarianceSpectrumOfAnExactArRecordIsItsModelsShape) {
        false},
   };
   for (const auto& model : models) {
-    std::vector<C> a = ArFromPoles(model.poles);
+    std::vector<C> a = ar_oracle::MonicFromRoots(model.poles);
     if (model.real)
       for (C& v : a) v = C(v.real(), 0.0);
     const int32_t p = static_cast<int32_t>(model.poles.size());
     const std::vector<C> x = ArRecord(a, 60);
-    const std::vector<double> oracle = OracleDb(a, 256);
+    const std::vector<double> oracle = ar_oracle::SpectrumDb(a, 256);
     for (const bool real : {false, true}) {
       if (real && !model.real) continue;
       const SpectrumCall s = CovSpectrum(x, real, p, 200, 1000.0);

@@ -33,6 +33,28 @@ inline std::vector<C> MonicFromRoots(const std::vector<C>& roots) {
   return out;
 }
 
+// AR spectrum in dB on the two-sided grid f_j = -fs/2 + j fs/L:
+// 10 log10((1/|A(f_j)|^2) / peak), A(f) = sum a_k e^{-2 pi i f k / fs}, evaluated
+// term by term in long double (no FFT).
+inline std::vector<double> SpectrumDb(const std::vector<C>& a, int32_t L) {
+  constexpr long double kPiL = 3.141592653589793238462643383279502884L;
+  std::vector<long double> P(static_cast<size_t>(L));
+  long double peak = 0;
+  for (int32_t j = 0; j < L; ++j) {
+    const long double f = -0.5L + static_cast<long double>(j) / L;  // in units of fs
+    CL A(0);
+    for (size_t k = 0; k < a.size(); ++k) {
+      const long double w = -2 * kPiL * f * static_cast<long double>(k);
+      A += CL(a[k].real(), a[k].imag()) * CL(std::cos(w), std::sin(w));
+    }
+    P[j] = 1 / std::norm(A);
+    peak = std::max(peak, P[j]);
+  }
+  std::vector<double> db(static_cast<size_t>(L));
+  for (int32_t j = 0; j < L; ++j) db[j] = double(10 * std::log10(P[j] / peak));
+  return db;
+}
+
 // Record that follows x[t] = -(a[1] x[t-1] + ... + a[p] x[t-p]) exactly after
 // the p given start values.
 template <typename T>

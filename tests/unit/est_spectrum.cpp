@@ -11,52 +11,15 @@
 #include <vector>
 
 #include "estimation/estimation.h"
+#include "support/ar_oracles.h"
 #include "fft/fft.h"
 #include "numeric/work.h"
 
 namespace {
 
 using C = std::complex<double>;
-using CL = std::complex<long double>;
-constexpr long double kPiL = 3.141592653589793238462643383279502884L;
 constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
 constexpr double kInf = std::numeric_limits<double>::infinity();
-
-// Monic AR vector a[0..p] with the given poles: prod (1 - r z^-1).
-std::vector<C> ArFromPoles(const std::vector<C>& poles) {
-  std::vector<CL> c{CL(1)};
-  for (const C& r : poles) {
-    std::vector<CL> next(c.size() + 1, CL(0));
-    for (size_t k = 0; k < c.size(); ++k) {
-      next[k] += c[k];
-      next[k + 1] -= c[k] * CL(r);
-    }
-    c = next;
-  }
-  std::vector<C> a;
-  for (const CL& v : c) a.emplace_back(double(v.real()), double(v.imag()));
-  return a;
-}
-
-// 10 log10((1/|A(f_j)|^2) / peak) at f_j = -fs/2 + j fs/L, A(f) = sum a_k
-// e^{-2 pi i f k / fs}, evaluated term by term in long double.
-std::vector<double> OracleDb(const std::vector<C>& a, int32_t L) {
-  std::vector<long double> P(L);
-  long double peak = 0;
-  for (int32_t j = 0; j < L; ++j) {
-    const long double f = -0.5L + static_cast<long double>(j) / L;  // in units of fs
-    CL A(0);
-    for (size_t k = 0; k < a.size(); ++k) {
-      const long double w = -2 * kPiL * f * static_cast<long double>(k);
-      A += CL(a[k].real(), a[k].imag()) * CL(std::cos(w), std::sin(w));
-    }
-    P[j] = 1 / std::norm(A);
-    peak = std::max(peak, P[j]);
-  }
-  std::vector<double> db(L);
-  for (int32_t j = 0; j < L; ++j) db[j] = double(10 * std::log10(P[j] / peak));
-  return db;
-}
 
 struct Evaluated {
   StatusCode status;
@@ -131,10 +94,10 @@ std::vector<Model> Models() {
 
 TEST(ArSpectrum, MatchesDirectEvaluationOfTheArPolynomial) {
   for (const Model& m : Models()) {
-    const std::vector<C> a = ArFromPoles(m.poles);
+    const std::vector<C> a = ar_oracle::MonicFromRoots(m.poles);
     for (const double fs : {1.0, 1000.0, 44100.0}) {
       for (const int32_t L : {8, 64, 1024}) {
-        const std::vector<double> oracle = OracleDb(a, L);
+        const std::vector<double> oracle = ar_oracle::SpectrumDb(a, L);
         const std::string what = std::string(m.name) + " fs=" + std::to_string(fs) +
                                  " L=" + std::to_string(L);
         ExpectMatchesOracle(EvalComplex(a, fs, L, L), oracle, fs, what + " complex");
@@ -146,18 +109,18 @@ TEST(ArSpectrum, MatchesDirectEvaluationOfTheArPolynomial) {
 
 TEST(ArSpectrum, RoundsTheRequestedSizeUpToAPowerOfTwo) {
   // AR(1): m = 2 fits every grid, down to L = 2.
-  const std::vector<C> a = ArFromPoles(Models()[0].poles);
+  const std::vector<C> a = ar_oracle::MonicFromRoots(Models()[0].poles);
   const struct { int32_t N, L; } cases[] = {{2, 2}, {3, 4}, {5, 8}, {512, 512}, {513, 1024},
                                             {1000, 1024}, {1025, 2048}};
   for (const auto& c : cases) {
     const std::string what = "N=" + std::to_string(c.N);
-    ExpectMatchesOracle(EvalComplex(a, 10.0, c.N, c.L), OracleDb(a, c.L), 10.0, what);
-    ExpectMatchesOracle(EvalReal(RealParts(a), 10.0, c.N, c.L), OracleDb(a, c.L), 10.0, what);
+    ExpectMatchesOracle(EvalComplex(a, 10.0, c.N, c.L), ar_oracle::SpectrumDb(a, c.L), 10.0, what);
+    ExpectMatchesOracle(EvalReal(RealParts(a), 10.0, c.N, c.L), ar_oracle::SpectrumDb(a, c.L), 10.0, what);
   }
 }
 
 TEST(ArSpectrum, RealCoefficientsGiveASpectrumSymmetricAboutDc) {
-  const std::vector<C> a = ArFromPoles({std::polar(0.9, 1.0), std::polar(0.9, -1.0),
+  const std::vector<C> a = ar_oracle::MonicFromRoots({std::polar(0.9, 1.0), std::polar(0.9, -1.0),
                                         C(-0.5, 0), std::polar(0.7, 2.5), std::polar(0.7, -2.5)});
   const int32_t L = 256;
   const Evaluated real = EvalReal(RealParts(a), 2.0, L, L);
@@ -169,7 +132,7 @@ TEST(ArSpectrum, RealCoefficientsGiveASpectrumSymmetricAboutDc) {
     EXPECT_NEAR(cx.values[L / 2 - j], cx.values[L / 2 + j], 1e-9) << j;
   }
   // Index 0 is the Nyquist bin: the value at +fs/2 equals that at -fs/2.
-  const std::vector<double> oracle = OracleDb(a, L);
+  const std::vector<double> oracle = ar_oracle::SpectrumDb(a, L);
   EXPECT_NEAR(real.values[0], oracle[0], 1e-9);
   // Both evaluators agree on real coefficients.
   for (int32_t j = 0; j < L; ++j) EXPECT_NEAR(real.values[j], cx.values[j], 1e-9) << j;
@@ -179,14 +142,14 @@ TEST(ArSpectrum, RealCoefficientsLongerThanTheGridWrapByAssignment) {
   // m = 5 on L = 2: slot 0 ends holding a[4], slot 1 a[3].
   const std::vector<double> a = {1.0, 0.3, -0.2, 0.5, 2.0};
   const Evaluated e = EvalReal(a, 1.0, 2, 2);
-  ExpectMatchesOracle(e, OracleDb({C(2.0), C(0.5)}, 2), 1.0, "wrap");
+  ExpectMatchesOracle(e, ar_oracle::SpectrumDb({C(2.0), C(0.5)}, 2), 1.0, "wrap");
   // The complex evaluator needs m <= L and refuses the rest.
   std::vector<C> ac(a.begin(), a.end());
   EXPECT_EQ(EvalComplex(ac, 1.0, 2, 2).status, status::kBadSize);
 }
 
 TEST(ArSpectrum, NanSamplingRateGivesNanGridAndTheUsualValues) {
-  const std::vector<C> a = ArFromPoles(Models()[2].poles);
+  const std::vector<C> a = ar_oracle::MonicFromRoots(Models()[2].poles);
   const Evaluated withNan = EvalComplex(a, kNaN, 64, 64);
   const Evaluated withOne = EvalComplex(a, 1.0, 64, 64);
   const Evaluated realNan = EvalReal({1.0, -0.5}, kNaN, 64, 64);
@@ -217,7 +180,7 @@ TEST(ArSpectrum, ZeroOfTheArPolynomialOnTheGrid) {
 }
 
 TEST(ArSpectrum, WindowModes) {
-  const std::vector<C> a = ArFromPoles(Models()[2].poles);
+  const std::vector<C> a = ar_oracle::MonicFromRoots(Models()[2].poles);
   // Modes outside 0..3 are refused by both evaluators.
   for (const int32_t mode : {-1, 4, 10}) {
     EXPECT_EQ(EvalComplex(a, 1.0, 16, 16, mode).status, status::kBadOption) << mode;
@@ -250,9 +213,9 @@ TEST(ArSpectrum, WindowModes) {
       windowed.emplace_back(re[i], im[i]);
     }
     // The spectrum is that of the windowed coefficients.
-    ExpectMatchesOracle(EvalComplex(windowed, 1.0, 16, 16), OracleDb(windowed, 16), 1.0,
+    ExpectMatchesOracle(EvalComplex(windowed, 1.0, 16, 16), ar_oracle::SpectrumDb(windowed, 16), 1.0,
                         "windowed");
-    const std::vector<double> realOracle = OracleDb(std::vector<C>(re.begin(), re.end()), 16);
+    const std::vector<double> realOracle = ar_oracle::SpectrumDb(std::vector<C>(re.begin(), re.end()), 16);
     for (int j = 0; j < 16; ++j) EXPECT_NEAR(out[j], realOracle[j], 1e-9) << "mode " << w.mode;
   }
 }
@@ -417,7 +380,7 @@ void FaultSweep(const char* what, F call, bool strict = true) {
 }
 
 TEST(ArSpectrumMemory, AllocationFailuresAreReported) {
-  const std::vector<C> a = ArFromPoles(Models()[2].poles);
+  const std::vector<C> a = ar_oracle::MonicFromRoots(Models()[2].poles);
   std::vector<double> values(1024);
   FaultSweep("ArSpectrumComplex", [&] {
     std::vector<C> ac = a;
@@ -500,13 +463,13 @@ TEST(CovPowerSpectrum, IsTheSpectrumOfTheCovarianceModel) {
     SpectrumResult r{0, 0, values.data()};
     ASSERT_EQ(CovPowerSpectrumComplex(xc.data(), 48, p, 100, 8.0, &r, &vSpec), 0);
     EXPECT_EQ(vSpec, vModel);
-    ExpectMatchesOracle(Evaluated{0, r, values}, OracleDb(ac, 128), 8.0, "complex p=" + std::to_string(p));
+    ExpectMatchesOracle(Evaluated{0, r, values}, ar_oracle::SpectrumDb(ac, 128), 8.0, "complex p=" + std::to_string(p));
 
     ASSERT_EQ(CovarianceArReal(xr.data(), 48, p, ar.data(), poles.data(), &vModel), 0);
     std::fill(values.begin(), values.end(), kGuardValue);
     ASSERT_EQ(CovPowerSpectrumReal(xr.data(), 48, p, 100, 8.0, &r, &vSpec), 0);
     EXPECT_EQ(vSpec, vModel);
-    ExpectMatchesOracle(Evaluated{0, r, values}, OracleDb(std::vector<C>(ar.begin(), ar.end()), 128),
+    ExpectMatchesOracle(Evaluated{0, r, values}, ar_oracle::SpectrumDb(std::vector<C>(ar.begin(), ar.end()), 128),
                         8.0, "real p=" + std::to_string(p));
   }
 }
@@ -552,7 +515,7 @@ TEST(PcarPowerSpectrum, IsTheSpectrumOfThePcarModelWithItsModes) {
     EXPECT_NEAR(ph[i], std::arg(A[i]), 1e-12);
     EXPECT_NEAR(fr[i], std::arg(selected[i]) * 5.0 / (2 * 3.141592653589793), 1e-12);
   }
-  ExpectMatchesOracle(Evaluated{0, r, values}, OracleDb(a, 64), 5.0, "pcar");
+  ExpectMatchesOracle(Evaluated{0, r, values}, ar_oracle::SpectrumDb(a, 64), 5.0, "pcar");
 }
 
 }  // namespace
