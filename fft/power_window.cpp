@@ -41,13 +41,13 @@ StatusCode PowerSpectrumReal(double* x, int32_t n) {
     x[0] = x[0] * x[0];
     return status::kOk;
   }
-  WorkArray<double> spec = AllocWork<double>(static_cast<size_t>(n));
-  if (!spec) return status::kNoMemory;
+  WorkArray<double> transform = AllocWork<double>(static_cast<size_t>(n));
+  if (!transform) return status::kNoMemory;
   FftPlan* plan = FftPlanAcquire(n);
   if (plan == nullptr) return status::kNoMemory;
-  const StatusCode st = FftReal(plan, x, spec.get(), 1, 1, n);
+  const StatusCode st = FftReal(plan, x, transform.get(), 1, 1, n);
   if (st == status::kOk) {
-    const double* y = spec.get();
+    const double* y = transform.get();
     const double s = 1.0 / (static_cast<double>(n) * static_cast<double>(n));
     x[0] = y[0] * y[0] * s;
     for (int32_t k = 1; 2 * k < n; ++k) {
