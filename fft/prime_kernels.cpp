@@ -122,6 +122,23 @@ StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const doubl
 // ---- real-input passes on top of a complex DFT of size r ----------------------------
 // `Dft(zr, zi, yr, yi, scratch)` transforms r interleaved complex values.
 
+// Per-call work of the real prime passes: the complex input z and output y
+// of one r-point DFT, interleaved (element q at 2q), then the inner kernel's
+// own scratch.
+struct RealPassScratch {
+  WorkArray<double> work;
+  double *zr = nullptr, *zi = nullptr, *yr = nullptr, *yi = nullptr, *scratch = nullptr;
+  RealPassScratch(int32_t r, size_t scratch_count)
+      : work(AllocWork<double>(4 * static_cast<size_t>(r) + scratch_count)) {
+    if (!work) return;
+    zr = work.get();
+    zi = zr + 1;
+    yr = zr + 2 * r;
+    yi = yr + 1;
+    scratch = zr + 4 * r;
+  }
+};
+
 // Real leaf: c transforms of r reals each, written in packed half-complex order.
 // Two real sequences a, b run as one complex DFT Z of z = a + i b, split by
 // A[k] = (Z[k] + conj Z[r-k]) / 2 and B[k] = (Z[k] - conj Z[r-k]) / 2i; an
@@ -129,13 +146,13 @@ StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const doubl
 template <typename DftFn>
 StatusCode RealLeaf(int32_t r, const double* in, double* out, ptrdiff_t is, ptrdiff_t os,
                     ptrdiff_t c, size_t scratch_count, DftFn dft) {
-  WorkArray<double> work = AllocWork<double>(4 * static_cast<size_t>(r) + scratch_count);
-  if (!work) return status::kNoMemory;
-  double* zr = work.get();  // z and y interleaved: element q at 2q
-  double* zi = zr + 1;
-  double* yr = zr + 2 * r;
-  double* yi = yr + 1;
-  double* scratch = zr + 4 * r;
+  RealPassScratch ws(r, scratch_count);
+  if (!ws.work) return status::kNoMemory;
+  double* zr = ws.zr;
+  double* zi = ws.zi;
+  double* yr = ws.yr;
+  double* yi = ws.yi;
+  double* scratch = ws.scratch;
   const ptrdiff_t xs = c * is;
   ptrdiff_t t = 0;
   for (; t + 1 < c; t += 2) {
@@ -185,13 +202,13 @@ StatusCode RealLeaf(int32_t r, const double* in, double* out, ptrdiff_t is, ptrd
 template <typename DftFn>
 StatusCode RealTwiddle(int32_t r, double* data, const double* twCos, const double* twSin,
                        ptrdiff_t os, ptrdiff_t m, size_t scratch_count, DftFn dft) {
-  WorkArray<double> work = AllocWork<double>(4 * static_cast<size_t>(r) + scratch_count);
-  if (!work) return status::kNoMemory;
-  double* zr = work.get();  // z and y interleaved: element q at 2q
-  double* zi = zr + 1;
-  double* yr = zr + 2 * r;
-  double* yi = yr + 1;
-  double* scratch = zr + 4 * r;
+  RealPassScratch ws(r, scratch_count);
+  if (!ws.work) return status::kNoMemory;
+  double* zr = ws.zr;
+  double* zi = ws.zi;
+  double* yr = ws.yr;
+  double* yi = ws.yi;
+  double* scratch = ws.scratch;
   const ptrdiff_t s = m * os;
   // group 0
   for (int32_t j = 0; j < r; ++j) {

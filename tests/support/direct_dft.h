@@ -4,9 +4,19 @@
 
 #include <cmath>
 #include <cstdint>
+#include <random>
 #include <vector>
 
 namespace testing_dft {
+
+// Reproducible test input: count values uniform in [-1, 1).
+inline std::vector<double> RandomVector(size_t count, uint64_t seed) {
+  std::mt19937_64 rng(seed);
+  std::uniform_real_distribution<double> uni(-1.0, 1.0);
+  std::vector<double> v(count);
+  for (double& x : v) x = uni(rng);
+  return v;
+}
 
 // Forward DFT bins X[k], k in `bins`, of x = re + i im (n values each), in
 // long double. outRe/outIm get one entry per bin.

@@ -13,16 +13,11 @@
 #include "fft/fft.h"
 #include "fft/plan.h"
 #include "numeric/work.h"
+#include "support/direct_dft.h"
 
 namespace {
 
-std::vector<double> RandomVector(size_t count, uint64_t seed) {
-  std::mt19937_64 rng(seed);
-  std::uniform_real_distribution<double> uni(-1.0, 1.0);
-  std::vector<double> v(count);
-  for (double& x : v) x = uni(rng);
-  return v;
-}
+using testing_dft::RandomVector;
 
 // ---- factorisation -----------------------------------------------------------------
 struct FactorCase {

@@ -13,13 +13,7 @@
 
 namespace {
 
-std::vector<double> RandomVector(size_t count, uint64_t seed) {
-  std::mt19937_64 rng(seed);
-  std::uniform_real_distribution<double> uni(-1.0, 1.0);
-  std::vector<double> v(count);
-  for (double& x : v) x = uni(rng);
-  return v;
-}
+using testing_dft::RandomVector;
 
 struct Window {
   int32_t kind;
