@@ -2,7 +2,8 @@
 // (packed half-complex) transforms against FFTW's out-of-place dft/r2c plans
 // (FFTW_ESTIMATE, and FFTW_MEASURE as a further column), in one run.
 //
-//   fft_bench [--csv] [--quick] [--only n]
+//   fft_bench [--csv] [--quick] [--only n] [--narrow]
+// --narrow keeps the kernels on their SSE2 variant (for comparing the two).
 //
 // --csv prints rows kind,n,qdm_ns,fftw_ns,ratio,fftw_measure_ns (ratio =
 // ours / FFTW_ESTIMATE). Each time is the best of several batches of calls,
@@ -20,6 +21,7 @@
 #include <vector>
 
 #include "fft/fft.h"
+#include "fft/wide_lanes.h"
 
 namespace {
 
@@ -123,10 +125,12 @@ int main(int argc, char** argv) {
     } else if (std::strcmp(argv[i], "--quick") == 0) {
       g_batch_seconds = 0.005;
       g_batches = 3;
+    } else if (std::strcmp(argv[i], "--narrow") == 0) {
+      fftk::SetWideLanes(false);
     } else if (std::strcmp(argv[i], "--only") == 0 && i + 1 < argc) {
       only = std::atoi(argv[++i]);
     } else {
-      std::fprintf(stderr, "usage: %s [--csv] [--quick] [--only n]\n", argv[0]);
+      std::fprintf(stderr, "usage: %s [--csv] [--quick] [--only n] [--narrow]\n", argv[0]);
       return 2;
     }
   }

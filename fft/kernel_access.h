@@ -4,7 +4,8 @@
 //   LaneAccess:        two transforms at once in the two lanes of a 16-byte
 //                      vector, lane 1 a fixed number of doubles after lane 0;
 //   InterleavedAccess: as LaneAccess for interleaved complex data (im = re + 1),
-//                      loading each (re, im) pair with one 16-byte access.
+//                      loading each (re, im) pair with one 16-byte access;
+//   Lane4Access, Interleaved4Access: the same with four lanes (wide variant).
 // Lane offsets: li for loads, lo for stores, lb for the mirrored side of a
 // real combining group (loads and stores), lw for twiddle loads. The vector
 // type is GCC's generic one, so the code stays portable (SSE2 on x86-64).
@@ -13,27 +14,44 @@
 #include <cstddef>
 #include <cstring>
 
-// On x86-64 ELF targets the exported kernels are built twice, for the
-// baseline (SSE2) and for AVX, and the loader picks one per machine. The AVX
-// build runs the same operations (no fused multiply-adds, so the same results)
-// with three-operand instructions, which saves the register copies that the
-// two-operand SSE2 forms need.
+#include "fft/wide_lanes.h"
+
+// On x86-64 ELF targets every kernel but radix 2 also has a wide variant:
+// the same DFT bodies compiled for AVX (a pragma region in each kernel file)
+// that run four transforms (or butterflies) at once in 32-byte vectors,
+// leaving the rest to the narrow forms. A kernel takes it at run time when the
+// processor has AVX (fftk::WideLanes). The narrow forms' loops are themselves
+// built for SSE2 and AVX and picked by the loader (target_clones), which saves
+// the register copies of the two-operand SSE2 instructions. No fused
+// multiply-adds anywhere, so every variant gives bit-identical results. Not
+// on Windows: GCC there does not align the stack for 32-byte spills.
 #if defined(__GNUC__) && defined(__x86_64__) && defined(__ELF__)
+#define FFTK_WIDE 1
 #define FFTK_CLONES __attribute__((target_clones("avx", "default")))
 #else
+#define FFTK_WIDE 0
 #define FFTK_CLONES
 #endif
+
+// The DFT bodies of radix 8 and up stay out of line: inlined into a kernel's
+// loops (GCC does so for a body called once), their loop-invariant leg
+// offsets are hoisted and spilled, which costs more than the call, and most
+// at small repeat counts.
+#define FFTK_BODY __attribute__((noinline))
 
 namespace fftk {
 
 typedef double V2 __attribute__((vector_size(16)));
 typedef long long V2i __attribute__((vector_size(16)));
+typedef double V4 __attribute__((vector_size(32)));
+typedef long long V4i __attribute__((vector_size(32)));
 
 struct ScalarAccess {
   using T = double;
   static T Ld(const double* p) { return *p; }
   static T LdB(const double* p) { return *p; }
   static T LdW(const double* p) { return *p; }
+  static T Tw0(T, T v) { return v; }
   static void St(double* p, T v) { *p = v; }
   static void StB(double* p, T v) { *p = v; }
   static void LdC(const double* re, const double* im, T& r, T& i) {
@@ -52,6 +70,7 @@ struct LaneAccess {
   T Ld(const double* p) const { return T{p[0], p[li]}; }
   T LdB(const double* p) const { return T{p[0], p[lb]}; }
   T LdW(const double* p) const { return T{p[0], p[lw]}; }
+  static T Tw0(T, T v) { return v; }
   void St(double* p, T v) const {
     p[0] = v[0];
     p[lo] = v[1];
@@ -76,6 +95,7 @@ struct InterleavedAccess {
   using T = V2;
   ptrdiff_t li, lo, lb, lw;
   T LdW(const double* p) const { return T{p[0], p[lw]}; }
+  static T Tw0(T, T v) { return v; }
   void LdC(const double* re, const double*, T& r, T& i) const {
     V2 a, b;
     std::memcpy(&a, re, sizeof a);
@@ -89,6 +109,80 @@ struct InterleavedAccess {
     std::memcpy(re, &a, sizeof a);
     std::memcpy(re + lo, &b, sizeof b);
   }
+};
+
+// Four-lane forms for the wide variant; lane q is q offsets after lane 0.
+struct Lane4Access {
+  using T = V4;
+  ptrdiff_t li, lo, lb, lw;
+  static T Gather(const double* p, ptrdiff_t d) { return T{p[0], p[d], p[2 * d], p[3 * d]}; }
+  static void Scatter(double* p, ptrdiff_t d, T v) {
+    p[0] = v[0];
+    p[d] = v[1];
+    p[2 * d] = v[2];
+    p[3 * d] = v[3];
+  }
+  T Ld(const double* p) const { return Gather(p, li); }
+  T LdB(const double* p) const { return Gather(p, lb); }
+  T LdW(const double* p) const { return Gather(p, lw); }
+  static T Tw0(T, T v) { return v; }
+  void St(double* p, T v) const { Scatter(p, lo, v); }
+  void StB(double* p, T v) const { Scatter(p, lb, v); }
+  void LdC(const double* re, const double* im, T& r, T& i) const {
+    r = Gather(re, li);
+    i = Gather(im, li);
+  }
+  void StC(double* re, double* im, T r, T i) const {
+    Scatter(re, lo, r);
+    Scatter(im, lo, i);
+  }
+};
+
+// Interleaved complex data, four (re, im) pairs per pair of vectors. The
+// in-lane unpacks leave the lanes in the order 0, 2, 1, 3, so the twiddles
+// are gathered in that order and the stores undo it with the same unpacks.
+struct Interleaved4Access {
+  using T = V4;
+  ptrdiff_t li, lo, lb, lw;
+  static V4 Join(const double* a, const double* b) {
+    V2 x, y;
+    std::memcpy(&x, a, sizeof x);
+    std::memcpy(&y, b, sizeof y);
+    return __builtin_shufflevector(x, y, 0, 1, 2, 3);
+  }
+  static void Split(double* a, double* b, V4 v) {
+    const V2 x = __builtin_shufflevector(v, v, 0, 1);
+    const V2 y = __builtin_shufflevector(v, v, 2, 3);
+    std::memcpy(a, &x, sizeof x);
+    std::memcpy(b, &y, sizeof y);
+  }
+  T LdW(const double* p) const { return T{p[0], p[2 * lw], p[lw], p[3 * lw]}; }
+  static T Tw0(T, T v) { return v; }
+  void LdC(const double* re, const double*, T& r, T& i) const {
+    const V4 a = Join(re, re + li);
+    const V4 b = Join(re + 2 * li, re + 3 * li);
+    r = __builtin_shuffle(a, b, V4i{0, 4, 2, 6});
+    i = __builtin_shuffle(a, b, V4i{1, 5, 3, 7});
+  }
+  void StC(double* re, double*, T r, T i) const {
+    Split(re, re + lo, __builtin_shuffle(r, i, V4i{0, 4, 2, 6}));
+    Split(re + 2 * lo, re + 3 * lo, __builtin_shuffle(r, i, V4i{1, 5, 3, 7}));
+  }
+};
+
+// The first group of a combining pass: butterflies 0..3, where butterfly 0
+// takes no twiddle. Its lane keeps the untwiddled value (so the result is
+// exactly that of the plain DFT), and the twiddle pointer is that of
+// butterfly 1, whose entry also fills lane 0 (never used).
+struct Lane4FirstAccess : Lane4Access {
+  T LdW(const double* p) const { return T{p[0], p[0], p[lw], p[2 * lw]}; }
+  static T Tw0(T x, T v) { return __builtin_shuffle(x, v, V4i{0, 5, 6, 7}); }
+};
+
+// As Lane4FirstAccess, lanes in the order 0, 2, 1, 3.
+struct Interleaved4FirstAccess : Interleaved4Access {
+  T LdW(const double* p) const { return T{p[0], p[lw], p[0], p[2 * lw]}; }
+  static T Tw0(T x, T v) { return __builtin_shuffle(x, v, V4i{0, 5, 6, 7}); }
 };
 
 }  // namespace fftk

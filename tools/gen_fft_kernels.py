@@ -24,6 +24,8 @@ import sys
 # from this list.
 RADICES = [2, 3, 4, 5, 7, 8, 9, 10, 11, 13, 14, 16, 17, 18, 19, 29, 31, 32, 37, 41, 43]
 MAX_RADIX = 43
+# The radices with a wide (four-lane AVX) variant.
+WIDE_RADICES = [r for r in RADICES if r != 2]
 
 # Composite radices as (n1, n2): n2 inner DFTs of size n1 over inputs n2*j1 + j2,
 # twiddled by W_n^(j2*k1), then n1 DFTs of size n2 (decimation in time).
@@ -195,7 +197,7 @@ class Block:
     def _stmt(name, expr, indent, ops):
         if isinstance(name, tuple):  # a pair load
             return ["%sT %s, %s;" % (indent, name[0], name[1]), "%s%s" % (indent, expr)]
-        if not expr.startswith("p."):  # not a load
+        if not expr.startswith("p.Ld"):  # not a load
             ops[0] += expr.count(" + ") + expr.count(" - ")
             ops[1] += expr.count(" * ")
         return ["%sconst T %s = %s;" % (indent, name, expr)]
@@ -318,8 +320,9 @@ def twiddle_loads(b, r, pair):
         if j > 0:
             c, s = b.load("p.LdW(wc + %d)" % (j - 1)), b.load("p.LdW(ws + %d)" % (j - 1))
             deps = [xr[0], xi[0], c[0], s[0]]
-            xr, xi = (b.raw("%s * %s - %s * %s" % (xr[0], c[0], xi[0], s[0]), deps),
-                      b.raw("%s * %s + %s * %s" % (xi[0], c[0], xr[0], s[0]), deps))
+            # p.Tw0 keeps butterfly 0 untwiddled where a policy runs it in a lane.
+            xr, xi = (b.raw("p.Tw0(%s, %s * %s - %s * %s)" % (xr[0], xr[0], c[0], xi[0], s[0]), deps),
+                      b.raw("p.Tw0(%s, %s * %s + %s * %s)" % (xi[0], xi[0], c[0], xr[0], s[0]), deps))
         xs.append((xr, xi))
     return xs
 
@@ -382,6 +385,42 @@ def banner(what):
             "//   python3 tools/gen_fft_kernels.py --out fft/kernels"]
 
 
+def core_templates(rr, cores):
+    """The five per-radix DFT bodies as templates over the access policy;
+    out of line from radix 8 up (see FFTK_BODY), left to the compiler below."""
+    c_lines, t_lines, r_lines, g_lines, h_lines = cores
+    attr = "FFTK_BODY" if int(rr) >= 8 else "inline"
+    out = ["template <class P>",
+           "%s void Dft%s(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr," % (attr, rr),
+           "         double* yi, ptrdiff_t os) {",
+           "  using T = typename P::T;"]
+    out += c_lines
+    out += ["}", "",
+            "template <class P>",
+            "%s void DftTw%s(const P& p, double* re, double* im, ptrdiff_t s, const double* wc," % (attr, rr),
+            "           const double* ws) {",
+            "  using T = typename P::T;"]
+    out += t_lines
+    out += ["}", "",
+            "template <class P>",
+            "%s void RealDft%s(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {" % (attr, rr),
+            "  using T = typename P::T;"]
+    out += r_lines
+    out += ["}", "",
+            "template <class P>",
+            "%s void RealTw%s(const P& p, double* a, double* b, ptrdiff_t s, const double* wc," % (attr, rr),
+            "            const double* ws) {",
+            "  using T = typename P::T;"]
+    out += g_lines
+    out += ["}", "",
+            "template <class P>",
+            "%s void RealHalf%s(const P& p, double* x, ptrdiff_t s) {" % (attr, rr),
+            "  using T = typename P::T;"]
+    out += h_lines
+    out += ["}", ""]
+    return out
+
+
 def radix_file(r):
     rr = "%02d" % r
     c_lines, c_ops = complex_core(r)
@@ -389,7 +428,19 @@ def radix_file(r):
     r_lines, r_ops = real_core(r)
     g_lines, g_ops = real_twiddle_core(r)
     h_lines, h_ops = real_half_core(r)
+    cores = (c_lines, t_lines, r_lines, g_lines, h_lines)
     tw = r - 1
+    leaf_args = ("const double* inRe, const double* inIm, double* outRe, double* outIm, "
+                 "ptrdiff_t is, ptrdiff_t os, ptrdiff_t c")
+    tw_args = ("double* re, double* im, const double* twCos, const double* twSin, "
+               "ptrdiff_t os, ptrdiff_t m")
+    rleaf_args = "const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c"
+    rtw_args = "double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m"
+    leaf_call = "Dft%s(%%s, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r)
+    tw_call = "DftTw%s(%%s, re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, tw, tw)
+    rleaf_call = "RealDft%s(%%s, in + t * is, ls, out + t * %d * os, os);" % (rr, r)
+    rtw_call = ("RealTw%s(%%s, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d, "
+                "twSin + (k - 1) * %d);" % (rr, tw, tw))
     out = banner(" --radix %d" % r)
     out += [
         "// Radix-%d DFT kernels. Operation counts (adds, muls): complex DFT %d, %d;" % (r, c_ops[0], c_ops[1]),
@@ -397,8 +448,9 @@ def radix_file(r):
             t_ops[0], t_ops[1], r_ops[0], r_ops[1], g_ops[0], g_ops[1]),
         "// Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides",
         "// in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;",
-        "// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms",
-        "// or butterflies run in the two lanes of a vector, a last odd one alone.",
+        "// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or",
+        "// butterflies run four at once in the wide variant (the same bodies compiled for",
+        "// AVX in namespace wide), then in pairs, a last odd one alone.",
         "// clang-format off",
         '#include "fft/kernel_access.h"',
         '#include "fft/kernels/kernels.h"',
@@ -409,105 +461,156 @@ def radix_file(r):
         "using fftk::LaneAccess;",
         "using fftk::ScalarAccess;",
         "",
-        "template <class P>",
-        "inline void Dft%s(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr," % rr,
-        "                 double* yi, ptrdiff_t os) {",
-        "  using T = typename P::T;",
     ]
-    out += c_lines
-    out += ["}", "",
-            "template <class P>",
-            "inline void DftTw%s(const P& p, double* re, double* im, ptrdiff_t s, const double* wc," % rr,
-            "                   const double* ws) {",
-            "  using T = typename P::T;"]
-    out += t_lines
-    out += ["}", "",
-            "template <class P>",
-            "inline void RealDft%s(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {" % rr,
-            "  using T = typename P::T;"]
-    out += r_lines
-    out += ["}", "",
-            "template <class P>",
-            "inline void RealTw%s(const P& p, double* a, double* b, ptrdiff_t s, const double* wc," % rr,
-            "                    const double* ws) {",
-            "  using T = typename P::T;"]
-    out += g_lines
-    out += ["}", "",
-            "template <class P>",
-            "inline void RealHalf%s(const P& p, double* x, ptrdiff_t s) {" % rr,
-            "  using T = typename P::T;"]
-    out += h_lines
-    out += ["}", "", "}  // namespace", ""]
-    out += [
-        "FFTK_CLONES",
-        "void FftComplexLeaf%s(const double* inRe, const double* inIm, double* outRe, double* outIm," % rr,
-        "                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {",
+    out += core_templates(rr, cores)
+    out += ["}  // namespace", ""]
+    wide = []
+    wide += [
+        "#if FFTK_WIDE",
+        "#pragma GCC push_options",
+        '#pragma GCC target("avx")',
+        "namespace {",
+        "namespace wide {",
+        "",
+        "using fftk::Interleaved4Access;",
+        "using fftk::Interleaved4FirstAccess;",
+        "using fftk::Lane4Access;",
+        "using fftk::Lane4FirstAccess;",
+        "",
+    ]
+    wide += core_templates(rr, cores)
+    wide += [
+        "// Transforms 0, 1, ... four at a time while four remain; returns how many ran.",
+        "ptrdiff_t ComplexLeafGroups(%s) {" % leaf_args,
         "  const ptrdiff_t ls = c * is;",
         "  ptrdiff_t t = 0;",
         "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
+        "    const Interleaved4Access p{is, %d * os, 0, 0};" % r,
+        "    for (; t + 3 < c; t += 4) " + leaf_call % "p",
+        "  } else {",
+        "    const Lane4Access p{is, %d * os, 0, 0};" % r,
+        "    for (; t + 3 < c; t += 4) " + leaf_call % "p",
+        "  }",
+        "  return t;",
+        "}",
+        "",
+        "// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.",
+        "ptrdiff_t ComplexTwiddleGroups(%s) {" % tw_args,
+        "  const ptrdiff_t s = m * os;",
+        "  ptrdiff_t k = 4;",
+        "  if (im == re + 1) {",
+        "    DftTw%s(Interleaved4FirstAccess{os, os, 0, %d}, re, im, s, twCos, twSin);" % (rr, tw),
+        "    const Interleaved4Access p{os, os, 0, %d};" % tw,
+        "    for (; k + 3 < m; k += 4) " + tw_call % "p",
+        "  } else {",
+        "    DftTw%s(Lane4FirstAccess{os, os, 0, %d}, re, im, s, twCos, twSin);" % (rr, tw),
+        "    const Lane4Access p{os, os, 0, %d};" % tw,
+        "    for (; k + 3 < m; k += 4) " + tw_call % "p",
+        "  }",
+        "  return k;",
+        "}",
+        "",
+        "ptrdiff_t RealLeafGroups(%s) {" % rleaf_args,
+        "  const ptrdiff_t ls = c * is;",
+        "  const Lane4Access p{is, %d * os, 0, 0};" % r,
+        "  ptrdiff_t t = 0;",
+        "  for (; t + 3 < c; t += 4) " + rleaf_call % "p",
+        "  return t;",
+        "}",
+        "",
+        "// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.",
+        "ptrdiff_t RealTwiddleGroups(%s) {" % rtw_args,
+        "  const ptrdiff_t s = m * os;",
+        "  const Lane4Access p{os, os, -os, %d};" % tw,
+        "  ptrdiff_t k = 1;",
+        "  for (; 2 * (k + 3) < m; k += 4) " + rtw_call % "p",
+        "  return k;",
+        "}",
+        "",
+        "}  // namespace wide",
+        "}  // namespace",
+        "#pragma GCC pop_options",
+        "#endif",
+        "",
+    ]
+    dispatch_complexleaf = [
+        "#if FFTK_WIDE",
+        "  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);",
+        "#endif",
+    ]
+    dispatch_complextwiddle = [
+        "#if FFTK_WIDE",
+        "  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);",
+        "#endif",
+    ]
+    dispatch_realleaf = [
+        "#if FFTK_WIDE",
+        "  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);",
+        "#endif",
+    ]
+    dispatch_realtwiddle = [
+        "#if FFTK_WIDE",
+        "  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);",
+        "#endif",
+    ]
+    # Radix 2 has too little arithmetic per butterfly to pay for the lane
+    # shuffles of the four-lane form (measured slower), so it has none.
+    if r in WIDE_RADICES:
+        out += wide
+    out += [
+        "FFTK_CLONES",
+        "void FftComplexLeaf%s(%s) {" % (rr, leaf_args),
+        "  const ptrdiff_t ls = c * is;",
+        "  ptrdiff_t t = 0;",
+    ] + (dispatch_complexleaf if r in WIDE_RADICES else []) + [
+        "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
         "    const InterleavedAccess p{is, %d * os, 0, 0};" % r,
-        "    for (; t + 1 < c; t += 2) {",
-        "      Dft%s(p, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r),
-        "    }",
+        "    for (; t + 1 < c; t += 2) " + leaf_call % "p",
         "  } else {",
         "    const LaneAccess p{is, %d * os, 0, 0};" % r,
-        "    for (; t + 1 < c; t += 2) {",
-        "      Dft%s(p, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r),
-        "    }",
+        "    for (; t + 1 < c; t += 2) " + leaf_call % "p",
         "  }",
-        "  for (; t < c; ++t) {",
-        "    Dft%s(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os," % (rr, r),
-        "          outIm + t * %d * os, os);" % r,
-        "  }",
+        "  for (; t < c; ++t) " + leaf_call % "ScalarAccess{}",
         "}",
         "",
         "FFTK_CLONES",
-        "void FftComplexTwiddle%s(double* re, double* im, const double* twCos, const double* twSin," % rr,
-        "                         ptrdiff_t os, ptrdiff_t m) {",
+        "void FftComplexTwiddle%s(%s) {" % (rr, tw_args),
         "  const ptrdiff_t s = m * os;",
-        "  Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
-        "  ptrdiff_t k = 1;",
+        "  ptrdiff_t k = 0;",
+    ] + (dispatch_complextwiddle if r in WIDE_RADICES else []) + [
+        "  if (k == 0) {",
+        "    Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
+        "    k = 1;",
+        "  }",
         "  if (im == re + 1) {",
         "    const InterleavedAccess p{os, os, 0, %d};" % tw,
-        "    for (; k + 1 < m; k += 2) {",
-        "      DftTw%s(p, re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, tw, tw),
-        "    }",
+        "    for (; k + 1 < m; k += 2) " + tw_call % "p",
         "  } else {",
         "    const LaneAccess p{os, os, 0, %d};" % tw,
-        "    for (; k + 1 < m; k += 2) {",
-        "      DftTw%s(p, re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, tw, tw),
-        "    }",
+        "    for (; k + 1 < m; k += 2) " + tw_call % "p",
         "  }",
-        "  for (; k < m; ++k) {",
-        "    DftTw%s(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * %d," % (rr, tw),
-        "           twSin + (k - 1) * %d);" % tw,
-        "  }",
+        "  for (; k < m; ++k) " + tw_call % "ScalarAccess{}",
         "}",
         "",
         "FFTK_CLONES",
-        "void FftRealLeaf%s(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {" % rr,
+        "void FftRealLeaf%s(%s) {" % (rr, rleaf_args),
         "  const ptrdiff_t ls = c * is;",
-        "  const LaneAccess p{is, %d * os, 0, 0};" % r,
         "  ptrdiff_t t = 0;",
-        "  for (; t + 1 < c; t += 2) RealDft%s(p, in + t * is, ls, out + t * %d * os, os);" % (rr, r),
-        "  for (; t < c; ++t) RealDft%s(ScalarAccess{}, in + t * is, ls, out + t * %d * os, os);" % (rr, r),
+    ] + (dispatch_realleaf if r in WIDE_RADICES else []) + [
+        "  const LaneAccess p{is, %d * os, 0, 0};" % r,
+        "  for (; t + 1 < c; t += 2) " + rleaf_call % "p",
+        "  for (; t < c; ++t) " + rleaf_call % "ScalarAccess{}",
         "}",
         "",
         "FFTK_CLONES",
-        "void FftRealTwiddle%s(double* data, const double* twCos, const double* twSin, ptrdiff_t os," % rr,
-        "                      ptrdiff_t m) {",
+        "void FftRealTwiddle%s(%s) {" % (rr, rtw_args),
         "  const ptrdiff_t s = m * os;",
         "  RealDft%s(ScalarAccess{}, data, s, data, s);" % rr,
-        "  const LaneAccess p{os, os, -os, %d};" % tw,
         "  ptrdiff_t k = 1;",
-        "  for (; 2 * (k + 1) < m; k += 2) {",
-        "    RealTw%s(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d," % (rr, tw),
-        "            twSin + (k - 1) * %d);" % tw,
-        "  }",
-        "  for (; 2 * k < m; ++k) {",
-        "    RealTw%s(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d," % (rr, tw),
-        "            twSin + (k - 1) * %d);" % tw,
-        "  }",
+    ] + (dispatch_realtwiddle if r in WIDE_RADICES else []) + [
+        "  const LaneAccess p{os, os, -os, %d};" % tw,
+        "  for (; 2 * (k + 1) < m; k += 2) " + rtw_call % "p",
+        "  for (; 2 * k < m; ++k) " + rtw_call % "ScalarAccess{}",
         "  if (m % 2 == 0) RealHalf" + rr + "(ScalarAccess{}, data + (m / 2) * os, s);",
         "}",
         "// clang-format on",

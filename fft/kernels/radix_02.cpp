@@ -4,8 +4,9 @@
 // twiddled complex DFT 6, 4; real DFT 2, 0; real combining group 6, 4.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -18,7 +19,7 @@ using fftk::ScalarAccess;
 
 template <class P>
 inline void Dft02(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
@@ -34,14 +35,14 @@ inline void Dft02(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 
 template <class P>
 inline void DftTw02(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t0, t1;
   p.LdC(re, im, t0, t1);
   const T t8 = t0 + t6;
@@ -65,14 +66,14 @@ inline void RealDft02(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 
 template <class P>
 inline void RealTw02(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t0 = p.Ld(a);
   const T t8 = t0 + t6;
   const T t1 = p.LdB(b);
@@ -97,74 +98,54 @@ inline void RealHalf02(const P& p, double* x, ptrdiff_t s) {
 }  // namespace
 
 FFTK_CLONES
-void FftComplexLeaf02(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+void FftComplexLeaf02(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 2 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft02(p, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os, outIm + t * 2 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft02(p, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os, outIm + t * 2 * os, os);
   } else {
     const LaneAccess p{is, 2 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft02(p, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os, outIm + t * 2 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft02(p, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os, outIm + t * 2 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft02(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os,
-          outIm + t * 2 * os, os);
-  }
+  for (; t < c; ++t) Dft02(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 2 * os, outIm + t * 2 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle02(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle02(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft02(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+  if (k == 0) {
+    Dft02(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 1};
-    for (; k + 1 < m; k += 2) {
-      DftTw02(p, re + k * os, im + k * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
-    }
+    for (; k + 1 < m; k += 2) DftTw02(p, re + k * os, im + k * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
   } else {
     const LaneAccess p{os, os, 0, 1};
-    for (; k + 1 < m; k += 2) {
-      DftTw02(p, re + k * os, im + k * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
-    }
+    for (; k + 1 < m; k += 2) DftTw02(p, re + k * os, im + k * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
   }
-  for (; k < m; ++k) {
-    DftTw02(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 1,
-           twSin + (k - 1) * 1);
-  }
+  for (; k < m; ++k) DftTw02(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
 }
 
 FFTK_CLONES
 void FftRealLeaf02(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 2 * os, 0, 0};
   ptrdiff_t t = 0;
+  const LaneAccess p{is, 2 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft02(p, in + t * is, ls, out + t * 2 * os, os);
   for (; t < c; ++t) RealDft02(ScalarAccess{}, in + t * is, ls, out + t * 2 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle02(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle02(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft02(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 1};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw02(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 1,
-            twSin + (k - 1) * 1);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw02(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 1,
-            twSin + (k - 1) * 1);
-  }
+  const LaneAccess p{os, os, -os, 1};
+  for (; 2 * (k + 1) < m; k += 2) RealTw02(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
+  for (; 2 * k < m; ++k) RealTw02(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 1, twSin + (k - 1) * 1);
   if (m % 2 == 0) RealHalf02(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

@@ -4,8 +4,9 @@
 // twiddled complex DFT 16, 14; real DFT 4, 2; real combining group 16, 14.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -18,7 +19,7 @@ using fftk::ScalarAccess;
 
 template <class P>
 inline void Dft03(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(xr + is, xi + is, t2, t3);
@@ -45,20 +46,20 @@ inline void Dft03(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 
 template <class P>
 inline void DftTw03(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = t6 + t12;
   const T t15 = t7 + t13;
   const T t16 = t6 - t12;
@@ -96,20 +97,20 @@ inline void RealDft03(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 
 template <class P>
 inline void RealTw03(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = t6 + t12;
   const T t15 = t7 + t13;
   const T t16 = t6 - t12;
@@ -155,75 +156,267 @@ inline void RealHalf03(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf03(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+inline void Dft03(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  const T t6 = t2 + t4;
+  const T t7 = t3 + t5;
+  const T t8 = t2 - t4;
+  const T t9 = t3 - t5;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  const T t10 = t0 + t6;
+  const T t11 = t1 + t7;
+  p.StC(yr, yi, t10, t11);
+  const T t12 = t10 - 1.5 * t6;
+  const T t13 = t11 - 1.5 * t7;
+  const T t14 = t12 + 0.866025403784438646764 * t9;
+  const T t15 = t13 - 0.866025403784438646764 * t8;
+  p.StC(yr + os, yi + os, t14, t15);
+  const T t16 = t12 - 0.866025403784438646764 * t9;
+  const T t17 = t13 + 0.866025403784438646764 * t8;
+  p.StC(yr + 2 * os, yi + 2 * os, t16, t17);
+}
+
+template <class P>
+inline void DftTw03(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = t6 + t12;
+  const T t15 = t7 + t13;
+  const T t16 = t6 - t12;
+  const T t17 = t7 - t13;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t18 = t0 + t14;
+  const T t19 = t1 + t15;
+  p.StC(re, im, t18, t19);
+  const T t20 = t18 - 1.5 * t14;
+  const T t21 = t19 - 1.5 * t15;
+  const T t22 = t20 + 0.866025403784438646764 * t17;
+  const T t23 = t21 - 0.866025403784438646764 * t16;
+  p.StC(re + s, im + s, t22, t23);
+  const T t24 = t20 - 0.866025403784438646764 * t17;
+  const T t25 = t21 + 0.866025403784438646764 * t16;
+  p.StC(re + 2 * s, im + 2 * s, t24, t25);
+}
+
+template <class P>
+inline void RealDft03(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + is);
+  const T t2 = p.Ld(x + 2 * is);
+  const T t3 = t1 + t2;
+  const T t4 = t1 - t2;
+  const T t0 = p.Ld(x);
+  const T t5 = t0 + t3;
+  p.St(y, t5);
+  const T t6 = t5 - 1.5 * t3;
+  p.St(y + os, t6);
+  const T t7 = 0.866025403784438646764 * t4;
+  p.St(y + 2 * os, -t7);
+}
+
+template <class P>
+inline void RealTw03(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = t6 + t12;
+  const T t15 = t7 + t13;
+  const T t16 = t6 - t12;
+  const T t17 = t7 - t13;
+  const T t0 = p.Ld(a);
+  const T t18 = t0 + t14;
+  const T t1 = p.LdB(b);
+  p.St(a, t18);
+  const T t19 = t1 + t15;
+  p.StB(b + 2 * s, t19);
+  const T t20 = t18 - 1.5 * t14;
+  const T t21 = t19 - 1.5 * t15;
+  const T t22 = t20 + 0.866025403784438646764 * t17;
+  p.St(a + s, t22);
+  const T t23 = t21 - 0.866025403784438646764 * t16;
+  p.StB(b + s, t23);
+  const T t24 = t20 - 0.866025403784438646764 * t17;
+  p.StB(b, t24);
+  const T t25 = t21 + 0.866025403784438646764 * t16;
+  p.St(a + 2 * s, -t25);
+}
+
+template <class P>
+inline void RealHalf03(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.5 * t1;
+  const T t3 = 0.866025403784438646764 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.5 * t4;
+  const T t6 = 0.866025403784438646764 * t4;
+  const T t7 = t2 - t5;
+  const T t8 = t3 + t6;
+  const T t10 = t6 - t3;
+  const T t0 = p.Ld(x);
+  p.St(x + 2 * s, -t8);
+  const T t11 = t0 + t7;
+  p.St(x, t11);
+  const T t12 = t11 - 1.5 * t7;
+  const T t14 = t12 + 0.866025403784438646764 * t10;
+  p.St(x + s, t14);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 3 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft03(p, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
+  } else {
+    const Lane4Access p{is, 3 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft03(p, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw03(Interleaved4FirstAccess{os, os, 0, 2}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 2};
+    for (; k + 3 < m; k += 4) DftTw03(p, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
+  } else {
+    DftTw03(Lane4FirstAccess{os, os, 0, 2}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 2};
+    for (; k + 3 < m; k += 4) DftTw03(p, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 3 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft03(p, in + t * is, ls, out + t * 3 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 2};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw03(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf03(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 3 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft03(p, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft03(p, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
   } else {
     const LaneAccess p{is, 3 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft03(p, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft03(p, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft03(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os,
-          outIm + t * 3 * os, os);
-  }
+  for (; t < c; ++t) Dft03(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 3 * os, outIm + t * 3 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle03(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle03(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft03(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft03(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 2};
-    for (; k + 1 < m; k += 2) {
-      DftTw03(p, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
-    }
+    for (; k + 1 < m; k += 2) DftTw03(p, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
   } else {
     const LaneAccess p{os, os, 0, 2};
-    for (; k + 1 < m; k += 2) {
-      DftTw03(p, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
-    }
+    for (; k + 1 < m; k += 2) DftTw03(p, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
   }
-  for (; k < m; ++k) {
-    DftTw03(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 2,
-           twSin + (k - 1) * 2);
-  }
+  for (; k < m; ++k) DftTw03(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
 }
 
 FFTK_CLONES
 void FftRealLeaf03(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 3 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 3 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft03(p, in + t * is, ls, out + t * 3 * os, os);
   for (; t < c; ++t) RealDft03(ScalarAccess{}, in + t * is, ls, out + t * 3 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle03(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle03(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft03(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 2};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw03(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 2,
-            twSin + (k - 1) * 2);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw03(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 2,
-            twSin + (k - 1) * 2);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 2};
+  for (; 2 * (k + 1) < m; k += 2) RealTw03(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
+  for (; 2 * k < m; ++k) RealTw03(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 2, twSin + (k - 1) * 2);
   if (m % 2 == 0) RealHalf03(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

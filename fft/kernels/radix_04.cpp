@@ -4,8 +4,9 @@
 // twiddled complex DFT 22, 12; real DFT 6, 0; real combining group 22, 12.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -18,7 +19,7 @@ using fftk::ScalarAccess;
 
 template <class P>
 inline void Dft04(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
@@ -52,26 +53,26 @@ inline void Dft04(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 
 template <class P>
 inline void DftTw04(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t0, t1;
   p.LdC(re, im, t0, t1);
   const T t20 = t0 + t12;
@@ -117,26 +118,26 @@ inline void RealDft04(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 
 template <class P>
 inline void RealTw04(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t0 = p.Ld(a);
   const T t20 = t0 + t12;
   const T t1 = p.LdB(b);
@@ -192,75 +193,304 @@ inline void RealHalf04(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf04(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+inline void Dft04(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  const T t8 = t0 + t4;
+  const T t9 = t1 + t5;
+  const T t10 = t0 - t4;
+  const T t11 = t1 - t5;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  const T t12 = t2 + t6;
+  const T t13 = t3 + t7;
+  const T t14 = t2 - t6;
+  const T t15 = t3 - t7;
+  const T t16 = t8 + t12;
+  const T t17 = t9 + t13;
+  p.StC(yr, yi, t16, t17);
+  const T t18 = t8 - t12;
+  const T t19 = t9 - t13;
+  p.StC(yr + 2 * os, yi + 2 * os, t18, t19);
+  const T t20 = t10 + t15;
+  const T t21 = t11 - t14;
+  p.StC(yr + os, yi + os, t20, t21);
+  const T t22 = t10 - t15;
+  const T t23 = t11 + t14;
+  p.StC(yr + 3 * os, yi + 3 * os, t22, t23);
+}
+
+template <class P>
+inline void DftTw04(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t20 = t0 + t12;
+  const T t21 = t1 + t13;
+  const T t22 = t0 - t12;
+  const T t23 = t1 - t13;
+  const T t24 = t6 + t18;
+  const T t25 = t7 + t19;
+  const T t26 = t6 - t18;
+  const T t27 = t7 - t19;
+  const T t28 = t20 + t24;
+  const T t29 = t21 + t25;
+  p.StC(re, im, t28, t29);
+  const T t30 = t20 - t24;
+  const T t31 = t21 - t25;
+  p.StC(re + 2 * s, im + 2 * s, t30, t31);
+  const T t32 = t22 + t27;
+  const T t33 = t23 - t26;
+  p.StC(re + s, im + s, t32, t33);
+  const T t34 = t22 - t27;
+  const T t35 = t23 + t26;
+  p.StC(re + 3 * s, im + 3 * s, t34, t35);
+}
+
+template <class P>
+inline void RealDft04(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t2 = p.Ld(x + 2 * is);
+  const T t4 = t0 + t2;
+  const T t5 = t0 - t2;
+  const T t1 = p.Ld(x + is);
+  const T t3 = p.Ld(x + 3 * is);
+  p.St(y + os, t5);
+  const T t6 = t1 + t3;
+  const T t7 = t1 - t3;
+  p.St(y + 3 * os, -t7);
+  const T t8 = t4 + t6;
+  p.St(y, t8);
+  const T t9 = t4 - t6;
+  p.St(y + 2 * os, t9);
+}
+
+template <class P>
+inline void RealTw04(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t0 = p.Ld(a);
+  const T t20 = t0 + t12;
+  const T t1 = p.LdB(b);
+  const T t21 = t1 + t13;
+  const T t22 = t0 - t12;
+  const T t23 = t1 - t13;
+  const T t24 = t6 + t18;
+  const T t25 = t7 + t19;
+  const T t26 = t6 - t18;
+  const T t27 = t7 - t19;
+  const T t28 = t20 + t24;
+  p.St(a, t28);
+  const T t29 = t21 + t25;
+  p.StB(b + 3 * s, t29);
+  const T t30 = t20 - t24;
+  p.StB(b + s, t30);
+  const T t31 = t21 - t25;
+  p.St(a + 2 * s, -t31);
+  const T t32 = t22 + t27;
+  p.St(a + s, t32);
+  const T t33 = t23 - t26;
+  p.StB(b + 2 * s, t33);
+  const T t34 = t22 - t27;
+  p.StB(b, t34);
+  const T t35 = t23 + t26;
+  p.St(a + 3 * s, -t35);
+}
+
+template <class P>
+inline void RealHalf04(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.707106781186547524401 * t1;
+  const T t3 = 0.707106781186547524401 * t1;
+  const T t5 = p.Ld(x + 3 * s);
+  const T t6 = 0.707106781186547524401 * t5;
+  const T t7 = 0.707106781186547524401 * t5;
+  const T t8 = t2 - t6;
+  const T t9 = t3 + t7;
+  const T t10 = t2 + t6;
+  const T t11 = t7 - t3;
+  const T t0 = p.Ld(x);
+  const T t12 = t0 + t8;
+  const T t4 = p.Ld(x + 2 * s);
+  p.St(x, t12);
+  const T t13 = t4 + t9;
+  p.St(x + 3 * s, -t13);
+  const T t16 = t0 + t11;
+  p.St(x + s, t16);
+  const T t17 = t4 - t10;
+  p.St(x + 2 * s, t17);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 4 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft04(p, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
+  } else {
+    const Lane4Access p{is, 4 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft04(p, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw04(Interleaved4FirstAccess{os, os, 0, 3}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 3};
+    for (; k + 3 < m; k += 4) DftTw04(p, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
+  } else {
+    DftTw04(Lane4FirstAccess{os, os, 0, 3}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 3};
+    for (; k + 3 < m; k += 4) DftTw04(p, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 4 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft04(p, in + t * is, ls, out + t * 4 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 3};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw04(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf04(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 4 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft04(p, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft04(p, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
   } else {
     const LaneAccess p{is, 4 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft04(p, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft04(p, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft04(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os,
-          outIm + t * 4 * os, os);
-  }
+  for (; t < c; ++t) Dft04(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 4 * os, outIm + t * 4 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle04(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle04(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft04(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft04(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 3};
-    for (; k + 1 < m; k += 2) {
-      DftTw04(p, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
-    }
+    for (; k + 1 < m; k += 2) DftTw04(p, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
   } else {
     const LaneAccess p{os, os, 0, 3};
-    for (; k + 1 < m; k += 2) {
-      DftTw04(p, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
-    }
+    for (; k + 1 < m; k += 2) DftTw04(p, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
   }
-  for (; k < m; ++k) {
-    DftTw04(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 3,
-           twSin + (k - 1) * 3);
-  }
+  for (; k < m; ++k) DftTw04(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
 }
 
 FFTK_CLONES
 void FftRealLeaf04(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 4 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 4 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft04(p, in + t * is, ls, out + t * 4 * os, os);
   for (; t < c; ++t) RealDft04(ScalarAccess{}, in + t * is, ls, out + t * 4 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle04(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle04(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft04(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 3};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw04(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 3,
-            twSin + (k - 1) * 3);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw04(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 3,
-            twSin + (k - 1) * 3);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 3};
+  for (; 2 * (k + 1) < m; k += 2) RealTw04(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
+  for (; 2 * k < m; ++k) RealTw04(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 3, twSin + (k - 1) * 3);
   if (m % 2 == 0) RealHalf04(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

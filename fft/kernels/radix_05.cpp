@@ -4,8 +4,9 @@
 // twiddled complex DFT 40, 32; real DFT 12, 8; real combining group 40, 32.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -18,7 +19,7 @@ using fftk::ScalarAccess;
 
 template <class P>
 inline void Dft05(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(xr + is, xi + is, t2, t3);
@@ -65,32 +66,32 @@ inline void Dft05(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 
 template <class P>
 inline void DftTw05(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = t6 + t24;
   const T t27 = t7 + t25;
   const T t28 = t12 + t18;
@@ -152,32 +153,32 @@ inline void RealDft05(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 
 template <class P>
 inline void RealTw05(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = t6 + t24;
   const T t27 = t7 + t25;
   const T t28 = t12 + t18;
@@ -262,75 +263,374 @@ inline void RealHalf05(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf05(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+inline void Dft05(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  const T t10 = t2 + t8;
+  const T t11 = t3 + t9;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  const T t12 = t4 + t6;
+  const T t13 = t5 + t7;
+  const T t14 = t2 - t8;
+  const T t15 = t3 - t9;
+  const T t16 = t4 - t6;
+  const T t17 = t5 - t7;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  const T t18 = t0 + t10 + t12;
+  const T t19 = t1 + t11 + t13;
+  p.StC(yr, yi, t18, t19);
+  const T t20 = t0 + 0.309016994374947424102 * t10 - 0.809016994374947424102 * t12;
+  const T t21 = t1 + 0.309016994374947424102 * t11 - 0.809016994374947424102 * t13;
+  const T t22 = 0.951056516295153572116 * t15 + 0.587785252292473129169 * t17;
+  const T t23 = 0.951056516295153572116 * t14 + 0.587785252292473129169 * t16;
+  const T t24 = t20 + t22;
+  const T t25 = t21 - t23;
+  p.StC(yr + os, yi + os, t24, t25);
+  const T t26 = t20 - t22;
+  const T t27 = t21 + t23;
+  p.StC(yr + 4 * os, yi + 4 * os, t26, t27);
+  const T t28 = t0 - 0.809016994374947424102 * t10 + 0.309016994374947424102 * t12;
+  const T t29 = t1 - 0.809016994374947424102 * t11 + 0.309016994374947424102 * t13;
+  const T t30 = 0.587785252292473129169 * t15 - 0.951056516295153572116 * t17;
+  const T t31 = 0.587785252292473129169 * t14 - 0.951056516295153572116 * t16;
+  const T t32 = t28 + t30;
+  const T t33 = t29 - t31;
+  p.StC(yr + 2 * os, yi + 2 * os, t32, t33);
+  const T t34 = t28 - t30;
+  const T t35 = t29 + t31;
+  p.StC(yr + 3 * os, yi + 3 * os, t34, t35);
+}
+
+template <class P>
+inline void DftTw05(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = t6 + t24;
+  const T t27 = t7 + t25;
+  const T t28 = t12 + t18;
+  const T t29 = t13 + t19;
+  const T t30 = t6 - t24;
+  const T t31 = t7 - t25;
+  const T t32 = t12 - t18;
+  const T t33 = t13 - t19;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t34 = t0 + t26 + t28;
+  const T t35 = t1 + t27 + t29;
+  p.StC(re, im, t34, t35);
+  const T t36 = t0 + 0.309016994374947424102 * t26 - 0.809016994374947424102 * t28;
+  const T t37 = t1 + 0.309016994374947424102 * t27 - 0.809016994374947424102 * t29;
+  const T t38 = 0.951056516295153572116 * t31 + 0.587785252292473129169 * t33;
+  const T t39 = 0.951056516295153572116 * t30 + 0.587785252292473129169 * t32;
+  const T t40 = t36 + t38;
+  const T t41 = t37 - t39;
+  p.StC(re + s, im + s, t40, t41);
+  const T t42 = t36 - t38;
+  const T t43 = t37 + t39;
+  p.StC(re + 4 * s, im + 4 * s, t42, t43);
+  const T t44 = t0 - 0.809016994374947424102 * t26 + 0.309016994374947424102 * t28;
+  const T t45 = t1 - 0.809016994374947424102 * t27 + 0.309016994374947424102 * t29;
+  const T t46 = 0.587785252292473129169 * t31 - 0.951056516295153572116 * t33;
+  const T t47 = 0.587785252292473129169 * t30 - 0.951056516295153572116 * t32;
+  const T t48 = t44 + t46;
+  const T t49 = t45 - t47;
+  p.StC(re + 2 * s, im + 2 * s, t48, t49);
+  const T t50 = t44 - t46;
+  const T t51 = t45 + t47;
+  p.StC(re + 3 * s, im + 3 * s, t50, t51);
+}
+
+template <class P>
+inline void RealDft05(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + is);
+  const T t4 = p.Ld(x + 4 * is);
+  const T t5 = t1 + t4;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t3 = p.Ld(x + 3 * is);
+  const T t6 = t2 + t3;
+  const T t7 = t1 - t4;
+  const T t8 = t2 - t3;
+  const T t0 = p.Ld(x);
+  const T t9 = t0 + t5 + t6;
+  p.St(y, t9);
+  const T t10 = t0 + 0.309016994374947424102 * t5 - 0.809016994374947424102 * t6;
+  p.St(y + os, t10);
+  const T t11 = 0.951056516295153572116 * t7 + 0.587785252292473129169 * t8;
+  p.St(y + 4 * os, -t11);
+  const T t12 = t0 - 0.809016994374947424102 * t5 + 0.309016994374947424102 * t6;
+  p.St(y + 2 * os, t12);
+  const T t13 = 0.587785252292473129169 * t7 - 0.951056516295153572116 * t8;
+  p.St(y + 3 * os, -t13);
+}
+
+template <class P>
+inline void RealTw05(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = t6 + t24;
+  const T t27 = t7 + t25;
+  const T t28 = t12 + t18;
+  const T t29 = t13 + t19;
+  const T t30 = t6 - t24;
+  const T t31 = t7 - t25;
+  const T t32 = t12 - t18;
+  const T t33 = t13 - t19;
+  const T t0 = p.Ld(a);
+  const T t34 = t0 + t26 + t28;
+  const T t1 = p.LdB(b);
+  p.St(a, t34);
+  const T t35 = t1 + t27 + t29;
+  p.StB(b + 4 * s, t35);
+  const T t36 = t0 + 0.309016994374947424102 * t26 - 0.809016994374947424102 * t28;
+  const T t37 = t1 + 0.309016994374947424102 * t27 - 0.809016994374947424102 * t29;
+  const T t38 = 0.951056516295153572116 * t31 + 0.587785252292473129169 * t33;
+  const T t39 = 0.951056516295153572116 * t30 + 0.587785252292473129169 * t32;
+  const T t40 = t36 + t38;
+  p.St(a + s, t40);
+  const T t41 = t37 - t39;
+  p.StB(b + 3 * s, t41);
+  const T t42 = t36 - t38;
+  p.StB(b, t42);
+  const T t43 = t37 + t39;
+  p.St(a + 4 * s, -t43);
+  const T t44 = t0 - 0.809016994374947424102 * t26 + 0.309016994374947424102 * t28;
+  const T t45 = t1 - 0.809016994374947424102 * t27 + 0.309016994374947424102 * t29;
+  const T t46 = 0.587785252292473129169 * t31 - 0.951056516295153572116 * t33;
+  const T t47 = 0.587785252292473129169 * t30 - 0.951056516295153572116 * t32;
+  const T t48 = t44 + t46;
+  p.St(a + 2 * s, t48);
+  const T t49 = t45 - t47;
+  p.StB(b + 2 * s, t49);
+  const T t50 = t44 - t46;
+  p.StB(b + s, t50);
+  const T t51 = t45 + t47;
+  p.St(a + 3 * s, -t51);
+}
+
+template <class P>
+inline void RealHalf05(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.809016994374947424102 * t1;
+  const T t3 = 0.587785252292473129169 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.309016994374947424102 * t4;
+  const T t6 = 0.951056516295153572116 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.309016994374947424102 * t7;
+  const T t9 = 0.951056516295153572116 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.809016994374947424102 * t10;
+  const T t12 = 0.587785252292473129169 * t10;
+  const T t13 = t2 - t11;
+  const T t14 = t3 + t12;
+  const T t15 = t5 - t8;
+  const T t16 = t6 + t9;
+  const T t17 = t2 + t11;
+  const T t18 = t12 - t3;
+  const T t19 = t5 + t8;
+  const T t20 = t9 - t6;
+  const T t0 = p.Ld(x);
+  const T t21 = t0 + t13 + t15;
+  p.St(x, t21);
+  const T t22 = t14 + t16;
+  p.St(x + 4 * s, -t22);
+  const T t23 = t0 + 0.309016994374947424102 * t13 - 0.809016994374947424102 * t15;
+  const T t24 = 0.809016994374947424102 * t16 - 0.309016994374947424102 * t14;
+  const T t25 = 0.951056516295153572116 * t18 + 0.587785252292473129169 * t20;
+  const T t26 = 0.951056516295153572116 * t17 + 0.587785252292473129169 * t19;
+  const T t27 = t23 + t25;
+  p.St(x + s, t27);
+  const T t28 = t24 - t26;
+  p.St(x + 3 * s, t28);
+  const T t31 = t0 - 0.809016994374947424102 * t13 + 0.309016994374947424102 * t15;
+  const T t33 = 0.587785252292473129169 * t18 - 0.951056516295153572116 * t20;
+  const T t35 = t31 + t33;
+  p.St(x + 2 * s, t35);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 5 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
+  } else {
+    const Lane4Access p{is, 5 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw05(Interleaved4FirstAccess{os, os, 0, 4}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 4};
+    for (; k + 3 < m; k += 4) DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+  } else {
+    DftTw05(Lane4FirstAccess{os, os, 0, 4}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 4};
+    for (; k + 3 < m; k += 4) DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 5 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft05(p, in + t * is, ls, out + t * 5 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 4};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw05(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf05(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 5 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
   } else {
     const LaneAccess p{is, 5 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft05(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os,
-          outIm + t * 5 * os, os);
-  }
+  for (; t < c; ++t) Dft05(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle05(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle05(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft05(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft05(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 4};
-    for (; k + 1 < m; k += 2) {
-      DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
-    }
+    for (; k + 1 < m; k += 2) DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
   } else {
     const LaneAccess p{os, os, 0, 4};
-    for (; k + 1 < m; k += 2) {
-      DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
-    }
+    for (; k + 1 < m; k += 2) DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
   }
-  for (; k < m; ++k) {
-    DftTw05(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 4,
-           twSin + (k - 1) * 4);
-  }
+  for (; k < m; ++k) DftTw05(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
 }
 
 FFTK_CLONES
 void FftRealLeaf05(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 5 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 5 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft05(p, in + t * is, ls, out + t * 5 * os, os);
   for (; t < c; ++t) RealDft05(ScalarAccess{}, in + t * is, ls, out + t * 5 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle05(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle05(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft05(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 4};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw05(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4,
-            twSin + (k - 1) * 4);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw05(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4,
-            twSin + (k - 1) * 4);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 4};
+  for (; 2 * (k + 1) < m; k += 2) RealTw05(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+  for (; 2 * k < m; ++k) RealTw05(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
   if (m % 2 == 0) RealHalf05(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

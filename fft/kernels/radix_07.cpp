@@ -4,8 +4,9 @@
 // twiddled complex DFT 72, 60; real DFT 24, 18; real combining group 72, 60.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -18,7 +19,7 @@ using fftk::ScalarAccess;
 
 template <class P>
 inline void Dft07(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(xr + is, xi + is, t2, t3);
@@ -83,44 +84,44 @@ inline void Dft07(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 
 template <class P>
 inline void DftTw07(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   T t26, t27;
   p.LdC(re + 5 * s, im + 5 * s, t26, t27);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   T t32, t33;
   p.LdC(re + 6 * s, im + 6 * s, t32, t33);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = t6 + t36;
   const T t39 = t7 + t37;
   const T t40 = t12 + t30;
@@ -204,44 +205,44 @@ inline void RealDft07(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 
 template <class P>
 inline void RealTw07(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = p.Ld(a + 5 * s);
   const T t27 = p.LdB(b + 5 * s);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   const T t32 = p.Ld(a + 6 * s);
   const T t33 = p.LdB(b + 6 * s);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = t6 + t36;
   const T t39 = t7 + t37;
   const T t40 = t12 + t30;
@@ -360,75 +361,472 @@ inline void RealHalf07(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf07(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+inline void Dft07(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  const T t14 = t2 + t12;
+  const T t15 = t3 + t13;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  const T t16 = t4 + t10;
+  const T t17 = t5 + t11;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  const T t18 = t6 + t8;
+  const T t19 = t7 + t9;
+  const T t20 = t2 - t12;
+  const T t21 = t3 - t13;
+  const T t22 = t4 - t10;
+  const T t23 = t5 - t11;
+  const T t24 = t6 - t8;
+  const T t25 = t7 - t9;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  const T t26 = t0 + t14 + t16 + t18;
+  const T t27 = t1 + t15 + t17 + t19;
+  p.StC(yr, yi, t26, t27);
+  const T t28 = t0 + 0.623489801858733530525 * t14 - 0.222520933956314404289 * t16 - 0.900968867902419126236 * t18;
+  const T t29 = t1 + 0.623489801858733530525 * t15 - 0.222520933956314404289 * t17 - 0.900968867902419126236 * t19;
+  const T t30 = 0.781831482468029808708 * t21 + 0.974927912181823607018 * t23 + 0.433883739117558120476 * t25;
+  const T t31 = 0.781831482468029808708 * t20 + 0.974927912181823607018 * t22 + 0.433883739117558120476 * t24;
+  const T t32 = t28 + t30;
+  const T t33 = t29 - t31;
+  p.StC(yr + os, yi + os, t32, t33);
+  const T t34 = t28 - t30;
+  const T t35 = t29 + t31;
+  p.StC(yr + 6 * os, yi + 6 * os, t34, t35);
+  const T t36 = t0 - 0.222520933956314404289 * t14 - 0.900968867902419126236 * t16 + 0.623489801858733530525 * t18;
+  const T t37 = t1 - 0.222520933956314404289 * t15 - 0.900968867902419126236 * t17 + 0.623489801858733530525 * t19;
+  const T t38 = 0.974927912181823607018 * t21 - 0.433883739117558120476 * t23 - 0.781831482468029808708 * t25;
+  const T t39 = 0.974927912181823607018 * t20 - 0.433883739117558120476 * t22 - 0.781831482468029808708 * t24;
+  const T t40 = t36 + t38;
+  const T t41 = t37 - t39;
+  p.StC(yr + 2 * os, yi + 2 * os, t40, t41);
+  const T t42 = t36 - t38;
+  const T t43 = t37 + t39;
+  p.StC(yr + 5 * os, yi + 5 * os, t42, t43);
+  const T t44 = t0 - 0.900968867902419126236 * t14 + 0.623489801858733530525 * t16 - 0.222520933956314404289 * t18;
+  const T t45 = t1 - 0.900968867902419126236 * t15 + 0.623489801858733530525 * t17 - 0.222520933956314404289 * t19;
+  const T t46 = 0.433883739117558120476 * t21 - 0.781831482468029808708 * t23 + 0.974927912181823607018 * t25;
+  const T t47 = 0.433883739117558120476 * t20 - 0.781831482468029808708 * t22 + 0.974927912181823607018 * t24;
+  const T t48 = t44 + t46;
+  const T t49 = t45 - t47;
+  p.StC(yr + 3 * os, yi + 3 * os, t48, t49);
+  const T t50 = t44 - t46;
+  const T t51 = t45 + t47;
+  p.StC(yr + 4 * os, yi + 4 * os, t50, t51);
+}
+
+template <class P>
+inline void DftTw07(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  T t26, t27;
+  p.LdC(re + 5 * s, im + 5 * s, t26, t27);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  T t32, t33;
+  p.LdC(re + 6 * s, im + 6 * s, t32, t33);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = t6 + t36;
+  const T t39 = t7 + t37;
+  const T t40 = t12 + t30;
+  const T t41 = t13 + t31;
+  const T t42 = t18 + t24;
+  const T t43 = t19 + t25;
+  const T t44 = t6 - t36;
+  const T t45 = t7 - t37;
+  const T t46 = t12 - t30;
+  const T t47 = t13 - t31;
+  const T t48 = t18 - t24;
+  const T t49 = t19 - t25;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t50 = t0 + t38 + t40 + t42;
+  const T t51 = t1 + t39 + t41 + t43;
+  p.StC(re, im, t50, t51);
+  const T t52 = t0 + 0.623489801858733530525 * t38 - 0.222520933956314404289 * t40 - 0.900968867902419126236 * t42;
+  const T t53 = t1 + 0.623489801858733530525 * t39 - 0.222520933956314404289 * t41 - 0.900968867902419126236 * t43;
+  const T t54 = 0.781831482468029808708 * t45 + 0.974927912181823607018 * t47 + 0.433883739117558120476 * t49;
+  const T t55 = 0.781831482468029808708 * t44 + 0.974927912181823607018 * t46 + 0.433883739117558120476 * t48;
+  const T t56 = t52 + t54;
+  const T t57 = t53 - t55;
+  p.StC(re + s, im + s, t56, t57);
+  const T t58 = t52 - t54;
+  const T t59 = t53 + t55;
+  p.StC(re + 6 * s, im + 6 * s, t58, t59);
+  const T t60 = t0 - 0.222520933956314404289 * t38 - 0.900968867902419126236 * t40 + 0.623489801858733530525 * t42;
+  const T t61 = t1 - 0.222520933956314404289 * t39 - 0.900968867902419126236 * t41 + 0.623489801858733530525 * t43;
+  const T t62 = 0.974927912181823607018 * t45 - 0.433883739117558120476 * t47 - 0.781831482468029808708 * t49;
+  const T t63 = 0.974927912181823607018 * t44 - 0.433883739117558120476 * t46 - 0.781831482468029808708 * t48;
+  const T t64 = t60 + t62;
+  const T t65 = t61 - t63;
+  p.StC(re + 2 * s, im + 2 * s, t64, t65);
+  const T t66 = t60 - t62;
+  const T t67 = t61 + t63;
+  p.StC(re + 5 * s, im + 5 * s, t66, t67);
+  const T t68 = t0 - 0.900968867902419126236 * t38 + 0.623489801858733530525 * t40 - 0.222520933956314404289 * t42;
+  const T t69 = t1 - 0.900968867902419126236 * t39 + 0.623489801858733530525 * t41 - 0.222520933956314404289 * t43;
+  const T t70 = 0.433883739117558120476 * t45 - 0.781831482468029808708 * t47 + 0.974927912181823607018 * t49;
+  const T t71 = 0.433883739117558120476 * t44 - 0.781831482468029808708 * t46 + 0.974927912181823607018 * t48;
+  const T t72 = t68 + t70;
+  const T t73 = t69 - t71;
+  p.StC(re + 3 * s, im + 3 * s, t72, t73);
+  const T t74 = t68 - t70;
+  const T t75 = t69 + t71;
+  p.StC(re + 4 * s, im + 4 * s, t74, t75);
+}
+
+template <class P>
+inline void RealDft07(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + is);
+  const T t6 = p.Ld(x + 6 * is);
+  const T t7 = t1 + t6;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t5 = p.Ld(x + 5 * is);
+  const T t8 = t2 + t5;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t4 = p.Ld(x + 4 * is);
+  const T t9 = t3 + t4;
+  const T t10 = t1 - t6;
+  const T t11 = t2 - t5;
+  const T t12 = t3 - t4;
+  const T t0 = p.Ld(x);
+  const T t13 = t0 + t7 + t8 + t9;
+  p.St(y, t13);
+  const T t14 = t0 + 0.623489801858733530525 * t7 - 0.222520933956314404289 * t8 - 0.900968867902419126236 * t9;
+  p.St(y + os, t14);
+  const T t15 = 0.781831482468029808708 * t10 + 0.974927912181823607018 * t11 + 0.433883739117558120476 * t12;
+  p.St(y + 6 * os, -t15);
+  const T t16 = t0 - 0.222520933956314404289 * t7 - 0.900968867902419126236 * t8 + 0.623489801858733530525 * t9;
+  p.St(y + 2 * os, t16);
+  const T t17 = 0.974927912181823607018 * t10 - 0.433883739117558120476 * t11 - 0.781831482468029808708 * t12;
+  p.St(y + 5 * os, -t17);
+  const T t18 = t0 - 0.900968867902419126236 * t7 + 0.623489801858733530525 * t8 - 0.222520933956314404289 * t9;
+  p.St(y + 3 * os, t18);
+  const T t19 = 0.433883739117558120476 * t10 - 0.781831482468029808708 * t11 + 0.974927912181823607018 * t12;
+  p.St(y + 4 * os, -t19);
+}
+
+template <class P>
+inline void RealTw07(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = p.Ld(a + 5 * s);
+  const T t27 = p.LdB(b + 5 * s);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  const T t32 = p.Ld(a + 6 * s);
+  const T t33 = p.LdB(b + 6 * s);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = t6 + t36;
+  const T t39 = t7 + t37;
+  const T t40 = t12 + t30;
+  const T t41 = t13 + t31;
+  const T t42 = t18 + t24;
+  const T t43 = t19 + t25;
+  const T t44 = t6 - t36;
+  const T t45 = t7 - t37;
+  const T t46 = t12 - t30;
+  const T t47 = t13 - t31;
+  const T t48 = t18 - t24;
+  const T t49 = t19 - t25;
+  const T t0 = p.Ld(a);
+  const T t50 = t0 + t38 + t40 + t42;
+  const T t1 = p.LdB(b);
+  p.St(a, t50);
+  const T t51 = t1 + t39 + t41 + t43;
+  p.StB(b + 6 * s, t51);
+  const T t52 = t0 + 0.623489801858733530525 * t38 - 0.222520933956314404289 * t40 - 0.900968867902419126236 * t42;
+  const T t53 = t1 + 0.623489801858733530525 * t39 - 0.222520933956314404289 * t41 - 0.900968867902419126236 * t43;
+  const T t54 = 0.781831482468029808708 * t45 + 0.974927912181823607018 * t47 + 0.433883739117558120476 * t49;
+  const T t55 = 0.781831482468029808708 * t44 + 0.974927912181823607018 * t46 + 0.433883739117558120476 * t48;
+  const T t56 = t52 + t54;
+  p.St(a + s, t56);
+  const T t57 = t53 - t55;
+  p.StB(b + 5 * s, t57);
+  const T t58 = t52 - t54;
+  p.StB(b, t58);
+  const T t59 = t53 + t55;
+  p.St(a + 6 * s, -t59);
+  const T t60 = t0 - 0.222520933956314404289 * t38 - 0.900968867902419126236 * t40 + 0.623489801858733530525 * t42;
+  const T t61 = t1 - 0.222520933956314404289 * t39 - 0.900968867902419126236 * t41 + 0.623489801858733530525 * t43;
+  const T t62 = 0.974927912181823607018 * t45 - 0.433883739117558120476 * t47 - 0.781831482468029808708 * t49;
+  const T t63 = 0.974927912181823607018 * t44 - 0.433883739117558120476 * t46 - 0.781831482468029808708 * t48;
+  const T t64 = t60 + t62;
+  p.St(a + 2 * s, t64);
+  const T t65 = t61 - t63;
+  p.StB(b + 4 * s, t65);
+  const T t66 = t60 - t62;
+  p.StB(b + s, t66);
+  const T t67 = t61 + t63;
+  p.St(a + 5 * s, -t67);
+  const T t68 = t0 - 0.900968867902419126236 * t38 + 0.623489801858733530525 * t40 - 0.222520933956314404289 * t42;
+  const T t69 = t1 - 0.900968867902419126236 * t39 + 0.623489801858733530525 * t41 - 0.222520933956314404289 * t43;
+  const T t70 = 0.433883739117558120476 * t45 - 0.781831482468029808708 * t47 + 0.974927912181823607018 * t49;
+  const T t71 = 0.433883739117558120476 * t44 - 0.781831482468029808708 * t46 + 0.974927912181823607018 * t48;
+  const T t72 = t68 + t70;
+  p.St(a + 3 * s, t72);
+  const T t73 = t69 - t71;
+  p.StB(b + 3 * s, t73);
+  const T t74 = t68 - t70;
+  p.StB(b + 2 * s, t74);
+  const T t75 = t69 + t71;
+  p.St(a + 4 * s, -t75);
+}
+
+template <class P>
+inline void RealHalf07(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.900968867902419126236 * t1;
+  const T t3 = 0.433883739117558120476 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.623489801858733530525 * t4;
+  const T t6 = 0.781831482468029808708 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.222520933956314404289 * t7;
+  const T t9 = 0.974927912181823607018 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.222520933956314404289 * t10;
+  const T t12 = 0.974927912181823607018 * t10;
+  const T t13 = p.Ld(x + 5 * s);
+  const T t14 = 0.623489801858733530525 * t13;
+  const T t15 = 0.781831482468029808708 * t13;
+  const T t16 = p.Ld(x + 6 * s);
+  const T t17 = 0.900968867902419126236 * t16;
+  const T t18 = 0.433883739117558120476 * t16;
+  const T t19 = t2 - t17;
+  const T t20 = t3 + t18;
+  const T t21 = t5 - t14;
+  const T t22 = t6 + t15;
+  const T t23 = t8 - t11;
+  const T t24 = t9 + t12;
+  const T t25 = t2 + t17;
+  const T t26 = t18 - t3;
+  const T t27 = t5 + t14;
+  const T t28 = t15 - t6;
+  const T t29 = t8 + t11;
+  const T t30 = t12 - t9;
+  const T t0 = p.Ld(x);
+  const T t31 = t0 + t19 + t21 + t23;
+  p.St(x, t31);
+  const T t32 = t20 + t22 + t24;
+  p.St(x + 6 * s, -t32);
+  const T t33 = t0 + 0.623489801858733530525 * t19 - 0.222520933956314404289 * t21 - 0.900968867902419126236 * t23;
+  const T t34 = 0.222520933956314404289 * t22 - 0.623489801858733530525 * t20 + 0.900968867902419126236 * t24;
+  const T t35 = 0.781831482468029808708 * t26 + 0.974927912181823607018 * t28 + 0.433883739117558120476 * t30;
+  const T t36 = 0.781831482468029808708 * t25 + 0.974927912181823607018 * t27 + 0.433883739117558120476 * t29;
+  const T t37 = t33 + t35;
+  p.St(x + s, t37);
+  const T t38 = t34 - t36;
+  p.St(x + 5 * s, t38);
+  const T t41 = t0 - 0.222520933956314404289 * t19 - 0.900968867902419126236 * t21 + 0.623489801858733530525 * t23;
+  const T t42 = 0.222520933956314404289 * t20 + 0.900968867902419126236 * t22 - 0.623489801858733530525 * t24;
+  const T t43 = 0.974927912181823607018 * t26 - 0.433883739117558120476 * t28 - 0.781831482468029808708 * t30;
+  const T t44 = 0.974927912181823607018 * t25 - 0.433883739117558120476 * t27 - 0.781831482468029808708 * t29;
+  const T t45 = t41 + t43;
+  p.St(x + 2 * s, t45);
+  const T t46 = t42 - t44;
+  p.St(x + 4 * s, t46);
+  const T t49 = t0 - 0.900968867902419126236 * t19 + 0.623489801858733530525 * t21 - 0.222520933956314404289 * t23;
+  const T t51 = 0.433883739117558120476 * t26 - 0.781831482468029808708 * t28 + 0.974927912181823607018 * t30;
+  const T t53 = t49 + t51;
+  p.St(x + 3 * s, t53);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 7 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft07(p, inRe + t * is, inIm + t * is, ls, outRe + t * 7 * os, outIm + t * 7 * os, os);
+  } else {
+    const Lane4Access p{is, 7 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft07(p, inRe + t * is, inIm + t * is, ls, outRe + t * 7 * os, outIm + t * 7 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw07(Interleaved4FirstAccess{os, os, 0, 6}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 6};
+    for (; k + 3 < m; k += 4) DftTw07(p, re + k * os, im + k * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
+  } else {
+    DftTw07(Lane4FirstAccess{os, os, 0, 6}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 6};
+    for (; k + 3 < m; k += 4) DftTw07(p, re + k * os, im + k * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 7 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft07(p, in + t * is, ls, out + t * 7 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 6};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw07(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf07(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 7 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft07(p, inRe + t * is, inIm + t * is, ls, outRe + t * 7 * os, outIm + t * 7 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft07(p, inRe + t * is, inIm + t * is, ls, outRe + t * 7 * os, outIm + t * 7 * os, os);
   } else {
     const LaneAccess p{is, 7 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft07(p, inRe + t * is, inIm + t * is, ls, outRe + t * 7 * os, outIm + t * 7 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft07(p, inRe + t * is, inIm + t * is, ls, outRe + t * 7 * os, outIm + t * 7 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft07(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 7 * os,
-          outIm + t * 7 * os, os);
-  }
+  for (; t < c; ++t) Dft07(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 7 * os, outIm + t * 7 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle07(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle07(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft07(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft07(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 6};
-    for (; k + 1 < m; k += 2) {
-      DftTw07(p, re + k * os, im + k * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
-    }
+    for (; k + 1 < m; k += 2) DftTw07(p, re + k * os, im + k * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
   } else {
     const LaneAccess p{os, os, 0, 6};
-    for (; k + 1 < m; k += 2) {
-      DftTw07(p, re + k * os, im + k * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
-    }
+    for (; k + 1 < m; k += 2) DftTw07(p, re + k * os, im + k * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
   }
-  for (; k < m; ++k) {
-    DftTw07(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 6,
-           twSin + (k - 1) * 6);
-  }
+  for (; k < m; ++k) DftTw07(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
 }
 
 FFTK_CLONES
 void FftRealLeaf07(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 7 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 7 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft07(p, in + t * is, ls, out + t * 7 * os, os);
   for (; t < c; ++t) RealDft07(ScalarAccess{}, in + t * is, ls, out + t * 7 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle07(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle07(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft07(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 6};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw07(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 6,
-            twSin + (k - 1) * 6);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw07(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 6,
-            twSin + (k - 1) * 6);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 6};
+  for (; 2 * (k + 1) < m; k += 2) RealTw07(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
+  for (; 2 * k < m; ++k) RealTw07(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 6, twSin + (k - 1) * 6);
   if (m % 2 == 0) RealHalf07(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

@@ -4,8 +4,9 @@
 // twiddled complex DFT 66, 32; real DFT 22, 4; real combining group 66, 32.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -17,8 +18,8 @@ using fftk::LaneAccess;
 using fftk::ScalarAccess;
 
 template <class P>
-inline void Dft08(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+FFTK_BODY void Dft08(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
@@ -103,51 +104,51 @@ inline void Dft08(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 }
 
 template <class P>
-inline void DftTw08(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+FFTK_BODY void DftTw08(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   T t26, t27;
   p.LdC(re + 5 * s, im + 5 * s, t26, t27);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   T t32, t33;
   p.LdC(re + 6 * s, im + 6 * s, t32, t33);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   T t38, t39;
   p.LdC(re + 7 * s, im + 7 * s, t38, t39);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   T t0, t1;
   p.LdC(re, im, t0, t1);
   const T t44 = t0 + t24;
@@ -217,7 +218,7 @@ inline void DftTw08(const P& p, double* re, double* im, ptrdiff_t s, const doubl
 }
 
 template <class P>
-inline void RealDft08(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+FFTK_BODY void RealDft08(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t0 = p.Ld(x);
   const T t4 = p.Ld(x + 4 * is);
@@ -264,51 +265,51 @@ inline void RealDft08(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 }
 
 template <class P>
-inline void RealTw08(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+FFTK_BODY void RealTw08(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = p.Ld(a + 5 * s);
   const T t27 = p.LdB(b + 5 * s);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   const T t32 = p.Ld(a + 6 * s);
   const T t33 = p.LdB(b + 6 * s);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = p.Ld(a + 7 * s);
   const T t39 = p.LdB(b + 7 * s);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   const T t0 = p.Ld(a);
   const T t44 = t0 + t24;
   const T t1 = p.LdB(b);
@@ -386,7 +387,7 @@ inline void RealTw08(const P& p, double* a, double* b, ptrdiff_t s, const double
 }
 
 template <class P>
-inline void RealHalf08(const P& p, double* x, ptrdiff_t s) {
+FFTK_BODY void RealHalf08(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
   const T t1 = p.Ld(x + s);
   const T t2 = 0.923879532511286756128 * t1;
@@ -464,75 +465,576 @@ inline void RealHalf08(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf08(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+FFTK_BODY void Dft08(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  const T t16 = t0 + t8;
+  const T t17 = t1 + t9;
+  const T t18 = t0 - t8;
+  const T t19 = t1 - t9;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  const T t20 = t2 + t10;
+  const T t21 = t3 + t11;
+  const T t22 = t2 - t10;
+  const T t23 = t3 - t11;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  const T t24 = t4 + t12;
+  const T t25 = t5 + t13;
+  const T t26 = t4 - t12;
+  const T t27 = t5 - t13;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
+  const T t28 = t6 + t14;
+  const T t29 = t7 + t15;
+  const T t30 = t6 - t14;
+  const T t31 = t7 - t15;
+  const T t32 = t16 + t24;
+  const T t33 = t17 + t25;
+  const T t34 = t16 - t24;
+  const T t35 = t17 - t25;
+  const T t36 = t20 + t28;
+  const T t37 = t21 + t29;
+  const T t38 = t20 - t28;
+  const T t39 = t21 - t29;
+  const T t40 = t32 + t36;
+  const T t41 = t33 + t37;
+  p.StC(yr, yi, t40, t41);
+  const T t42 = t32 - t36;
+  const T t43 = t33 - t37;
+  p.StC(yr + 4 * os, yi + 4 * os, t42, t43);
+  const T t44 = t34 + t39;
+  const T t45 = t35 - t38;
+  p.StC(yr + 2 * os, yi + 2 * os, t44, t45);
+  const T t46 = t34 - t39;
+  const T t47 = t35 + t38;
+  p.StC(yr + 6 * os, yi + 6 * os, t46, t47);
+  const T t48 = t22 + t23;
+  const T t49 = 0.707106781186547524401 * t48;
+  const T t50 = t23 - t22;
+  const T t51 = 0.707106781186547524401 * t50;
+  const T t52 = t31 - t30;
+  const T t53 = 0.707106781186547524401 * t52;
+  const T t54 = t30 + t31;
+  const T t55 = 0.707106781186547524401 * t54;
+  const T t56 = t18 + t27;
+  const T t57 = t19 - t26;
+  const T t58 = t18 - t27;
+  const T t59 = t19 + t26;
+  const T t60 = t49 + t53;
+  const T t61 = t51 - t55;
+  const T t62 = t49 - t53;
+  const T t63 = t51 + t55;
+  const T t64 = t56 + t60;
+  const T t65 = t57 + t61;
+  p.StC(yr + os, yi + os, t64, t65);
+  const T t66 = t56 - t60;
+  const T t67 = t57 - t61;
+  p.StC(yr + 5 * os, yi + 5 * os, t66, t67);
+  const T t68 = t58 + t63;
+  const T t69 = t59 - t62;
+  p.StC(yr + 3 * os, yi + 3 * os, t68, t69);
+  const T t70 = t58 - t63;
+  const T t71 = t59 + t62;
+  p.StC(yr + 7 * os, yi + 7 * os, t70, t71);
+}
+
+template <class P>
+FFTK_BODY void DftTw08(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  T t26, t27;
+  p.LdC(re + 5 * s, im + 5 * s, t26, t27);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  T t32, t33;
+  p.LdC(re + 6 * s, im + 6 * s, t32, t33);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  T t38, t39;
+  p.LdC(re + 7 * s, im + 7 * s, t38, t39);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t44 = t0 + t24;
+  const T t45 = t1 + t25;
+  const T t46 = t0 - t24;
+  const T t47 = t1 - t25;
+  const T t48 = t6 + t30;
+  const T t49 = t7 + t31;
+  const T t50 = t6 - t30;
+  const T t51 = t7 - t31;
+  const T t52 = t12 + t36;
+  const T t53 = t13 + t37;
+  const T t54 = t12 - t36;
+  const T t55 = t13 - t37;
+  const T t56 = t18 + t42;
+  const T t57 = t19 + t43;
+  const T t58 = t18 - t42;
+  const T t59 = t19 - t43;
+  const T t60 = t44 + t52;
+  const T t61 = t45 + t53;
+  const T t62 = t44 - t52;
+  const T t63 = t45 - t53;
+  const T t64 = t48 + t56;
+  const T t65 = t49 + t57;
+  const T t66 = t48 - t56;
+  const T t67 = t49 - t57;
+  const T t68 = t60 + t64;
+  const T t69 = t61 + t65;
+  p.StC(re, im, t68, t69);
+  const T t70 = t60 - t64;
+  const T t71 = t61 - t65;
+  p.StC(re + 4 * s, im + 4 * s, t70, t71);
+  const T t72 = t62 + t67;
+  const T t73 = t63 - t66;
+  p.StC(re + 2 * s, im + 2 * s, t72, t73);
+  const T t74 = t62 - t67;
+  const T t75 = t63 + t66;
+  p.StC(re + 6 * s, im + 6 * s, t74, t75);
+  const T t76 = t50 + t51;
+  const T t77 = 0.707106781186547524401 * t76;
+  const T t78 = t51 - t50;
+  const T t79 = 0.707106781186547524401 * t78;
+  const T t80 = t59 - t58;
+  const T t81 = 0.707106781186547524401 * t80;
+  const T t82 = t58 + t59;
+  const T t83 = 0.707106781186547524401 * t82;
+  const T t84 = t46 + t55;
+  const T t85 = t47 - t54;
+  const T t86 = t46 - t55;
+  const T t87 = t47 + t54;
+  const T t88 = t77 + t81;
+  const T t89 = t79 - t83;
+  const T t90 = t77 - t81;
+  const T t91 = t79 + t83;
+  const T t92 = t84 + t88;
+  const T t93 = t85 + t89;
+  p.StC(re + s, im + s, t92, t93);
+  const T t94 = t84 - t88;
+  const T t95 = t85 - t89;
+  p.StC(re + 5 * s, im + 5 * s, t94, t95);
+  const T t96 = t86 + t91;
+  const T t97 = t87 - t90;
+  p.StC(re + 3 * s, im + 3 * s, t96, t97);
+  const T t98 = t86 - t91;
+  const T t99 = t87 + t90;
+  p.StC(re + 7 * s, im + 7 * s, t98, t99);
+}
+
+template <class P>
+FFTK_BODY void RealDft08(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t4 = p.Ld(x + 4 * is);
+  const T t8 = t0 + t4;
+  const T t9 = t0 - t4;
+  const T t1 = p.Ld(x + is);
+  const T t5 = p.Ld(x + 5 * is);
+  const T t10 = t1 + t5;
+  const T t11 = t1 - t5;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t6 = p.Ld(x + 6 * is);
+  const T t12 = t2 + t6;
+  const T t13 = t2 - t6;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t7 = p.Ld(x + 7 * is);
+  const T t14 = t3 + t7;
+  const T t15 = t3 - t7;
+  const T t16 = t8 + t12;
+  const T t17 = t8 - t12;
+  p.St(y + 2 * os, t17);
+  const T t18 = t10 + t14;
+  const T t19 = t10 - t14;
+  p.St(y + 6 * os, -t19);
+  const T t20 = t16 + t18;
+  p.St(y, t20);
+  const T t21 = t16 - t18;
+  p.St(y + 4 * os, t21);
+  const T t22 = 0.707106781186547524401 * t11;
+  const T t23 = 0.707106781186547524401 * t11;
+  const T t24 = 0.707106781186547524401 * t15;
+  const T t25 = 0.707106781186547524401 * t15;
+  const T t26 = t22 - t24;
+  const T t27 = t23 + t25;
+  const T t28 = t22 + t24;
+  const T t29 = t25 - t23;
+  const T t30 = t9 + t26;
+  p.St(y + os, t30);
+  const T t31 = t13 + t27;
+  p.St(y + 7 * os, -t31);
+  const T t34 = t9 + t29;
+  p.St(y + 3 * os, t34);
+  const T t35 = t13 - t28;
+  p.St(y + 5 * os, t35);
+}
+
+template <class P>
+FFTK_BODY void RealTw08(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = p.Ld(a + 5 * s);
+  const T t27 = p.LdB(b + 5 * s);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  const T t32 = p.Ld(a + 6 * s);
+  const T t33 = p.LdB(b + 6 * s);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = p.Ld(a + 7 * s);
+  const T t39 = p.LdB(b + 7 * s);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  const T t0 = p.Ld(a);
+  const T t44 = t0 + t24;
+  const T t1 = p.LdB(b);
+  const T t45 = t1 + t25;
+  const T t46 = t0 - t24;
+  const T t47 = t1 - t25;
+  const T t48 = t6 + t30;
+  const T t49 = t7 + t31;
+  const T t50 = t6 - t30;
+  const T t51 = t7 - t31;
+  const T t52 = t12 + t36;
+  const T t53 = t13 + t37;
+  const T t54 = t12 - t36;
+  const T t55 = t13 - t37;
+  const T t56 = t18 + t42;
+  const T t57 = t19 + t43;
+  const T t58 = t18 - t42;
+  const T t59 = t19 - t43;
+  const T t60 = t44 + t52;
+  const T t61 = t45 + t53;
+  const T t62 = t44 - t52;
+  const T t63 = t45 - t53;
+  const T t64 = t48 + t56;
+  const T t65 = t49 + t57;
+  const T t66 = t48 - t56;
+  const T t67 = t49 - t57;
+  const T t68 = t60 + t64;
+  p.St(a, t68);
+  const T t69 = t61 + t65;
+  p.StB(b + 7 * s, t69);
+  const T t70 = t60 - t64;
+  p.StB(b + 3 * s, t70);
+  const T t71 = t61 - t65;
+  p.St(a + 4 * s, -t71);
+  const T t72 = t62 + t67;
+  p.St(a + 2 * s, t72);
+  const T t73 = t63 - t66;
+  p.StB(b + 5 * s, t73);
+  const T t74 = t62 - t67;
+  p.StB(b + s, t74);
+  const T t75 = t63 + t66;
+  p.St(a + 6 * s, -t75);
+  const T t76 = t50 + t51;
+  const T t77 = 0.707106781186547524401 * t76;
+  const T t78 = t51 - t50;
+  const T t79 = 0.707106781186547524401 * t78;
+  const T t80 = t59 - t58;
+  const T t81 = 0.707106781186547524401 * t80;
+  const T t82 = t58 + t59;
+  const T t83 = 0.707106781186547524401 * t82;
+  const T t84 = t46 + t55;
+  const T t85 = t47 - t54;
+  const T t86 = t46 - t55;
+  const T t87 = t47 + t54;
+  const T t88 = t77 + t81;
+  const T t89 = t79 - t83;
+  const T t90 = t77 - t81;
+  const T t91 = t79 + t83;
+  const T t92 = t84 + t88;
+  p.St(a + s, t92);
+  const T t93 = t85 + t89;
+  p.StB(b + 6 * s, t93);
+  const T t94 = t84 - t88;
+  p.StB(b + 2 * s, t94);
+  const T t95 = t85 - t89;
+  p.St(a + 5 * s, -t95);
+  const T t96 = t86 + t91;
+  p.St(a + 3 * s, t96);
+  const T t97 = t87 - t90;
+  p.StB(b + 4 * s, t97);
+  const T t98 = t86 - t91;
+  p.StB(b, t98);
+  const T t99 = t87 + t90;
+  p.St(a + 7 * s, -t99);
+}
+
+template <class P>
+FFTK_BODY void RealHalf08(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.923879532511286756128 * t1;
+  const T t3 = 0.382683432365089771728 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.707106781186547524401 * t4;
+  const T t6 = 0.707106781186547524401 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.382683432365089771728 * t7;
+  const T t9 = 0.923879532511286756128 * t7;
+  const T t11 = p.Ld(x + 5 * s);
+  const T t12 = 0.382683432365089771728 * t11;
+  const T t13 = 0.923879532511286756128 * t11;
+  const T t14 = p.Ld(x + 6 * s);
+  const T t15 = 0.707106781186547524401 * t14;
+  const T t16 = 0.707106781186547524401 * t14;
+  const T t17 = p.Ld(x + 7 * s);
+  const T t18 = 0.923879532511286756128 * t17;
+  const T t19 = 0.382683432365089771728 * t17;
+  const T t20 = t2 - t12;
+  const T t21 = t3 + t13;
+  const T t22 = t2 + t12;
+  const T t23 = t13 - t3;
+  const T t24 = t5 - t15;
+  const T t25 = t6 + t16;
+  const T t26 = t5 + t15;
+  const T t27 = t16 - t6;
+  const T t28 = t8 - t18;
+  const T t29 = t9 + t19;
+  const T t30 = t8 + t18;
+  const T t31 = t19 - t9;
+  const T t0 = p.Ld(x);
+  const T t32 = t0 + t24;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t33 = t10 + t25;
+  const T t34 = t0 - t24;
+  const T t35 = t25 - t10;
+  const T t36 = t20 + t28;
+  const T t37 = t21 + t29;
+  const T t38 = t20 - t28;
+  const T t39 = t29 - t21;
+  const T t40 = t32 + t36;
+  p.St(x, t40);
+  const T t41 = t33 + t37;
+  p.St(x + 7 * s, -t41);
+  const T t44 = t34 + t39;
+  p.St(x + 2 * s, t44);
+  const T t45 = t35 - t38;
+  p.St(x + 5 * s, t45);
+  const T t48 = t22 + t23;
+  const T t49 = 0.707106781186547524401 * t48;
+  const T t50 = t23 - t22;
+  const T t51 = 0.707106781186547524401 * t50;
+  const T t52 = t31 - t30;
+  const T t53 = 0.707106781186547524401 * t52;
+  const T t54 = t30 + t31;
+  const T t55 = 0.707106781186547524401 * t54;
+  const T t56 = t0 + t27;
+  const T t57 = t10 - t26;
+  const T t58 = t0 - t27;
+  const T t59 = t10 + t26;
+  const T t60 = t49 + t53;
+  const T t61 = t51 - t55;
+  const T t62 = t49 - t53;
+  const T t63 = t51 + t55;
+  const T t64 = t56 + t60;
+  p.St(x + s, t64);
+  const T t65 = t57 + t61;
+  p.St(x + 6 * s, t65);
+  const T t68 = t58 + t63;
+  p.St(x + 3 * s, t68);
+  const T t69 = t59 - t62;
+  p.St(x + 4 * s, t69);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 8 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft08(p, inRe + t * is, inIm + t * is, ls, outRe + t * 8 * os, outIm + t * 8 * os, os);
+  } else {
+    const Lane4Access p{is, 8 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft08(p, inRe + t * is, inIm + t * is, ls, outRe + t * 8 * os, outIm + t * 8 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw08(Interleaved4FirstAccess{os, os, 0, 7}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 7};
+    for (; k + 3 < m; k += 4) DftTw08(p, re + k * os, im + k * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
+  } else {
+    DftTw08(Lane4FirstAccess{os, os, 0, 7}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 7};
+    for (; k + 3 < m; k += 4) DftTw08(p, re + k * os, im + k * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 8 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft08(p, in + t * is, ls, out + t * 8 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 7};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw08(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf08(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 8 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft08(p, inRe + t * is, inIm + t * is, ls, outRe + t * 8 * os, outIm + t * 8 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft08(p, inRe + t * is, inIm + t * is, ls, outRe + t * 8 * os, outIm + t * 8 * os, os);
   } else {
     const LaneAccess p{is, 8 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft08(p, inRe + t * is, inIm + t * is, ls, outRe + t * 8 * os, outIm + t * 8 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft08(p, inRe + t * is, inIm + t * is, ls, outRe + t * 8 * os, outIm + t * 8 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft08(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 8 * os,
-          outIm + t * 8 * os, os);
-  }
+  for (; t < c; ++t) Dft08(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 8 * os, outIm + t * 8 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle08(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle08(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft08(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft08(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 7};
-    for (; k + 1 < m; k += 2) {
-      DftTw08(p, re + k * os, im + k * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
-    }
+    for (; k + 1 < m; k += 2) DftTw08(p, re + k * os, im + k * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
   } else {
     const LaneAccess p{os, os, 0, 7};
-    for (; k + 1 < m; k += 2) {
-      DftTw08(p, re + k * os, im + k * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
-    }
+    for (; k + 1 < m; k += 2) DftTw08(p, re + k * os, im + k * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
   }
-  for (; k < m; ++k) {
-    DftTw08(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 7,
-           twSin + (k - 1) * 7);
-  }
+  for (; k < m; ++k) DftTw08(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
 }
 
 FFTK_CLONES
 void FftRealLeaf08(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 8 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 8 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft08(p, in + t * is, ls, out + t * 8 * os, os);
   for (; t < c; ++t) RealDft08(ScalarAccess{}, in + t * is, ls, out + t * 8 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle08(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle08(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft08(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 7};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw08(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 7,
-            twSin + (k - 1) * 7);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw08(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 7,
-            twSin + (k - 1) * 7);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 7};
+  for (; 2 * (k + 1) < m; k += 2) RealTw08(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
+  for (; 2 * k < m; ++k) RealTw08(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 7, twSin + (k - 1) * 7);
   if (m % 2 == 0) RealHalf08(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

@@ -4,8 +4,9 @@
 // twiddled complex DFT 96, 84; real DFT 38, 31; real combining group 96, 84.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -17,8 +18,8 @@ using fftk::LaneAccess;
 using fftk::ScalarAccess;
 
 template <class P>
-inline void Dft09(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+FFTK_BODY void Dft09(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t6, t7;
   p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
@@ -130,57 +131,57 @@ inline void Dft09(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 }
 
 template <class P>
-inline void DftTw09(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+FFTK_BODY void DftTw09(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   T t26, t27;
   p.LdC(re + 5 * s, im + 5 * s, t26, t27);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   T t32, t33;
   p.LdC(re + 6 * s, im + 6 * s, t32, t33);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   T t38, t39;
   p.LdC(re + 7 * s, im + 7 * s, t38, t39);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   T t44, t45;
   p.LdC(re + 8 * s, im + 8 * s, t44, t45);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   const T t50 = t18 + t36;
   const T t51 = t19 + t37;
   const T t52 = t18 - t36;
@@ -275,7 +276,7 @@ inline void DftTw09(const P& p, double* re, double* im, ptrdiff_t s, const doubl
 }
 
 template <class P>
-inline void RealDft09(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+FFTK_BODY void RealDft09(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t3 = p.Ld(x + 3 * is);
   const T t6 = p.Ld(x + 6 * is);
@@ -343,57 +344,57 @@ inline void RealDft09(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 }
 
 template <class P>
-inline void RealTw09(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+FFTK_BODY void RealTw09(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = p.Ld(a + 5 * s);
   const T t27 = p.LdB(b + 5 * s);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   const T t32 = p.Ld(a + 6 * s);
   const T t33 = p.LdB(b + 6 * s);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = p.Ld(a + 7 * s);
   const T t39 = p.LdB(b + 7 * s);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   const T t44 = p.Ld(a + 8 * s);
   const T t45 = p.LdB(b + 8 * s);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   const T t50 = t18 + t36;
   const T t51 = t19 + t37;
   const T t52 = t18 - t36;
@@ -497,7 +498,7 @@ inline void RealTw09(const P& p, double* a, double* b, ptrdiff_t s, const double
 }
 
 template <class P>
-inline void RealHalf09(const P& p, double* x, ptrdiff_t s) {
+FFTK_BODY void RealHalf09(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
   const T t1 = p.Ld(x + s);
   const T t2 = 0.939692620785908384054 * t1;
@@ -601,75 +602,713 @@ inline void RealHalf09(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf09(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+FFTK_BODY void Dft09(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  const T t18 = t6 + t12;
+  const T t19 = t7 + t13;
+  const T t20 = t6 - t12;
+  const T t21 = t7 - t13;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  const T t22 = t0 + t18;
+  const T t23 = t1 + t19;
+  const T t24 = t22 - 1.5 * t18;
+  const T t25 = t23 - 1.5 * t19;
+  const T t26 = t24 + 0.866025403784438646764 * t21;
+  const T t27 = t25 - 0.866025403784438646764 * t20;
+  const T t28 = t24 - 0.866025403784438646764 * t21;
+  const T t29 = t25 + 0.866025403784438646764 * t20;
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
+  const T t30 = t8 + t14;
+  const T t31 = t9 + t15;
+  const T t32 = t8 - t14;
+  const T t33 = t9 - t15;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  const T t34 = t2 + t30;
+  const T t35 = t3 + t31;
+  const T t36 = t34 - 1.5 * t30;
+  const T t37 = t35 - 1.5 * t31;
+  const T t38 = t36 + 0.866025403784438646764 * t33;
+  const T t39 = t37 - 0.866025403784438646764 * t32;
+  const T t40 = t36 - 0.866025403784438646764 * t33;
+  const T t41 = t37 + 0.866025403784438646764 * t32;
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  T t16, t17;
+  p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
+  const T t42 = t10 + t16;
+  const T t43 = t11 + t17;
+  const T t44 = t10 - t16;
+  const T t45 = t11 - t17;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  const T t46 = t4 + t42;
+  const T t47 = t5 + t43;
+  const T t48 = t46 - 1.5 * t42;
+  const T t49 = t47 - 1.5 * t43;
+  const T t50 = t48 + 0.866025403784438646764 * t45;
+  const T t51 = t49 - 0.866025403784438646764 * t44;
+  const T t52 = t48 - 0.866025403784438646764 * t45;
+  const T t53 = t49 + 0.866025403784438646764 * t44;
+  const T t54 = t34 + t46;
+  const T t55 = t35 + t47;
+  const T t56 = t34 - t46;
+  const T t57 = t35 - t47;
+  const T t58 = t22 + t54;
+  const T t59 = t23 + t55;
+  p.StC(yr, yi, t58, t59);
+  const T t60 = t58 - 1.5 * t54;
+  const T t61 = t59 - 1.5 * t55;
+  const T t62 = t60 + 0.866025403784438646764 * t57;
+  const T t63 = t61 - 0.866025403784438646764 * t56;
+  p.StC(yr + 3 * os, yi + 3 * os, t62, t63);
+  const T t64 = t60 - 0.866025403784438646764 * t57;
+  const T t65 = t61 + 0.866025403784438646764 * t56;
+  p.StC(yr + 6 * os, yi + 6 * os, t64, t65);
+  const T t66 = 0.766044443118978035202 * t38 + 0.642787609686539326323 * t39;
+  const T t67 = 0.766044443118978035202 * t39 - 0.642787609686539326323 * t38;
+  const T t68 = 0.173648177666930348852 * t50 + 0.984807753012208059367 * t51;
+  const T t69 = 0.173648177666930348852 * t51 - 0.984807753012208059367 * t50;
+  const T t70 = t66 + t68;
+  const T t71 = t67 + t69;
+  const T t72 = t66 - t68;
+  const T t73 = t67 - t69;
+  const T t74 = t26 + t70;
+  const T t75 = t27 + t71;
+  p.StC(yr + os, yi + os, t74, t75);
+  const T t76 = t74 - 1.5 * t70;
+  const T t77 = t75 - 1.5 * t71;
+  const T t78 = t76 + 0.866025403784438646764 * t73;
+  const T t79 = t77 - 0.866025403784438646764 * t72;
+  p.StC(yr + 4 * os, yi + 4 * os, t78, t79);
+  const T t80 = t76 - 0.866025403784438646764 * t73;
+  const T t81 = t77 + 0.866025403784438646764 * t72;
+  p.StC(yr + 7 * os, yi + 7 * os, t80, t81);
+  const T t82 = 0.173648177666930348852 * t40 + 0.984807753012208059367 * t41;
+  const T t83 = 0.173648177666930348852 * t41 - 0.984807753012208059367 * t40;
+  const T t84 = 0.342020143325668733044 * t53 - 0.939692620785908384054 * t52;
+  const T t85 = 0.939692620785908384054 * t53 + 0.342020143325668733044 * t52;
+  const T t86 = t82 + t84;
+  const T t87 = t83 - t85;
+  const T t88 = t82 - t84;
+  const T t89 = t83 + t85;
+  const T t90 = t28 + t86;
+  const T t91 = t29 + t87;
+  p.StC(yr + 2 * os, yi + 2 * os, t90, t91);
+  const T t92 = t90 - 1.5 * t86;
+  const T t93 = t91 - 1.5 * t87;
+  const T t94 = t92 + 0.866025403784438646764 * t89;
+  const T t95 = t93 - 0.866025403784438646764 * t88;
+  p.StC(yr + 5 * os, yi + 5 * os, t94, t95);
+  const T t96 = t92 - 0.866025403784438646764 * t89;
+  const T t97 = t93 + 0.866025403784438646764 * t88;
+  p.StC(yr + 8 * os, yi + 8 * os, t96, t97);
+}
+
+template <class P>
+FFTK_BODY void DftTw09(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  T t26, t27;
+  p.LdC(re + 5 * s, im + 5 * s, t26, t27);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  T t32, t33;
+  p.LdC(re + 6 * s, im + 6 * s, t32, t33);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  T t38, t39;
+  p.LdC(re + 7 * s, im + 7 * s, t38, t39);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  T t44, t45;
+  p.LdC(re + 8 * s, im + 8 * s, t44, t45);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  const T t50 = t18 + t36;
+  const T t51 = t19 + t37;
+  const T t52 = t18 - t36;
+  const T t53 = t19 - t37;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t54 = t0 + t50;
+  const T t55 = t1 + t51;
+  const T t56 = t54 - 1.5 * t50;
+  const T t57 = t55 - 1.5 * t51;
+  const T t58 = t56 + 0.866025403784438646764 * t53;
+  const T t59 = t57 - 0.866025403784438646764 * t52;
+  const T t60 = t56 - 0.866025403784438646764 * t53;
+  const T t61 = t57 + 0.866025403784438646764 * t52;
+  const T t62 = t24 + t42;
+  const T t63 = t25 + t43;
+  const T t64 = t24 - t42;
+  const T t65 = t25 - t43;
+  const T t66 = t6 + t62;
+  const T t67 = t7 + t63;
+  const T t68 = t66 - 1.5 * t62;
+  const T t69 = t67 - 1.5 * t63;
+  const T t70 = t68 + 0.866025403784438646764 * t65;
+  const T t71 = t69 - 0.866025403784438646764 * t64;
+  const T t72 = t68 - 0.866025403784438646764 * t65;
+  const T t73 = t69 + 0.866025403784438646764 * t64;
+  const T t74 = t30 + t48;
+  const T t75 = t31 + t49;
+  const T t76 = t30 - t48;
+  const T t77 = t31 - t49;
+  const T t78 = t12 + t74;
+  const T t79 = t13 + t75;
+  const T t80 = t78 - 1.5 * t74;
+  const T t81 = t79 - 1.5 * t75;
+  const T t82 = t80 + 0.866025403784438646764 * t77;
+  const T t83 = t81 - 0.866025403784438646764 * t76;
+  const T t84 = t80 - 0.866025403784438646764 * t77;
+  const T t85 = t81 + 0.866025403784438646764 * t76;
+  const T t86 = t66 + t78;
+  const T t87 = t67 + t79;
+  const T t88 = t66 - t78;
+  const T t89 = t67 - t79;
+  const T t90 = t54 + t86;
+  const T t91 = t55 + t87;
+  p.StC(re, im, t90, t91);
+  const T t92 = t90 - 1.5 * t86;
+  const T t93 = t91 - 1.5 * t87;
+  const T t94 = t92 + 0.866025403784438646764 * t89;
+  const T t95 = t93 - 0.866025403784438646764 * t88;
+  p.StC(re + 3 * s, im + 3 * s, t94, t95);
+  const T t96 = t92 - 0.866025403784438646764 * t89;
+  const T t97 = t93 + 0.866025403784438646764 * t88;
+  p.StC(re + 6 * s, im + 6 * s, t96, t97);
+  const T t98 = 0.766044443118978035202 * t70 + 0.642787609686539326323 * t71;
+  const T t99 = 0.766044443118978035202 * t71 - 0.642787609686539326323 * t70;
+  const T t100 = 0.173648177666930348852 * t82 + 0.984807753012208059367 * t83;
+  const T t101 = 0.173648177666930348852 * t83 - 0.984807753012208059367 * t82;
+  const T t102 = t98 + t100;
+  const T t103 = t99 + t101;
+  const T t104 = t98 - t100;
+  const T t105 = t99 - t101;
+  const T t106 = t58 + t102;
+  const T t107 = t59 + t103;
+  p.StC(re + s, im + s, t106, t107);
+  const T t108 = t106 - 1.5 * t102;
+  const T t109 = t107 - 1.5 * t103;
+  const T t110 = t108 + 0.866025403784438646764 * t105;
+  const T t111 = t109 - 0.866025403784438646764 * t104;
+  p.StC(re + 4 * s, im + 4 * s, t110, t111);
+  const T t112 = t108 - 0.866025403784438646764 * t105;
+  const T t113 = t109 + 0.866025403784438646764 * t104;
+  p.StC(re + 7 * s, im + 7 * s, t112, t113);
+  const T t114 = 0.173648177666930348852 * t72 + 0.984807753012208059367 * t73;
+  const T t115 = 0.173648177666930348852 * t73 - 0.984807753012208059367 * t72;
+  const T t116 = 0.342020143325668733044 * t85 - 0.939692620785908384054 * t84;
+  const T t117 = 0.939692620785908384054 * t85 + 0.342020143325668733044 * t84;
+  const T t118 = t114 + t116;
+  const T t119 = t115 - t117;
+  const T t120 = t114 - t116;
+  const T t121 = t115 + t117;
+  const T t122 = t60 + t118;
+  const T t123 = t61 + t119;
+  p.StC(re + 2 * s, im + 2 * s, t122, t123);
+  const T t124 = t122 - 1.5 * t118;
+  const T t125 = t123 - 1.5 * t119;
+  const T t126 = t124 + 0.866025403784438646764 * t121;
+  const T t127 = t125 - 0.866025403784438646764 * t120;
+  p.StC(re + 5 * s, im + 5 * s, t126, t127);
+  const T t128 = t124 - 0.866025403784438646764 * t121;
+  const T t129 = t125 + 0.866025403784438646764 * t120;
+  p.StC(re + 8 * s, im + 8 * s, t128, t129);
+}
+
+template <class P>
+FFTK_BODY void RealDft09(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t6 = p.Ld(x + 6 * is);
+  const T t9 = t3 + t6;
+  const T t10 = t3 - t6;
+  const T t0 = p.Ld(x);
+  const T t11 = t0 + t9;
+  const T t12 = t11 - 1.5 * t9;
+  const T t13 = 0.866025403784438646764 * t10;
+  const T t14 = 0.866025403784438646764 * t10;
+  const T t4 = p.Ld(x + 4 * is);
+  const T t7 = p.Ld(x + 7 * is);
+  const T t15 = t4 + t7;
+  const T t16 = t4 - t7;
+  const T t1 = p.Ld(x + is);
+  const T t17 = t1 + t15;
+  const T t18 = t17 - 1.5 * t15;
+  const T t19 = 0.866025403784438646764 * t16;
+  const T t20 = 0.866025403784438646764 * t16;
+  const T t5 = p.Ld(x + 5 * is);
+  const T t8 = p.Ld(x + 8 * is);
+  const T t21 = t5 + t8;
+  const T t22 = t5 - t8;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t23 = t2 + t21;
+  const T t24 = t23 - 1.5 * t21;
+  const T t25 = 0.866025403784438646764 * t22;
+  const T t26 = 0.866025403784438646764 * t22;
+  const T t27 = t17 + t23;
+  const T t28 = t17 - t23;
+  const T t29 = t11 + t27;
+  p.St(y, t29);
+  const T t30 = t29 - 1.5 * t27;
+  p.St(y + 3 * os, t30);
+  const T t31 = 0.866025403784438646764 * t28;
+  p.St(y + 6 * os, -t31);
+  const T t33 = 0.766044443118978035202 * t18 - 0.642787609686539326323 * t19;
+  const T t34 = 0.766044443118978035202 * t19 + 0.642787609686539326323 * t18;
+  const T t35 = 0.173648177666930348852 * t24 - 0.984807753012208059367 * t25;
+  const T t36 = 0.173648177666930348852 * t25 + 0.984807753012208059367 * t24;
+  const T t37 = t33 + t35;
+  const T t38 = t34 + t36;
+  const T t39 = t33 - t35;
+  const T t40 = t36 - t34;
+  const T t41 = t12 + t37;
+  p.St(y + os, t41);
+  const T t42 = t13 + t38;
+  p.St(y + 8 * os, -t42);
+  const T t43 = t41 - 1.5 * t37;
+  const T t44 = 1.5 * t38 - t42;
+  const T t45 = t43 + 0.866025403784438646764 * t40;
+  p.St(y + 4 * os, t45);
+  const T t46 = t44 - 0.866025403784438646764 * t39;
+  p.St(y + 5 * os, t46);
+  const T t49 = 0.173648177666930348852 * t18 + 0.984807753012208059367 * t20;
+  const T t50 = 0.173648177666930348852 * t20 - 0.984807753012208059367 * t18;
+  const T t51 = 0.342020143325668733044 * t26 - 0.939692620785908384054 * t24;
+  const T t52 = 0.939692620785908384054 * t26 + 0.342020143325668733044 * t24;
+  const T t53 = t49 + t51;
+  const T t54 = t50 - t52;
+  const T t57 = t12 + t53;
+  p.St(y + 2 * os, t57);
+  const T t58 = t14 + t54;
+  p.St(y + 7 * os, t58);
+}
+
+template <class P>
+FFTK_BODY void RealTw09(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = p.Ld(a + 5 * s);
+  const T t27 = p.LdB(b + 5 * s);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  const T t32 = p.Ld(a + 6 * s);
+  const T t33 = p.LdB(b + 6 * s);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = p.Ld(a + 7 * s);
+  const T t39 = p.LdB(b + 7 * s);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  const T t44 = p.Ld(a + 8 * s);
+  const T t45 = p.LdB(b + 8 * s);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  const T t50 = t18 + t36;
+  const T t51 = t19 + t37;
+  const T t52 = t18 - t36;
+  const T t53 = t19 - t37;
+  const T t0 = p.Ld(a);
+  const T t54 = t0 + t50;
+  const T t1 = p.LdB(b);
+  const T t55 = t1 + t51;
+  const T t56 = t54 - 1.5 * t50;
+  const T t57 = t55 - 1.5 * t51;
+  const T t58 = t56 + 0.866025403784438646764 * t53;
+  const T t59 = t57 - 0.866025403784438646764 * t52;
+  const T t60 = t56 - 0.866025403784438646764 * t53;
+  const T t61 = t57 + 0.866025403784438646764 * t52;
+  const T t62 = t24 + t42;
+  const T t63 = t25 + t43;
+  const T t64 = t24 - t42;
+  const T t65 = t25 - t43;
+  const T t66 = t6 + t62;
+  const T t67 = t7 + t63;
+  const T t68 = t66 - 1.5 * t62;
+  const T t69 = t67 - 1.5 * t63;
+  const T t70 = t68 + 0.866025403784438646764 * t65;
+  const T t71 = t69 - 0.866025403784438646764 * t64;
+  const T t72 = t68 - 0.866025403784438646764 * t65;
+  const T t73 = t69 + 0.866025403784438646764 * t64;
+  const T t74 = t30 + t48;
+  const T t75 = t31 + t49;
+  const T t76 = t30 - t48;
+  const T t77 = t31 - t49;
+  const T t78 = t12 + t74;
+  const T t79 = t13 + t75;
+  const T t80 = t78 - 1.5 * t74;
+  const T t81 = t79 - 1.5 * t75;
+  const T t82 = t80 + 0.866025403784438646764 * t77;
+  const T t83 = t81 - 0.866025403784438646764 * t76;
+  const T t84 = t80 - 0.866025403784438646764 * t77;
+  const T t85 = t81 + 0.866025403784438646764 * t76;
+  const T t86 = t66 + t78;
+  const T t87 = t67 + t79;
+  const T t88 = t66 - t78;
+  const T t89 = t67 - t79;
+  const T t90 = t54 + t86;
+  p.St(a, t90);
+  const T t91 = t55 + t87;
+  p.StB(b + 8 * s, t91);
+  const T t92 = t90 - 1.5 * t86;
+  const T t93 = t91 - 1.5 * t87;
+  const T t94 = t92 + 0.866025403784438646764 * t89;
+  p.St(a + 3 * s, t94);
+  const T t95 = t93 - 0.866025403784438646764 * t88;
+  p.StB(b + 5 * s, t95);
+  const T t96 = t92 - 0.866025403784438646764 * t89;
+  p.StB(b + 2 * s, t96);
+  const T t97 = t93 + 0.866025403784438646764 * t88;
+  p.St(a + 6 * s, -t97);
+  const T t98 = 0.766044443118978035202 * t70 + 0.642787609686539326323 * t71;
+  const T t99 = 0.766044443118978035202 * t71 - 0.642787609686539326323 * t70;
+  const T t100 = 0.173648177666930348852 * t82 + 0.984807753012208059367 * t83;
+  const T t101 = 0.173648177666930348852 * t83 - 0.984807753012208059367 * t82;
+  const T t102 = t98 + t100;
+  const T t103 = t99 + t101;
+  const T t104 = t98 - t100;
+  const T t105 = t99 - t101;
+  const T t106 = t58 + t102;
+  p.St(a + s, t106);
+  const T t107 = t59 + t103;
+  p.StB(b + 7 * s, t107);
+  const T t108 = t106 - 1.5 * t102;
+  const T t109 = t107 - 1.5 * t103;
+  const T t110 = t108 + 0.866025403784438646764 * t105;
+  p.St(a + 4 * s, t110);
+  const T t111 = t109 - 0.866025403784438646764 * t104;
+  p.StB(b + 4 * s, t111);
+  const T t112 = t108 - 0.866025403784438646764 * t105;
+  p.StB(b + s, t112);
+  const T t113 = t109 + 0.866025403784438646764 * t104;
+  p.St(a + 7 * s, -t113);
+  const T t114 = 0.173648177666930348852 * t72 + 0.984807753012208059367 * t73;
+  const T t115 = 0.173648177666930348852 * t73 - 0.984807753012208059367 * t72;
+  const T t116 = 0.342020143325668733044 * t85 - 0.939692620785908384054 * t84;
+  const T t117 = 0.939692620785908384054 * t85 + 0.342020143325668733044 * t84;
+  const T t118 = t114 + t116;
+  const T t119 = t115 - t117;
+  const T t120 = t114 - t116;
+  const T t121 = t115 + t117;
+  const T t122 = t60 + t118;
+  p.St(a + 2 * s, t122);
+  const T t123 = t61 + t119;
+  p.StB(b + 6 * s, t123);
+  const T t124 = t122 - 1.5 * t118;
+  const T t125 = t123 - 1.5 * t119;
+  const T t126 = t124 + 0.866025403784438646764 * t121;
+  p.StB(b + 3 * s, t126);
+  const T t127 = t125 - 0.866025403784438646764 * t120;
+  p.St(a + 5 * s, -t127);
+  const T t128 = t124 - 0.866025403784438646764 * t121;
+  p.StB(b, t128);
+  const T t129 = t125 + 0.866025403784438646764 * t120;
+  p.St(a + 8 * s, -t129);
+}
+
+template <class P>
+FFTK_BODY void RealHalf09(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.939692620785908384054 * t1;
+  const T t3 = 0.342020143325668733044 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.766044443118978035202 * t4;
+  const T t6 = 0.642787609686539326323 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.5 * t7;
+  const T t9 = 0.866025403784438646764 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.173648177666930348852 * t10;
+  const T t12 = 0.984807753012208059367 * t10;
+  const T t13 = p.Ld(x + 5 * s);
+  const T t14 = 0.173648177666930348852 * t13;
+  const T t15 = 0.984807753012208059367 * t13;
+  const T t16 = p.Ld(x + 6 * s);
+  const T t17 = 0.5 * t16;
+  const T t18 = 0.866025403784438646764 * t16;
+  const T t19 = p.Ld(x + 7 * s);
+  const T t20 = 0.766044443118978035202 * t19;
+  const T t21 = 0.642787609686539326323 * t19;
+  const T t22 = p.Ld(x + 8 * s);
+  const T t23 = 0.939692620785908384054 * t22;
+  const T t24 = 0.342020143325668733044 * t22;
+  const T t25 = t8 - t17;
+  const T t26 = t9 + t18;
+  const T t27 = t8 + t17;
+  const T t28 = t18 - t9;
+  const T t0 = p.Ld(x);
+  const T t29 = t0 + t25;
+  const T t30 = t29 - 1.5 * t25;
+  const T t31 = 1.5 * t26 - t26;
+  const T t32 = t30 + 0.866025403784438646764 * t28;
+  const T t33 = t31 - 0.866025403784438646764 * t27;
+  const T t34 = t30 - 0.866025403784438646764 * t28;
+  const T t35 = t31 + 0.866025403784438646764 * t27;
+  const T t36 = t11 - t20;
+  const T t37 = t12 + t21;
+  const T t38 = t11 + t20;
+  const T t39 = t21 - t12;
+  const T t40 = t2 + t36;
+  const T t41 = t3 + t37;
+  const T t42 = t40 - 1.5 * t36;
+  const T t43 = 1.5 * t37 - t41;
+  const T t44 = t42 + 0.866025403784438646764 * t39;
+  const T t45 = t43 - 0.866025403784438646764 * t38;
+  const T t46 = t42 - 0.866025403784438646764 * t39;
+  const T t47 = t43 + 0.866025403784438646764 * t38;
+  const T t48 = t14 + t23;
+  const T t49 = t15 + t24;
+  const T t50 = t23 - t14;
+  const T t51 = t24 - t15;
+  const T t52 = t5 - t48;
+  const T t53 = t6 + t49;
+  const T t54 = t52 + 1.5 * t48;
+  const T t55 = 1.5 * t49 - t53;
+  const T t56 = t54 + 0.866025403784438646764 * t51;
+  const T t57 = t55 - 0.866025403784438646764 * t50;
+  const T t58 = t54 - 0.866025403784438646764 * t51;
+  const T t59 = t55 + 0.866025403784438646764 * t50;
+  const T t60 = t40 + t52;
+  const T t61 = t41 + t53;
+  const T t62 = t40 - t52;
+  const T t63 = t53 - t41;
+  const T t64 = t29 + t60;
+  p.St(x, t64);
+  const T t65 = t26 + t61;
+  p.St(x + 8 * s, -t65);
+  const T t66 = t64 - 1.5 * t60;
+  const T t67 = 1.5 * t61 - t65;
+  const T t68 = t66 + 0.866025403784438646764 * t63;
+  p.St(x + 3 * s, t68);
+  const T t69 = t67 - 0.866025403784438646764 * t62;
+  p.St(x + 5 * s, t69);
+  const T t72 = 0.766044443118978035202 * t44 + 0.642787609686539326323 * t45;
+  const T t73 = 0.766044443118978035202 * t45 - 0.642787609686539326323 * t44;
+  const T t74 = 0.173648177666930348852 * t56 + 0.984807753012208059367 * t57;
+  const T t75 = 0.173648177666930348852 * t57 - 0.984807753012208059367 * t56;
+  const T t76 = t72 + t74;
+  const T t77 = t73 + t75;
+  const T t79 = t73 - t75;
+  const T t80 = t32 + t76;
+  p.St(x + s, t80);
+  const T t81 = t33 + t77;
+  p.St(x + 7 * s, t81);
+  const T t82 = t80 - 1.5 * t76;
+  const T t84 = t82 + 0.866025403784438646764 * t79;
+  p.St(x + 4 * s, t84);
+  const T t88 = 0.173648177666930348852 * t46 + 0.984807753012208059367 * t47;
+  const T t89 = 0.173648177666930348852 * t47 - 0.984807753012208059367 * t46;
+  const T t90 = 0.342020143325668733044 * t59 - 0.939692620785908384054 * t58;
+  const T t91 = 0.939692620785908384054 * t59 + 0.342020143325668733044 * t58;
+  const T t92 = t88 + t90;
+  const T t93 = t89 - t91;
+  const T t96 = t34 + t92;
+  p.St(x + 2 * s, t96);
+  const T t97 = t35 + t93;
+  p.St(x + 6 * s, t97);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 9 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft09(p, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
+  } else {
+    const Lane4Access p{is, 9 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft09(p, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw09(Interleaved4FirstAccess{os, os, 0, 8}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 8};
+    for (; k + 3 < m; k += 4) DftTw09(p, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
+  } else {
+    DftTw09(Lane4FirstAccess{os, os, 0, 8}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 8};
+    for (; k + 3 < m; k += 4) DftTw09(p, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 9 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft09(p, in + t * is, ls, out + t * 9 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 8};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw09(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf09(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 9 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft09(p, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft09(p, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
   } else {
     const LaneAccess p{is, 9 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft09(p, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft09(p, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft09(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os,
-          outIm + t * 9 * os, os);
-  }
+  for (; t < c; ++t) Dft09(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle09(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle09(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft09(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft09(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 8};
-    for (; k + 1 < m; k += 2) {
-      DftTw09(p, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
-    }
+    for (; k + 1 < m; k += 2) DftTw09(p, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
   } else {
     const LaneAccess p{os, os, 0, 8};
-    for (; k + 1 < m; k += 2) {
-      DftTw09(p, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
-    }
+    for (; k + 1 < m; k += 2) DftTw09(p, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
   }
-  for (; k < m; ++k) {
-    DftTw09(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 8,
-           twSin + (k - 1) * 8);
-  }
+  for (; k < m; ++k) DftTw09(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
 }
 
 FFTK_CLONES
 void FftRealLeaf09(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 9 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 9 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft09(p, in + t * is, ls, out + t * 9 * os, os);
   for (; t < c; ++t) RealDft09(ScalarAccess{}, in + t * is, ls, out + t * 9 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle09(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle09(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft09(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 8};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw09(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 8,
-            twSin + (k - 1) * 8);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw09(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 8,
-            twSin + (k - 1) * 8);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 8};
+  for (; 2 * (k + 1) < m; k += 2) RealTw09(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
+  for (; 2 * k < m; ++k) RealTw09(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
   if (m % 2 == 0) RealHalf09(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

@@ -4,8 +4,9 @@
 // twiddled complex DFT 160, 140; real DFT 60, 50; real combining group 160, 140.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -17,8 +18,8 @@ using fftk::LaneAccess;
 using fftk::ScalarAccess;
 
 template <class P>
-inline void Dft11(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+FFTK_BODY void Dft11(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(xr + is, xi + is, t2, t3);
@@ -118,69 +119,69 @@ inline void Dft11(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 }
 
 template <class P>
-inline void DftTw11(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+FFTK_BODY void DftTw11(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   T t26, t27;
   p.LdC(re + 5 * s, im + 5 * s, t26, t27);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   T t32, t33;
   p.LdC(re + 6 * s, im + 6 * s, t32, t33);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   T t38, t39;
   p.LdC(re + 7 * s, im + 7 * s, t38, t39);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   T t44, t45;
   p.LdC(re + 8 * s, im + 8 * s, t44, t45);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   T t50, t51;
   p.LdC(re + 9 * s, im + 9 * s, t50, t51);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   T t56, t57;
   p.LdC(re + 10 * s, im + 10 * s, t56, t57);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   const T t62 = t6 + t60;
   const T t63 = t7 + t61;
   const T t64 = t12 + t54;
@@ -259,7 +260,7 @@ inline void DftTw11(const P& p, double* re, double* im, ptrdiff_t s, const doubl
 }
 
 template <class P>
-inline void RealDft11(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+FFTK_BODY void RealDft11(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t1 = p.Ld(x + is);
   const T t10 = p.Ld(x + 10 * is);
@@ -307,69 +308,69 @@ inline void RealDft11(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 }
 
 template <class P>
-inline void RealTw11(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+FFTK_BODY void RealTw11(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = p.Ld(a + 5 * s);
   const T t27 = p.LdB(b + 5 * s);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   const T t32 = p.Ld(a + 6 * s);
   const T t33 = p.LdB(b + 6 * s);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = p.Ld(a + 7 * s);
   const T t39 = p.LdB(b + 7 * s);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   const T t44 = p.Ld(a + 8 * s);
   const T t45 = p.LdB(b + 8 * s);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   const T t50 = p.Ld(a + 9 * s);
   const T t51 = p.LdB(b + 9 * s);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   const T t56 = p.Ld(a + 10 * s);
   const T t57 = p.LdB(b + 10 * s);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   const T t62 = t6 + t60;
   const T t63 = t7 + t61;
   const T t64 = t12 + t54;
@@ -459,7 +460,7 @@ inline void RealTw11(const P& p, double* a, double* b, ptrdiff_t s, const double
 }
 
 template <class P>
-inline void RealHalf11(const P& p, double* x, ptrdiff_t s) {
+FFTK_BODY void RealHalf11(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
   const T t1 = p.Ld(x + s);
   const T t2 = 0.95949297361449738989 * t1;
@@ -556,75 +557,668 @@ inline void RealHalf11(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf11(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+FFTK_BODY void Dft11(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t20, t21;
+  p.LdC(xr + 10 * is, xi + 10 * is, t20, t21);
+  const T t22 = t2 + t20;
+  const T t23 = t3 + t21;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t18, t19;
+  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
+  const T t24 = t4 + t18;
+  const T t25 = t5 + t19;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t16, t17;
+  p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
+  const T t26 = t6 + t16;
+  const T t27 = t7 + t17;
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
+  const T t28 = t8 + t14;
+  const T t29 = t9 + t15;
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  const T t30 = t10 + t12;
+  const T t31 = t11 + t13;
+  const T t32 = t2 - t20;
+  const T t33 = t3 - t21;
+  const T t34 = t4 - t18;
+  const T t35 = t5 - t19;
+  const T t36 = t6 - t16;
+  const T t37 = t7 - t17;
+  const T t38 = t8 - t14;
+  const T t39 = t9 - t15;
+  const T t40 = t10 - t12;
+  const T t41 = t11 - t13;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  const T t42 = t0 + t22 + t24 + t26 + t28 + t30;
+  const T t43 = t1 + t23 + t25 + t27 + t29 + t31;
+  p.StC(yr, yi, t42, t43);
+  const T t44 = t0 + 0.841253532831181168862 * t22 + 0.415415013001886425529 * t24 - 0.142314838273285140444 * t26 - 0.654860733945285064057 * t28 - 0.95949297361449738989 * t30;
+  const T t45 = t1 + 0.841253532831181168862 * t23 + 0.415415013001886425529 * t25 - 0.142314838273285140444 * t27 - 0.654860733945285064057 * t29 - 0.95949297361449738989 * t31;
+  const T t46 = 0.540640817455597582108 * t33 + 0.909631995354518371412 * t35 + 0.989821441880932732376 * t37 + 0.755749574354258283774 * t39 + 0.281732556841429697711 * t41;
+  const T t47 = 0.540640817455597582108 * t32 + 0.909631995354518371412 * t34 + 0.989821441880932732376 * t36 + 0.755749574354258283774 * t38 + 0.281732556841429697711 * t40;
+  const T t48 = t44 + t46;
+  const T t49 = t45 - t47;
+  p.StC(yr + os, yi + os, t48, t49);
+  const T t50 = t44 - t46;
+  const T t51 = t45 + t47;
+  p.StC(yr + 10 * os, yi + 10 * os, t50, t51);
+  const T t52 = t0 + 0.415415013001886425529 * t22 - 0.654860733945285064057 * t24 - 0.95949297361449738989 * t26 - 0.142314838273285140444 * t28 + 0.841253532831181168862 * t30;
+  const T t53 = t1 + 0.415415013001886425529 * t23 - 0.654860733945285064057 * t25 - 0.95949297361449738989 * t27 - 0.142314838273285140444 * t29 + 0.841253532831181168862 * t31;
+  const T t54 = 0.909631995354518371412 * t33 + 0.755749574354258283774 * t35 - 0.281732556841429697711 * t37 - 0.989821441880932732376 * t39 - 0.540640817455597582108 * t41;
+  const T t55 = 0.909631995354518371412 * t32 + 0.755749574354258283774 * t34 - 0.281732556841429697711 * t36 - 0.989821441880932732376 * t38 - 0.540640817455597582108 * t40;
+  const T t56 = t52 + t54;
+  const T t57 = t53 - t55;
+  p.StC(yr + 2 * os, yi + 2 * os, t56, t57);
+  const T t58 = t52 - t54;
+  const T t59 = t53 + t55;
+  p.StC(yr + 9 * os, yi + 9 * os, t58, t59);
+  const T t60 = t0 - 0.142314838273285140444 * t22 - 0.95949297361449738989 * t24 + 0.415415013001886425529 * t26 + 0.841253532831181168862 * t28 - 0.654860733945285064057 * t30;
+  const T t61 = t1 - 0.142314838273285140444 * t23 - 0.95949297361449738989 * t25 + 0.415415013001886425529 * t27 + 0.841253532831181168862 * t29 - 0.654860733945285064057 * t31;
+  const T t62 = 0.989821441880932732376 * t33 - 0.281732556841429697711 * t35 - 0.909631995354518371412 * t37 + 0.540640817455597582108 * t39 + 0.755749574354258283774 * t41;
+  const T t63 = 0.989821441880932732376 * t32 - 0.281732556841429697711 * t34 - 0.909631995354518371412 * t36 + 0.540640817455597582108 * t38 + 0.755749574354258283774 * t40;
+  const T t64 = t60 + t62;
+  const T t65 = t61 - t63;
+  p.StC(yr + 3 * os, yi + 3 * os, t64, t65);
+  const T t66 = t60 - t62;
+  const T t67 = t61 + t63;
+  p.StC(yr + 8 * os, yi + 8 * os, t66, t67);
+  const T t68 = t0 - 0.654860733945285064057 * t22 - 0.142314838273285140444 * t24 + 0.841253532831181168862 * t26 - 0.95949297361449738989 * t28 + 0.415415013001886425529 * t30;
+  const T t69 = t1 - 0.654860733945285064057 * t23 - 0.142314838273285140444 * t25 + 0.841253532831181168862 * t27 - 0.95949297361449738989 * t29 + 0.415415013001886425529 * t31;
+  const T t70 = 0.755749574354258283774 * t33 - 0.989821441880932732376 * t35 + 0.540640817455597582108 * t37 + 0.281732556841429697711 * t39 - 0.909631995354518371412 * t41;
+  const T t71 = 0.755749574354258283774 * t32 - 0.989821441880932732376 * t34 + 0.540640817455597582108 * t36 + 0.281732556841429697711 * t38 - 0.909631995354518371412 * t40;
+  const T t72 = t68 + t70;
+  const T t73 = t69 - t71;
+  p.StC(yr + 4 * os, yi + 4 * os, t72, t73);
+  const T t74 = t68 - t70;
+  const T t75 = t69 + t71;
+  p.StC(yr + 7 * os, yi + 7 * os, t74, t75);
+  const T t76 = t0 - 0.95949297361449738989 * t22 + 0.841253532831181168862 * t24 - 0.654860733945285064057 * t26 + 0.415415013001886425529 * t28 - 0.142314838273285140444 * t30;
+  const T t77 = t1 - 0.95949297361449738989 * t23 + 0.841253532831181168862 * t25 - 0.654860733945285064057 * t27 + 0.415415013001886425529 * t29 - 0.142314838273285140444 * t31;
+  const T t78 = 0.281732556841429697711 * t33 - 0.540640817455597582108 * t35 + 0.755749574354258283774 * t37 - 0.909631995354518371412 * t39 + 0.989821441880932732376 * t41;
+  const T t79 = 0.281732556841429697711 * t32 - 0.540640817455597582108 * t34 + 0.755749574354258283774 * t36 - 0.909631995354518371412 * t38 + 0.989821441880932732376 * t40;
+  const T t80 = t76 + t78;
+  const T t81 = t77 - t79;
+  p.StC(yr + 5 * os, yi + 5 * os, t80, t81);
+  const T t82 = t76 - t78;
+  const T t83 = t77 + t79;
+  p.StC(yr + 6 * os, yi + 6 * os, t82, t83);
+}
+
+template <class P>
+FFTK_BODY void DftTw11(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  T t26, t27;
+  p.LdC(re + 5 * s, im + 5 * s, t26, t27);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  T t32, t33;
+  p.LdC(re + 6 * s, im + 6 * s, t32, t33);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  T t38, t39;
+  p.LdC(re + 7 * s, im + 7 * s, t38, t39);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  T t44, t45;
+  p.LdC(re + 8 * s, im + 8 * s, t44, t45);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  T t50, t51;
+  p.LdC(re + 9 * s, im + 9 * s, t50, t51);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  T t56, t57;
+  p.LdC(re + 10 * s, im + 10 * s, t56, t57);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  const T t62 = t6 + t60;
+  const T t63 = t7 + t61;
+  const T t64 = t12 + t54;
+  const T t65 = t13 + t55;
+  const T t66 = t18 + t48;
+  const T t67 = t19 + t49;
+  const T t68 = t24 + t42;
+  const T t69 = t25 + t43;
+  const T t70 = t30 + t36;
+  const T t71 = t31 + t37;
+  const T t72 = t6 - t60;
+  const T t73 = t7 - t61;
+  const T t74 = t12 - t54;
+  const T t75 = t13 - t55;
+  const T t76 = t18 - t48;
+  const T t77 = t19 - t49;
+  const T t78 = t24 - t42;
+  const T t79 = t25 - t43;
+  const T t80 = t30 - t36;
+  const T t81 = t31 - t37;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t82 = t0 + t62 + t64 + t66 + t68 + t70;
+  const T t83 = t1 + t63 + t65 + t67 + t69 + t71;
+  p.StC(re, im, t82, t83);
+  const T t84 = t0 + 0.841253532831181168862 * t62 + 0.415415013001886425529 * t64 - 0.142314838273285140444 * t66 - 0.654860733945285064057 * t68 - 0.95949297361449738989 * t70;
+  const T t85 = t1 + 0.841253532831181168862 * t63 + 0.415415013001886425529 * t65 - 0.142314838273285140444 * t67 - 0.654860733945285064057 * t69 - 0.95949297361449738989 * t71;
+  const T t86 = 0.540640817455597582108 * t73 + 0.909631995354518371412 * t75 + 0.989821441880932732376 * t77 + 0.755749574354258283774 * t79 + 0.281732556841429697711 * t81;
+  const T t87 = 0.540640817455597582108 * t72 + 0.909631995354518371412 * t74 + 0.989821441880932732376 * t76 + 0.755749574354258283774 * t78 + 0.281732556841429697711 * t80;
+  const T t88 = t84 + t86;
+  const T t89 = t85 - t87;
+  p.StC(re + s, im + s, t88, t89);
+  const T t90 = t84 - t86;
+  const T t91 = t85 + t87;
+  p.StC(re + 10 * s, im + 10 * s, t90, t91);
+  const T t92 = t0 + 0.415415013001886425529 * t62 - 0.654860733945285064057 * t64 - 0.95949297361449738989 * t66 - 0.142314838273285140444 * t68 + 0.841253532831181168862 * t70;
+  const T t93 = t1 + 0.415415013001886425529 * t63 - 0.654860733945285064057 * t65 - 0.95949297361449738989 * t67 - 0.142314838273285140444 * t69 + 0.841253532831181168862 * t71;
+  const T t94 = 0.909631995354518371412 * t73 + 0.755749574354258283774 * t75 - 0.281732556841429697711 * t77 - 0.989821441880932732376 * t79 - 0.540640817455597582108 * t81;
+  const T t95 = 0.909631995354518371412 * t72 + 0.755749574354258283774 * t74 - 0.281732556841429697711 * t76 - 0.989821441880932732376 * t78 - 0.540640817455597582108 * t80;
+  const T t96 = t92 + t94;
+  const T t97 = t93 - t95;
+  p.StC(re + 2 * s, im + 2 * s, t96, t97);
+  const T t98 = t92 - t94;
+  const T t99 = t93 + t95;
+  p.StC(re + 9 * s, im + 9 * s, t98, t99);
+  const T t100 = t0 - 0.142314838273285140444 * t62 - 0.95949297361449738989 * t64 + 0.415415013001886425529 * t66 + 0.841253532831181168862 * t68 - 0.654860733945285064057 * t70;
+  const T t101 = t1 - 0.142314838273285140444 * t63 - 0.95949297361449738989 * t65 + 0.415415013001886425529 * t67 + 0.841253532831181168862 * t69 - 0.654860733945285064057 * t71;
+  const T t102 = 0.989821441880932732376 * t73 - 0.281732556841429697711 * t75 - 0.909631995354518371412 * t77 + 0.540640817455597582108 * t79 + 0.755749574354258283774 * t81;
+  const T t103 = 0.989821441880932732376 * t72 - 0.281732556841429697711 * t74 - 0.909631995354518371412 * t76 + 0.540640817455597582108 * t78 + 0.755749574354258283774 * t80;
+  const T t104 = t100 + t102;
+  const T t105 = t101 - t103;
+  p.StC(re + 3 * s, im + 3 * s, t104, t105);
+  const T t106 = t100 - t102;
+  const T t107 = t101 + t103;
+  p.StC(re + 8 * s, im + 8 * s, t106, t107);
+  const T t108 = t0 - 0.654860733945285064057 * t62 - 0.142314838273285140444 * t64 + 0.841253532831181168862 * t66 - 0.95949297361449738989 * t68 + 0.415415013001886425529 * t70;
+  const T t109 = t1 - 0.654860733945285064057 * t63 - 0.142314838273285140444 * t65 + 0.841253532831181168862 * t67 - 0.95949297361449738989 * t69 + 0.415415013001886425529 * t71;
+  const T t110 = 0.755749574354258283774 * t73 - 0.989821441880932732376 * t75 + 0.540640817455597582108 * t77 + 0.281732556841429697711 * t79 - 0.909631995354518371412 * t81;
+  const T t111 = 0.755749574354258283774 * t72 - 0.989821441880932732376 * t74 + 0.540640817455597582108 * t76 + 0.281732556841429697711 * t78 - 0.909631995354518371412 * t80;
+  const T t112 = t108 + t110;
+  const T t113 = t109 - t111;
+  p.StC(re + 4 * s, im + 4 * s, t112, t113);
+  const T t114 = t108 - t110;
+  const T t115 = t109 + t111;
+  p.StC(re + 7 * s, im + 7 * s, t114, t115);
+  const T t116 = t0 - 0.95949297361449738989 * t62 + 0.841253532831181168862 * t64 - 0.654860733945285064057 * t66 + 0.415415013001886425529 * t68 - 0.142314838273285140444 * t70;
+  const T t117 = t1 - 0.95949297361449738989 * t63 + 0.841253532831181168862 * t65 - 0.654860733945285064057 * t67 + 0.415415013001886425529 * t69 - 0.142314838273285140444 * t71;
+  const T t118 = 0.281732556841429697711 * t73 - 0.540640817455597582108 * t75 + 0.755749574354258283774 * t77 - 0.909631995354518371412 * t79 + 0.989821441880932732376 * t81;
+  const T t119 = 0.281732556841429697711 * t72 - 0.540640817455597582108 * t74 + 0.755749574354258283774 * t76 - 0.909631995354518371412 * t78 + 0.989821441880932732376 * t80;
+  const T t120 = t116 + t118;
+  const T t121 = t117 - t119;
+  p.StC(re + 5 * s, im + 5 * s, t120, t121);
+  const T t122 = t116 - t118;
+  const T t123 = t117 + t119;
+  p.StC(re + 6 * s, im + 6 * s, t122, t123);
+}
+
+template <class P>
+FFTK_BODY void RealDft11(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + is);
+  const T t10 = p.Ld(x + 10 * is);
+  const T t11 = t1 + t10;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t9 = p.Ld(x + 9 * is);
+  const T t12 = t2 + t9;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t8 = p.Ld(x + 8 * is);
+  const T t13 = t3 + t8;
+  const T t4 = p.Ld(x + 4 * is);
+  const T t7 = p.Ld(x + 7 * is);
+  const T t14 = t4 + t7;
+  const T t5 = p.Ld(x + 5 * is);
+  const T t6 = p.Ld(x + 6 * is);
+  const T t15 = t5 + t6;
+  const T t16 = t1 - t10;
+  const T t17 = t2 - t9;
+  const T t18 = t3 - t8;
+  const T t19 = t4 - t7;
+  const T t20 = t5 - t6;
+  const T t0 = p.Ld(x);
+  const T t21 = t0 + t11 + t12 + t13 + t14 + t15;
+  p.St(y, t21);
+  const T t22 = t0 + 0.841253532831181168862 * t11 + 0.415415013001886425529 * t12 - 0.142314838273285140444 * t13 - 0.654860733945285064057 * t14 - 0.95949297361449738989 * t15;
+  p.St(y + os, t22);
+  const T t23 = 0.540640817455597582108 * t16 + 0.909631995354518371412 * t17 + 0.989821441880932732376 * t18 + 0.755749574354258283774 * t19 + 0.281732556841429697711 * t20;
+  p.St(y + 10 * os, -t23);
+  const T t24 = t0 + 0.415415013001886425529 * t11 - 0.654860733945285064057 * t12 - 0.95949297361449738989 * t13 - 0.142314838273285140444 * t14 + 0.841253532831181168862 * t15;
+  p.St(y + 2 * os, t24);
+  const T t25 = 0.909631995354518371412 * t16 + 0.755749574354258283774 * t17 - 0.281732556841429697711 * t18 - 0.989821441880932732376 * t19 - 0.540640817455597582108 * t20;
+  p.St(y + 9 * os, -t25);
+  const T t26 = t0 - 0.142314838273285140444 * t11 - 0.95949297361449738989 * t12 + 0.415415013001886425529 * t13 + 0.841253532831181168862 * t14 - 0.654860733945285064057 * t15;
+  p.St(y + 3 * os, t26);
+  const T t27 = 0.989821441880932732376 * t16 - 0.281732556841429697711 * t17 - 0.909631995354518371412 * t18 + 0.540640817455597582108 * t19 + 0.755749574354258283774 * t20;
+  p.St(y + 8 * os, -t27);
+  const T t28 = t0 - 0.654860733945285064057 * t11 - 0.142314838273285140444 * t12 + 0.841253532831181168862 * t13 - 0.95949297361449738989 * t14 + 0.415415013001886425529 * t15;
+  p.St(y + 4 * os, t28);
+  const T t29 = 0.755749574354258283774 * t16 - 0.989821441880932732376 * t17 + 0.540640817455597582108 * t18 + 0.281732556841429697711 * t19 - 0.909631995354518371412 * t20;
+  p.St(y + 7 * os, -t29);
+  const T t30 = t0 - 0.95949297361449738989 * t11 + 0.841253532831181168862 * t12 - 0.654860733945285064057 * t13 + 0.415415013001886425529 * t14 - 0.142314838273285140444 * t15;
+  p.St(y + 5 * os, t30);
+  const T t31 = 0.281732556841429697711 * t16 - 0.540640817455597582108 * t17 + 0.755749574354258283774 * t18 - 0.909631995354518371412 * t19 + 0.989821441880932732376 * t20;
+  p.St(y + 6 * os, -t31);
+}
+
+template <class P>
+FFTK_BODY void RealTw11(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = p.Ld(a + 5 * s);
+  const T t27 = p.LdB(b + 5 * s);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  const T t32 = p.Ld(a + 6 * s);
+  const T t33 = p.LdB(b + 6 * s);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = p.Ld(a + 7 * s);
+  const T t39 = p.LdB(b + 7 * s);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  const T t44 = p.Ld(a + 8 * s);
+  const T t45 = p.LdB(b + 8 * s);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  const T t50 = p.Ld(a + 9 * s);
+  const T t51 = p.LdB(b + 9 * s);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  const T t56 = p.Ld(a + 10 * s);
+  const T t57 = p.LdB(b + 10 * s);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  const T t62 = t6 + t60;
+  const T t63 = t7 + t61;
+  const T t64 = t12 + t54;
+  const T t65 = t13 + t55;
+  const T t66 = t18 + t48;
+  const T t67 = t19 + t49;
+  const T t68 = t24 + t42;
+  const T t69 = t25 + t43;
+  const T t70 = t30 + t36;
+  const T t71 = t31 + t37;
+  const T t72 = t6 - t60;
+  const T t73 = t7 - t61;
+  const T t74 = t12 - t54;
+  const T t75 = t13 - t55;
+  const T t76 = t18 - t48;
+  const T t77 = t19 - t49;
+  const T t78 = t24 - t42;
+  const T t79 = t25 - t43;
+  const T t80 = t30 - t36;
+  const T t81 = t31 - t37;
+  const T t0 = p.Ld(a);
+  const T t82 = t0 + t62 + t64 + t66 + t68 + t70;
+  const T t1 = p.LdB(b);
+  p.St(a, t82);
+  const T t83 = t1 + t63 + t65 + t67 + t69 + t71;
+  p.StB(b + 10 * s, t83);
+  const T t84 = t0 + 0.841253532831181168862 * t62 + 0.415415013001886425529 * t64 - 0.142314838273285140444 * t66 - 0.654860733945285064057 * t68 - 0.95949297361449738989 * t70;
+  const T t85 = t1 + 0.841253532831181168862 * t63 + 0.415415013001886425529 * t65 - 0.142314838273285140444 * t67 - 0.654860733945285064057 * t69 - 0.95949297361449738989 * t71;
+  const T t86 = 0.540640817455597582108 * t73 + 0.909631995354518371412 * t75 + 0.989821441880932732376 * t77 + 0.755749574354258283774 * t79 + 0.281732556841429697711 * t81;
+  const T t87 = 0.540640817455597582108 * t72 + 0.909631995354518371412 * t74 + 0.989821441880932732376 * t76 + 0.755749574354258283774 * t78 + 0.281732556841429697711 * t80;
+  const T t88 = t84 + t86;
+  p.St(a + s, t88);
+  const T t89 = t85 - t87;
+  p.StB(b + 9 * s, t89);
+  const T t90 = t84 - t86;
+  p.StB(b, t90);
+  const T t91 = t85 + t87;
+  p.St(a + 10 * s, -t91);
+  const T t92 = t0 + 0.415415013001886425529 * t62 - 0.654860733945285064057 * t64 - 0.95949297361449738989 * t66 - 0.142314838273285140444 * t68 + 0.841253532831181168862 * t70;
+  const T t93 = t1 + 0.415415013001886425529 * t63 - 0.654860733945285064057 * t65 - 0.95949297361449738989 * t67 - 0.142314838273285140444 * t69 + 0.841253532831181168862 * t71;
+  const T t94 = 0.909631995354518371412 * t73 + 0.755749574354258283774 * t75 - 0.281732556841429697711 * t77 - 0.989821441880932732376 * t79 - 0.540640817455597582108 * t81;
+  const T t95 = 0.909631995354518371412 * t72 + 0.755749574354258283774 * t74 - 0.281732556841429697711 * t76 - 0.989821441880932732376 * t78 - 0.540640817455597582108 * t80;
+  const T t96 = t92 + t94;
+  p.St(a + 2 * s, t96);
+  const T t97 = t93 - t95;
+  p.StB(b + 8 * s, t97);
+  const T t98 = t92 - t94;
+  p.StB(b + s, t98);
+  const T t99 = t93 + t95;
+  p.St(a + 9 * s, -t99);
+  const T t100 = t0 - 0.142314838273285140444 * t62 - 0.95949297361449738989 * t64 + 0.415415013001886425529 * t66 + 0.841253532831181168862 * t68 - 0.654860733945285064057 * t70;
+  const T t101 = t1 - 0.142314838273285140444 * t63 - 0.95949297361449738989 * t65 + 0.415415013001886425529 * t67 + 0.841253532831181168862 * t69 - 0.654860733945285064057 * t71;
+  const T t102 = 0.989821441880932732376 * t73 - 0.281732556841429697711 * t75 - 0.909631995354518371412 * t77 + 0.540640817455597582108 * t79 + 0.755749574354258283774 * t81;
+  const T t103 = 0.989821441880932732376 * t72 - 0.281732556841429697711 * t74 - 0.909631995354518371412 * t76 + 0.540640817455597582108 * t78 + 0.755749574354258283774 * t80;
+  const T t104 = t100 + t102;
+  p.St(a + 3 * s, t104);
+  const T t105 = t101 - t103;
+  p.StB(b + 7 * s, t105);
+  const T t106 = t100 - t102;
+  p.StB(b + 2 * s, t106);
+  const T t107 = t101 + t103;
+  p.St(a + 8 * s, -t107);
+  const T t108 = t0 - 0.654860733945285064057 * t62 - 0.142314838273285140444 * t64 + 0.841253532831181168862 * t66 - 0.95949297361449738989 * t68 + 0.415415013001886425529 * t70;
+  const T t109 = t1 - 0.654860733945285064057 * t63 - 0.142314838273285140444 * t65 + 0.841253532831181168862 * t67 - 0.95949297361449738989 * t69 + 0.415415013001886425529 * t71;
+  const T t110 = 0.755749574354258283774 * t73 - 0.989821441880932732376 * t75 + 0.540640817455597582108 * t77 + 0.281732556841429697711 * t79 - 0.909631995354518371412 * t81;
+  const T t111 = 0.755749574354258283774 * t72 - 0.989821441880932732376 * t74 + 0.540640817455597582108 * t76 + 0.281732556841429697711 * t78 - 0.909631995354518371412 * t80;
+  const T t112 = t108 + t110;
+  p.St(a + 4 * s, t112);
+  const T t113 = t109 - t111;
+  p.StB(b + 6 * s, t113);
+  const T t114 = t108 - t110;
+  p.StB(b + 3 * s, t114);
+  const T t115 = t109 + t111;
+  p.St(a + 7 * s, -t115);
+  const T t116 = t0 - 0.95949297361449738989 * t62 + 0.841253532831181168862 * t64 - 0.654860733945285064057 * t66 + 0.415415013001886425529 * t68 - 0.142314838273285140444 * t70;
+  const T t117 = t1 - 0.95949297361449738989 * t63 + 0.841253532831181168862 * t65 - 0.654860733945285064057 * t67 + 0.415415013001886425529 * t69 - 0.142314838273285140444 * t71;
+  const T t118 = 0.281732556841429697711 * t73 - 0.540640817455597582108 * t75 + 0.755749574354258283774 * t77 - 0.909631995354518371412 * t79 + 0.989821441880932732376 * t81;
+  const T t119 = 0.281732556841429697711 * t72 - 0.540640817455597582108 * t74 + 0.755749574354258283774 * t76 - 0.909631995354518371412 * t78 + 0.989821441880932732376 * t80;
+  const T t120 = t116 + t118;
+  p.St(a + 5 * s, t120);
+  const T t121 = t117 - t119;
+  p.StB(b + 5 * s, t121);
+  const T t122 = t116 - t118;
+  p.StB(b + 4 * s, t122);
+  const T t123 = t117 + t119;
+  p.St(a + 6 * s, -t123);
+}
+
+template <class P>
+FFTK_BODY void RealHalf11(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.95949297361449738989 * t1;
+  const T t3 = 0.281732556841429697711 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.841253532831181168862 * t4;
+  const T t6 = 0.540640817455597582108 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.654860733945285064057 * t7;
+  const T t9 = 0.755749574354258283774 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.415415013001886425529 * t10;
+  const T t12 = 0.909631995354518371412 * t10;
+  const T t13 = p.Ld(x + 5 * s);
+  const T t14 = 0.142314838273285140444 * t13;
+  const T t15 = 0.989821441880932732376 * t13;
+  const T t16 = p.Ld(x + 6 * s);
+  const T t17 = 0.142314838273285140444 * t16;
+  const T t18 = 0.989821441880932732376 * t16;
+  const T t19 = p.Ld(x + 7 * s);
+  const T t20 = 0.415415013001886425529 * t19;
+  const T t21 = 0.909631995354518371412 * t19;
+  const T t22 = p.Ld(x + 8 * s);
+  const T t23 = 0.654860733945285064057 * t22;
+  const T t24 = 0.755749574354258283774 * t22;
+  const T t25 = p.Ld(x + 9 * s);
+  const T t26 = 0.841253532831181168862 * t25;
+  const T t27 = 0.540640817455597582108 * t25;
+  const T t28 = p.Ld(x + 10 * s);
+  const T t29 = 0.95949297361449738989 * t28;
+  const T t30 = 0.281732556841429697711 * t28;
+  const T t31 = t2 - t29;
+  const T t32 = t3 + t30;
+  const T t33 = t5 - t26;
+  const T t34 = t6 + t27;
+  const T t35 = t8 - t23;
+  const T t36 = t9 + t24;
+  const T t37 = t11 - t20;
+  const T t38 = t12 + t21;
+  const T t39 = t14 - t17;
+  const T t40 = t15 + t18;
+  const T t41 = t2 + t29;
+  const T t42 = t30 - t3;
+  const T t43 = t5 + t26;
+  const T t44 = t27 - t6;
+  const T t45 = t8 + t23;
+  const T t46 = t24 - t9;
+  const T t47 = t11 + t20;
+  const T t48 = t21 - t12;
+  const T t49 = t14 + t17;
+  const T t50 = t18 - t15;
+  const T t0 = p.Ld(x);
+  const T t51 = t0 + t31 + t33 + t35 + t37 + t39;
+  p.St(x, t51);
+  const T t52 = t32 + t34 + t36 + t38 + t40;
+  p.St(x + 10 * s, -t52);
+  const T t53 = t0 + 0.841253532831181168862 * t31 + 0.415415013001886425529 * t33 - 0.142314838273285140444 * t35 - 0.654860733945285064057 * t37 - 0.95949297361449738989 * t39;
+  const T t54 = 0.841253532831181168862 * t32 + 0.415415013001886425529 * t34 - 0.142314838273285140444 * t36 - 0.654860733945285064057 * t38 - 0.95949297361449738989 * t40;
+  const T t55 = 0.540640817455597582108 * t42 + 0.909631995354518371412 * t44 + 0.989821441880932732376 * t46 + 0.755749574354258283774 * t48 + 0.281732556841429697711 * t50;
+  const T t56 = 0.540640817455597582108 * t41 + 0.909631995354518371412 * t43 + 0.989821441880932732376 * t45 + 0.755749574354258283774 * t47 + 0.281732556841429697711 * t49;
+  const T t57 = t53 + t55;
+  p.St(x + s, t57);
+  const T t58 = t54 + t56;
+  p.St(x + 9 * s, -t58);
+  const T t61 = t0 + 0.415415013001886425529 * t31 - 0.654860733945285064057 * t33 - 0.95949297361449738989 * t35 - 0.142314838273285140444 * t37 + 0.841253532831181168862 * t39;
+  const T t62 = 0.654860733945285064057 * t34 - 0.415415013001886425529 * t32 + 0.95949297361449738989 * t36 + 0.142314838273285140444 * t38 - 0.841253532831181168862 * t40;
+  const T t63 = 0.909631995354518371412 * t42 + 0.755749574354258283774 * t44 - 0.281732556841429697711 * t46 - 0.989821441880932732376 * t48 - 0.540640817455597582108 * t50;
+  const T t64 = 0.909631995354518371412 * t41 + 0.755749574354258283774 * t43 - 0.281732556841429697711 * t45 - 0.989821441880932732376 * t47 - 0.540640817455597582108 * t49;
+  const T t65 = t61 + t63;
+  p.St(x + 2 * s, t65);
+  const T t66 = t62 - t64;
+  p.St(x + 8 * s, t66);
+  const T t69 = t0 - 0.142314838273285140444 * t31 - 0.95949297361449738989 * t33 + 0.415415013001886425529 * t35 + 0.841253532831181168862 * t37 - 0.654860733945285064057 * t39;
+  const T t70 = 0.142314838273285140444 * t32 + 0.95949297361449738989 * t34 - 0.415415013001886425529 * t36 - 0.841253532831181168862 * t38 + 0.654860733945285064057 * t40;
+  const T t71 = 0.989821441880932732376 * t42 - 0.281732556841429697711 * t44 - 0.909631995354518371412 * t46 + 0.540640817455597582108 * t48 + 0.755749574354258283774 * t50;
+  const T t72 = 0.989821441880932732376 * t41 - 0.281732556841429697711 * t43 - 0.909631995354518371412 * t45 + 0.540640817455597582108 * t47 + 0.755749574354258283774 * t49;
+  const T t73 = t69 + t71;
+  p.St(x + 3 * s, t73);
+  const T t74 = t70 - t72;
+  p.St(x + 7 * s, t74);
+  const T t77 = t0 - 0.654860733945285064057 * t31 - 0.142314838273285140444 * t33 + 0.841253532831181168862 * t35 - 0.95949297361449738989 * t37 + 0.415415013001886425529 * t39;
+  const T t78 = 0.654860733945285064057 * t32 + 0.142314838273285140444 * t34 - 0.841253532831181168862 * t36 + 0.95949297361449738989 * t38 - 0.415415013001886425529 * t40;
+  const T t79 = 0.755749574354258283774 * t42 - 0.989821441880932732376 * t44 + 0.540640817455597582108 * t46 + 0.281732556841429697711 * t48 - 0.909631995354518371412 * t50;
+  const T t80 = 0.755749574354258283774 * t41 - 0.989821441880932732376 * t43 + 0.540640817455597582108 * t45 + 0.281732556841429697711 * t47 - 0.909631995354518371412 * t49;
+  const T t81 = t77 + t79;
+  p.St(x + 4 * s, t81);
+  const T t82 = t78 - t80;
+  p.St(x + 6 * s, t82);
+  const T t85 = t0 - 0.95949297361449738989 * t31 + 0.841253532831181168862 * t33 - 0.654860733945285064057 * t35 + 0.415415013001886425529 * t37 - 0.142314838273285140444 * t39;
+  const T t87 = 0.281732556841429697711 * t42 - 0.540640817455597582108 * t44 + 0.755749574354258283774 * t46 - 0.909631995354518371412 * t48 + 0.989821441880932732376 * t50;
+  const T t89 = t85 + t87;
+  p.St(x + 5 * s, t89);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 11 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft11(p, inRe + t * is, inIm + t * is, ls, outRe + t * 11 * os, outIm + t * 11 * os, os);
+  } else {
+    const Lane4Access p{is, 11 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft11(p, inRe + t * is, inIm + t * is, ls, outRe + t * 11 * os, outIm + t * 11 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw11(Interleaved4FirstAccess{os, os, 0, 10}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 10};
+    for (; k + 3 < m; k += 4) DftTw11(p, re + k * os, im + k * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
+  } else {
+    DftTw11(Lane4FirstAccess{os, os, 0, 10}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 10};
+    for (; k + 3 < m; k += 4) DftTw11(p, re + k * os, im + k * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 11 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft11(p, in + t * is, ls, out + t * 11 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 10};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw11(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf11(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 11 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft11(p, inRe + t * is, inIm + t * is, ls, outRe + t * 11 * os, outIm + t * 11 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft11(p, inRe + t * is, inIm + t * is, ls, outRe + t * 11 * os, outIm + t * 11 * os, os);
   } else {
     const LaneAccess p{is, 11 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft11(p, inRe + t * is, inIm + t * is, ls, outRe + t * 11 * os, outIm + t * 11 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft11(p, inRe + t * is, inIm + t * is, ls, outRe + t * 11 * os, outIm + t * 11 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft11(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 11 * os,
-          outIm + t * 11 * os, os);
-  }
+  for (; t < c; ++t) Dft11(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 11 * os, outIm + t * 11 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle11(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle11(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft11(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft11(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 10};
-    for (; k + 1 < m; k += 2) {
-      DftTw11(p, re + k * os, im + k * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
-    }
+    for (; k + 1 < m; k += 2) DftTw11(p, re + k * os, im + k * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
   } else {
     const LaneAccess p{os, os, 0, 10};
-    for (; k + 1 < m; k += 2) {
-      DftTw11(p, re + k * os, im + k * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
-    }
+    for (; k + 1 < m; k += 2) DftTw11(p, re + k * os, im + k * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
   }
-  for (; k < m; ++k) {
-    DftTw11(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 10,
-           twSin + (k - 1) * 10);
-  }
+  for (; k < m; ++k) DftTw11(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
 }
 
 FFTK_CLONES
 void FftRealLeaf11(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 11 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 11 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft11(p, in + t * is, ls, out + t * 11 * os, os);
   for (; t < c; ++t) RealDft11(ScalarAccess{}, in + t * is, ls, out + t * 11 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle11(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle11(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft11(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 10};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw11(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 10,
-            twSin + (k - 1) * 10);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw11(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 10,
-            twSin + (k - 1) * 10);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 10};
+  for (; 2 * (k + 1) < m; k += 2) RealTw11(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
+  for (; 2 * k < m; ++k) RealTw11(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 10, twSin + (k - 1) * 10);
   if (m % 2 == 0) RealHalf11(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

@@ -4,8 +4,9 @@
 // twiddled complex DFT 216, 192; real DFT 84, 72; real combining group 216, 192.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -17,8 +18,8 @@ using fftk::LaneAccess;
 using fftk::ScalarAccess;
 
 template <class P>
-inline void Dft13(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+FFTK_BODY void Dft13(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(xr + is, xi + is, t2, t3);
@@ -136,81 +137,81 @@ inline void Dft13(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 }
 
 template <class P>
-inline void DftTw13(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+FFTK_BODY void DftTw13(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   T t26, t27;
   p.LdC(re + 5 * s, im + 5 * s, t26, t27);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   T t32, t33;
   p.LdC(re + 6 * s, im + 6 * s, t32, t33);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   T t38, t39;
   p.LdC(re + 7 * s, im + 7 * s, t38, t39);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   T t44, t45;
   p.LdC(re + 8 * s, im + 8 * s, t44, t45);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   T t50, t51;
   p.LdC(re + 9 * s, im + 9 * s, t50, t51);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   T t56, t57;
   p.LdC(re + 10 * s, im + 10 * s, t56, t57);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   T t62, t63;
   p.LdC(re + 11 * s, im + 11 * s, t62, t63);
   const T t64 = p.LdW(wc + 10);
   const T t65 = p.LdW(ws + 10);
-  const T t66 = t62 * t64 - t63 * t65;
-  const T t67 = t63 * t64 + t62 * t65;
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
   T t68, t69;
   p.LdC(re + 12 * s, im + 12 * s, t68, t69);
   const T t70 = p.LdW(wc + 11);
   const T t71 = p.LdW(ws + 11);
-  const T t72 = t68 * t70 - t69 * t71;
-  const T t73 = t69 * t70 + t68 * t71;
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
   const T t74 = t6 + t72;
   const T t75 = t7 + t73;
   const T t76 = t12 + t66;
@@ -303,7 +304,7 @@ inline void DftTw13(const P& p, double* re, double* im, ptrdiff_t s, const doubl
 }
 
 template <class P>
-inline void RealDft13(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+FFTK_BODY void RealDft13(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t1 = p.Ld(x + is);
   const T t12 = p.Ld(x + 12 * is);
@@ -359,81 +360,81 @@ inline void RealDft13(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 }
 
 template <class P>
-inline void RealTw13(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+FFTK_BODY void RealTw13(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = p.Ld(a + 5 * s);
   const T t27 = p.LdB(b + 5 * s);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   const T t32 = p.Ld(a + 6 * s);
   const T t33 = p.LdB(b + 6 * s);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = p.Ld(a + 7 * s);
   const T t39 = p.LdB(b + 7 * s);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   const T t44 = p.Ld(a + 8 * s);
   const T t45 = p.LdB(b + 8 * s);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   const T t50 = p.Ld(a + 9 * s);
   const T t51 = p.LdB(b + 9 * s);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   const T t56 = p.Ld(a + 10 * s);
   const T t57 = p.LdB(b + 10 * s);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   const T t62 = p.Ld(a + 11 * s);
   const T t63 = p.LdB(b + 11 * s);
   const T t64 = p.LdW(wc + 10);
   const T t65 = p.LdW(ws + 10);
-  const T t66 = t62 * t64 - t63 * t65;
-  const T t67 = t63 * t64 + t62 * t65;
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
   const T t68 = p.Ld(a + 12 * s);
   const T t69 = p.LdB(b + 12 * s);
   const T t70 = p.LdW(wc + 11);
   const T t71 = p.LdW(ws + 11);
-  const T t72 = t68 * t70 - t69 * t71;
-  const T t73 = t69 * t70 + t68 * t71;
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
   const T t74 = t6 + t72;
   const T t75 = t7 + t73;
   const T t76 = t12 + t66;
@@ -539,7 +540,7 @@ inline void RealTw13(const P& p, double* a, double* b, ptrdiff_t s, const double
 }
 
 template <class P>
-inline void RealHalf13(const P& p, double* x, ptrdiff_t s) {
+FFTK_BODY void RealHalf13(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
   const T t1 = p.Ld(x + s);
   const T t2 = 0.970941817426052027157 * t1;
@@ -654,75 +655,766 @@ inline void RealHalf13(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf13(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+FFTK_BODY void Dft13(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t24, t25;
+  p.LdC(xr + 12 * is, xi + 12 * is, t24, t25);
+  const T t26 = t2 + t24;
+  const T t27 = t3 + t25;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t22, t23;
+  p.LdC(xr + 11 * is, xi + 11 * is, t22, t23);
+  const T t28 = t4 + t22;
+  const T t29 = t5 + t23;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t20, t21;
+  p.LdC(xr + 10 * is, xi + 10 * is, t20, t21);
+  const T t30 = t6 + t20;
+  const T t31 = t7 + t21;
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  T t18, t19;
+  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
+  const T t32 = t8 + t18;
+  const T t33 = t9 + t19;
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  T t16, t17;
+  p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
+  const T t34 = t10 + t16;
+  const T t35 = t11 + t17;
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
+  const T t36 = t12 + t14;
+  const T t37 = t13 + t15;
+  const T t38 = t2 - t24;
+  const T t39 = t3 - t25;
+  const T t40 = t4 - t22;
+  const T t41 = t5 - t23;
+  const T t42 = t6 - t20;
+  const T t43 = t7 - t21;
+  const T t44 = t8 - t18;
+  const T t45 = t9 - t19;
+  const T t46 = t10 - t16;
+  const T t47 = t11 - t17;
+  const T t48 = t12 - t14;
+  const T t49 = t13 - t15;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  const T t50 = t0 + t26 + t28 + t30 + t32 + t34 + t36;
+  const T t51 = t1 + t27 + t29 + t31 + t33 + t35 + t37;
+  p.StC(yr, yi, t50, t51);
+  const T t52 = t0 + 0.8854560256532098959 * t26 + 0.568064746731155802512 * t28 + 0.120536680255323053349 * t30 - 0.35460488704253562597 * t32 - 0.748510748171101098635 * t34 - 0.970941817426052027157 * t36;
+  const T t53 = t1 + 0.8854560256532098959 * t27 + 0.568064746731155802512 * t29 + 0.120536680255323053349 * t31 - 0.35460488704253562597 * t33 - 0.748510748171101098635 * t35 - 0.970941817426052027157 * t37;
+  const T t54 = 0.464723172043768545656 * t39 + 0.82298386589365639458 * t41 + 0.992708874098053992801 * t43 + 0.93501624268541482344 * t45 + 0.663122658240795202377 * t47 + 0.239315664287557767149 * t49;
+  const T t55 = 0.464723172043768545656 * t38 + 0.82298386589365639458 * t40 + 0.992708874098053992801 * t42 + 0.93501624268541482344 * t44 + 0.663122658240795202377 * t46 + 0.239315664287557767149 * t48;
+  const T t56 = t52 + t54;
+  const T t57 = t53 - t55;
+  p.StC(yr + os, yi + os, t56, t57);
+  const T t58 = t52 - t54;
+  const T t59 = t53 + t55;
+  p.StC(yr + 12 * os, yi + 12 * os, t58, t59);
+  const T t60 = t0 + 0.568064746731155802512 * t26 - 0.35460488704253562597 * t28 - 0.970941817426052027157 * t30 - 0.748510748171101098635 * t32 + 0.120536680255323053349 * t34 + 0.8854560256532098959 * t36;
+  const T t61 = t1 + 0.568064746731155802512 * t27 - 0.35460488704253562597 * t29 - 0.970941817426052027157 * t31 - 0.748510748171101098635 * t33 + 0.120536680255323053349 * t35 + 0.8854560256532098959 * t37;
+  const T t62 = 0.82298386589365639458 * t39 + 0.93501624268541482344 * t41 + 0.239315664287557767149 * t43 - 0.663122658240795202377 * t45 - 0.992708874098053992801 * t47 - 0.464723172043768545656 * t49;
+  const T t63 = 0.82298386589365639458 * t38 + 0.93501624268541482344 * t40 + 0.239315664287557767149 * t42 - 0.663122658240795202377 * t44 - 0.992708874098053992801 * t46 - 0.464723172043768545656 * t48;
+  const T t64 = t60 + t62;
+  const T t65 = t61 - t63;
+  p.StC(yr + 2 * os, yi + 2 * os, t64, t65);
+  const T t66 = t60 - t62;
+  const T t67 = t61 + t63;
+  p.StC(yr + 11 * os, yi + 11 * os, t66, t67);
+  const T t68 = t0 + 0.120536680255323053349 * t26 - 0.970941817426052027157 * t28 - 0.35460488704253562597 * t30 + 0.8854560256532098959 * t32 + 0.568064746731155802512 * t34 - 0.748510748171101098635 * t36;
+  const T t69 = t1 + 0.120536680255323053349 * t27 - 0.970941817426052027157 * t29 - 0.35460488704253562597 * t31 + 0.8854560256532098959 * t33 + 0.568064746731155802512 * t35 - 0.748510748171101098635 * t37;
+  const T t70 = 0.992708874098053992801 * t39 + 0.239315664287557767149 * t41 - 0.93501624268541482344 * t43 - 0.464723172043768545656 * t45 + 0.82298386589365639458 * t47 + 0.663122658240795202377 * t49;
+  const T t71 = 0.992708874098053992801 * t38 + 0.239315664287557767149 * t40 - 0.93501624268541482344 * t42 - 0.464723172043768545656 * t44 + 0.82298386589365639458 * t46 + 0.663122658240795202377 * t48;
+  const T t72 = t68 + t70;
+  const T t73 = t69 - t71;
+  p.StC(yr + 3 * os, yi + 3 * os, t72, t73);
+  const T t74 = t68 - t70;
+  const T t75 = t69 + t71;
+  p.StC(yr + 10 * os, yi + 10 * os, t74, t75);
+  const T t76 = t0 - 0.35460488704253562597 * t26 - 0.748510748171101098635 * t28 + 0.8854560256532098959 * t30 + 0.120536680255323053349 * t32 - 0.970941817426052027157 * t34 + 0.568064746731155802512 * t36;
+  const T t77 = t1 - 0.35460488704253562597 * t27 - 0.748510748171101098635 * t29 + 0.8854560256532098959 * t31 + 0.120536680255323053349 * t33 - 0.970941817426052027157 * t35 + 0.568064746731155802512 * t37;
+  const T t78 = 0.93501624268541482344 * t39 - 0.663122658240795202377 * t41 - 0.464723172043768545656 * t43 + 0.992708874098053992801 * t45 - 0.239315664287557767149 * t47 - 0.82298386589365639458 * t49;
+  const T t79 = 0.93501624268541482344 * t38 - 0.663122658240795202377 * t40 - 0.464723172043768545656 * t42 + 0.992708874098053992801 * t44 - 0.239315664287557767149 * t46 - 0.82298386589365639458 * t48;
+  const T t80 = t76 + t78;
+  const T t81 = t77 - t79;
+  p.StC(yr + 4 * os, yi + 4 * os, t80, t81);
+  const T t82 = t76 - t78;
+  const T t83 = t77 + t79;
+  p.StC(yr + 9 * os, yi + 9 * os, t82, t83);
+  const T t84 = t0 - 0.748510748171101098635 * t26 + 0.120536680255323053349 * t28 + 0.568064746731155802512 * t30 - 0.970941817426052027157 * t32 + 0.8854560256532098959 * t34 - 0.35460488704253562597 * t36;
+  const T t85 = t1 - 0.748510748171101098635 * t27 + 0.120536680255323053349 * t29 + 0.568064746731155802512 * t31 - 0.970941817426052027157 * t33 + 0.8854560256532098959 * t35 - 0.35460488704253562597 * t37;
+  const T t86 = 0.663122658240795202377 * t39 - 0.992708874098053992801 * t41 + 0.82298386589365639458 * t43 - 0.239315664287557767149 * t45 - 0.464723172043768545656 * t47 + 0.93501624268541482344 * t49;
+  const T t87 = 0.663122658240795202377 * t38 - 0.992708874098053992801 * t40 + 0.82298386589365639458 * t42 - 0.239315664287557767149 * t44 - 0.464723172043768545656 * t46 + 0.93501624268541482344 * t48;
+  const T t88 = t84 + t86;
+  const T t89 = t85 - t87;
+  p.StC(yr + 5 * os, yi + 5 * os, t88, t89);
+  const T t90 = t84 - t86;
+  const T t91 = t85 + t87;
+  p.StC(yr + 8 * os, yi + 8 * os, t90, t91);
+  const T t92 = t0 - 0.970941817426052027157 * t26 + 0.8854560256532098959 * t28 - 0.748510748171101098635 * t30 + 0.568064746731155802512 * t32 - 0.35460488704253562597 * t34 + 0.120536680255323053349 * t36;
+  const T t93 = t1 - 0.970941817426052027157 * t27 + 0.8854560256532098959 * t29 - 0.748510748171101098635 * t31 + 0.568064746731155802512 * t33 - 0.35460488704253562597 * t35 + 0.120536680255323053349 * t37;
+  const T t94 = 0.239315664287557767149 * t39 - 0.464723172043768545656 * t41 + 0.663122658240795202377 * t43 - 0.82298386589365639458 * t45 + 0.93501624268541482344 * t47 - 0.992708874098053992801 * t49;
+  const T t95 = 0.239315664287557767149 * t38 - 0.464723172043768545656 * t40 + 0.663122658240795202377 * t42 - 0.82298386589365639458 * t44 + 0.93501624268541482344 * t46 - 0.992708874098053992801 * t48;
+  const T t96 = t92 + t94;
+  const T t97 = t93 - t95;
+  p.StC(yr + 6 * os, yi + 6 * os, t96, t97);
+  const T t98 = t92 - t94;
+  const T t99 = t93 + t95;
+  p.StC(yr + 7 * os, yi + 7 * os, t98, t99);
+}
+
+template <class P>
+FFTK_BODY void DftTw13(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  T t26, t27;
+  p.LdC(re + 5 * s, im + 5 * s, t26, t27);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  T t32, t33;
+  p.LdC(re + 6 * s, im + 6 * s, t32, t33);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  T t38, t39;
+  p.LdC(re + 7 * s, im + 7 * s, t38, t39);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  T t44, t45;
+  p.LdC(re + 8 * s, im + 8 * s, t44, t45);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  T t50, t51;
+  p.LdC(re + 9 * s, im + 9 * s, t50, t51);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  T t56, t57;
+  p.LdC(re + 10 * s, im + 10 * s, t56, t57);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  T t62, t63;
+  p.LdC(re + 11 * s, im + 11 * s, t62, t63);
+  const T t64 = p.LdW(wc + 10);
+  const T t65 = p.LdW(ws + 10);
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
+  T t68, t69;
+  p.LdC(re + 12 * s, im + 12 * s, t68, t69);
+  const T t70 = p.LdW(wc + 11);
+  const T t71 = p.LdW(ws + 11);
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
+  const T t74 = t6 + t72;
+  const T t75 = t7 + t73;
+  const T t76 = t12 + t66;
+  const T t77 = t13 + t67;
+  const T t78 = t18 + t60;
+  const T t79 = t19 + t61;
+  const T t80 = t24 + t54;
+  const T t81 = t25 + t55;
+  const T t82 = t30 + t48;
+  const T t83 = t31 + t49;
+  const T t84 = t36 + t42;
+  const T t85 = t37 + t43;
+  const T t86 = t6 - t72;
+  const T t87 = t7 - t73;
+  const T t88 = t12 - t66;
+  const T t89 = t13 - t67;
+  const T t90 = t18 - t60;
+  const T t91 = t19 - t61;
+  const T t92 = t24 - t54;
+  const T t93 = t25 - t55;
+  const T t94 = t30 - t48;
+  const T t95 = t31 - t49;
+  const T t96 = t36 - t42;
+  const T t97 = t37 - t43;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t98 = t0 + t74 + t76 + t78 + t80 + t82 + t84;
+  const T t99 = t1 + t75 + t77 + t79 + t81 + t83 + t85;
+  p.StC(re, im, t98, t99);
+  const T t100 = t0 + 0.8854560256532098959 * t74 + 0.568064746731155802512 * t76 + 0.120536680255323053349 * t78 - 0.35460488704253562597 * t80 - 0.748510748171101098635 * t82 - 0.970941817426052027157 * t84;
+  const T t101 = t1 + 0.8854560256532098959 * t75 + 0.568064746731155802512 * t77 + 0.120536680255323053349 * t79 - 0.35460488704253562597 * t81 - 0.748510748171101098635 * t83 - 0.970941817426052027157 * t85;
+  const T t102 = 0.464723172043768545656 * t87 + 0.82298386589365639458 * t89 + 0.992708874098053992801 * t91 + 0.93501624268541482344 * t93 + 0.663122658240795202377 * t95 + 0.239315664287557767149 * t97;
+  const T t103 = 0.464723172043768545656 * t86 + 0.82298386589365639458 * t88 + 0.992708874098053992801 * t90 + 0.93501624268541482344 * t92 + 0.663122658240795202377 * t94 + 0.239315664287557767149 * t96;
+  const T t104 = t100 + t102;
+  const T t105 = t101 - t103;
+  p.StC(re + s, im + s, t104, t105);
+  const T t106 = t100 - t102;
+  const T t107 = t101 + t103;
+  p.StC(re + 12 * s, im + 12 * s, t106, t107);
+  const T t108 = t0 + 0.568064746731155802512 * t74 - 0.35460488704253562597 * t76 - 0.970941817426052027157 * t78 - 0.748510748171101098635 * t80 + 0.120536680255323053349 * t82 + 0.8854560256532098959 * t84;
+  const T t109 = t1 + 0.568064746731155802512 * t75 - 0.35460488704253562597 * t77 - 0.970941817426052027157 * t79 - 0.748510748171101098635 * t81 + 0.120536680255323053349 * t83 + 0.8854560256532098959 * t85;
+  const T t110 = 0.82298386589365639458 * t87 + 0.93501624268541482344 * t89 + 0.239315664287557767149 * t91 - 0.663122658240795202377 * t93 - 0.992708874098053992801 * t95 - 0.464723172043768545656 * t97;
+  const T t111 = 0.82298386589365639458 * t86 + 0.93501624268541482344 * t88 + 0.239315664287557767149 * t90 - 0.663122658240795202377 * t92 - 0.992708874098053992801 * t94 - 0.464723172043768545656 * t96;
+  const T t112 = t108 + t110;
+  const T t113 = t109 - t111;
+  p.StC(re + 2 * s, im + 2 * s, t112, t113);
+  const T t114 = t108 - t110;
+  const T t115 = t109 + t111;
+  p.StC(re + 11 * s, im + 11 * s, t114, t115);
+  const T t116 = t0 + 0.120536680255323053349 * t74 - 0.970941817426052027157 * t76 - 0.35460488704253562597 * t78 + 0.8854560256532098959 * t80 + 0.568064746731155802512 * t82 - 0.748510748171101098635 * t84;
+  const T t117 = t1 + 0.120536680255323053349 * t75 - 0.970941817426052027157 * t77 - 0.35460488704253562597 * t79 + 0.8854560256532098959 * t81 + 0.568064746731155802512 * t83 - 0.748510748171101098635 * t85;
+  const T t118 = 0.992708874098053992801 * t87 + 0.239315664287557767149 * t89 - 0.93501624268541482344 * t91 - 0.464723172043768545656 * t93 + 0.82298386589365639458 * t95 + 0.663122658240795202377 * t97;
+  const T t119 = 0.992708874098053992801 * t86 + 0.239315664287557767149 * t88 - 0.93501624268541482344 * t90 - 0.464723172043768545656 * t92 + 0.82298386589365639458 * t94 + 0.663122658240795202377 * t96;
+  const T t120 = t116 + t118;
+  const T t121 = t117 - t119;
+  p.StC(re + 3 * s, im + 3 * s, t120, t121);
+  const T t122 = t116 - t118;
+  const T t123 = t117 + t119;
+  p.StC(re + 10 * s, im + 10 * s, t122, t123);
+  const T t124 = t0 - 0.35460488704253562597 * t74 - 0.748510748171101098635 * t76 + 0.8854560256532098959 * t78 + 0.120536680255323053349 * t80 - 0.970941817426052027157 * t82 + 0.568064746731155802512 * t84;
+  const T t125 = t1 - 0.35460488704253562597 * t75 - 0.748510748171101098635 * t77 + 0.8854560256532098959 * t79 + 0.120536680255323053349 * t81 - 0.970941817426052027157 * t83 + 0.568064746731155802512 * t85;
+  const T t126 = 0.93501624268541482344 * t87 - 0.663122658240795202377 * t89 - 0.464723172043768545656 * t91 + 0.992708874098053992801 * t93 - 0.239315664287557767149 * t95 - 0.82298386589365639458 * t97;
+  const T t127 = 0.93501624268541482344 * t86 - 0.663122658240795202377 * t88 - 0.464723172043768545656 * t90 + 0.992708874098053992801 * t92 - 0.239315664287557767149 * t94 - 0.82298386589365639458 * t96;
+  const T t128 = t124 + t126;
+  const T t129 = t125 - t127;
+  p.StC(re + 4 * s, im + 4 * s, t128, t129);
+  const T t130 = t124 - t126;
+  const T t131 = t125 + t127;
+  p.StC(re + 9 * s, im + 9 * s, t130, t131);
+  const T t132 = t0 - 0.748510748171101098635 * t74 + 0.120536680255323053349 * t76 + 0.568064746731155802512 * t78 - 0.970941817426052027157 * t80 + 0.8854560256532098959 * t82 - 0.35460488704253562597 * t84;
+  const T t133 = t1 - 0.748510748171101098635 * t75 + 0.120536680255323053349 * t77 + 0.568064746731155802512 * t79 - 0.970941817426052027157 * t81 + 0.8854560256532098959 * t83 - 0.35460488704253562597 * t85;
+  const T t134 = 0.663122658240795202377 * t87 - 0.992708874098053992801 * t89 + 0.82298386589365639458 * t91 - 0.239315664287557767149 * t93 - 0.464723172043768545656 * t95 + 0.93501624268541482344 * t97;
+  const T t135 = 0.663122658240795202377 * t86 - 0.992708874098053992801 * t88 + 0.82298386589365639458 * t90 - 0.239315664287557767149 * t92 - 0.464723172043768545656 * t94 + 0.93501624268541482344 * t96;
+  const T t136 = t132 + t134;
+  const T t137 = t133 - t135;
+  p.StC(re + 5 * s, im + 5 * s, t136, t137);
+  const T t138 = t132 - t134;
+  const T t139 = t133 + t135;
+  p.StC(re + 8 * s, im + 8 * s, t138, t139);
+  const T t140 = t0 - 0.970941817426052027157 * t74 + 0.8854560256532098959 * t76 - 0.748510748171101098635 * t78 + 0.568064746731155802512 * t80 - 0.35460488704253562597 * t82 + 0.120536680255323053349 * t84;
+  const T t141 = t1 - 0.970941817426052027157 * t75 + 0.8854560256532098959 * t77 - 0.748510748171101098635 * t79 + 0.568064746731155802512 * t81 - 0.35460488704253562597 * t83 + 0.120536680255323053349 * t85;
+  const T t142 = 0.239315664287557767149 * t87 - 0.464723172043768545656 * t89 + 0.663122658240795202377 * t91 - 0.82298386589365639458 * t93 + 0.93501624268541482344 * t95 - 0.992708874098053992801 * t97;
+  const T t143 = 0.239315664287557767149 * t86 - 0.464723172043768545656 * t88 + 0.663122658240795202377 * t90 - 0.82298386589365639458 * t92 + 0.93501624268541482344 * t94 - 0.992708874098053992801 * t96;
+  const T t144 = t140 + t142;
+  const T t145 = t141 - t143;
+  p.StC(re + 6 * s, im + 6 * s, t144, t145);
+  const T t146 = t140 - t142;
+  const T t147 = t141 + t143;
+  p.StC(re + 7 * s, im + 7 * s, t146, t147);
+}
+
+template <class P>
+FFTK_BODY void RealDft13(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + is);
+  const T t12 = p.Ld(x + 12 * is);
+  const T t13 = t1 + t12;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t11 = p.Ld(x + 11 * is);
+  const T t14 = t2 + t11;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t10 = p.Ld(x + 10 * is);
+  const T t15 = t3 + t10;
+  const T t4 = p.Ld(x + 4 * is);
+  const T t9 = p.Ld(x + 9 * is);
+  const T t16 = t4 + t9;
+  const T t5 = p.Ld(x + 5 * is);
+  const T t8 = p.Ld(x + 8 * is);
+  const T t17 = t5 + t8;
+  const T t6 = p.Ld(x + 6 * is);
+  const T t7 = p.Ld(x + 7 * is);
+  const T t18 = t6 + t7;
+  const T t19 = t1 - t12;
+  const T t20 = t2 - t11;
+  const T t21 = t3 - t10;
+  const T t22 = t4 - t9;
+  const T t23 = t5 - t8;
+  const T t24 = t6 - t7;
+  const T t0 = p.Ld(x);
+  const T t25 = t0 + t13 + t14 + t15 + t16 + t17 + t18;
+  p.St(y, t25);
+  const T t26 = t0 + 0.8854560256532098959 * t13 + 0.568064746731155802512 * t14 + 0.120536680255323053349 * t15 - 0.35460488704253562597 * t16 - 0.748510748171101098635 * t17 - 0.970941817426052027157 * t18;
+  p.St(y + os, t26);
+  const T t27 = 0.464723172043768545656 * t19 + 0.82298386589365639458 * t20 + 0.992708874098053992801 * t21 + 0.93501624268541482344 * t22 + 0.663122658240795202377 * t23 + 0.239315664287557767149 * t24;
+  p.St(y + 12 * os, -t27);
+  const T t28 = t0 + 0.568064746731155802512 * t13 - 0.35460488704253562597 * t14 - 0.970941817426052027157 * t15 - 0.748510748171101098635 * t16 + 0.120536680255323053349 * t17 + 0.8854560256532098959 * t18;
+  p.St(y + 2 * os, t28);
+  const T t29 = 0.82298386589365639458 * t19 + 0.93501624268541482344 * t20 + 0.239315664287557767149 * t21 - 0.663122658240795202377 * t22 - 0.992708874098053992801 * t23 - 0.464723172043768545656 * t24;
+  p.St(y + 11 * os, -t29);
+  const T t30 = t0 + 0.120536680255323053349 * t13 - 0.970941817426052027157 * t14 - 0.35460488704253562597 * t15 + 0.8854560256532098959 * t16 + 0.568064746731155802512 * t17 - 0.748510748171101098635 * t18;
+  p.St(y + 3 * os, t30);
+  const T t31 = 0.992708874098053992801 * t19 + 0.239315664287557767149 * t20 - 0.93501624268541482344 * t21 - 0.464723172043768545656 * t22 + 0.82298386589365639458 * t23 + 0.663122658240795202377 * t24;
+  p.St(y + 10 * os, -t31);
+  const T t32 = t0 - 0.35460488704253562597 * t13 - 0.748510748171101098635 * t14 + 0.8854560256532098959 * t15 + 0.120536680255323053349 * t16 - 0.970941817426052027157 * t17 + 0.568064746731155802512 * t18;
+  p.St(y + 4 * os, t32);
+  const T t33 = 0.93501624268541482344 * t19 - 0.663122658240795202377 * t20 - 0.464723172043768545656 * t21 + 0.992708874098053992801 * t22 - 0.239315664287557767149 * t23 - 0.82298386589365639458 * t24;
+  p.St(y + 9 * os, -t33);
+  const T t34 = t0 - 0.748510748171101098635 * t13 + 0.120536680255323053349 * t14 + 0.568064746731155802512 * t15 - 0.970941817426052027157 * t16 + 0.8854560256532098959 * t17 - 0.35460488704253562597 * t18;
+  p.St(y + 5 * os, t34);
+  const T t35 = 0.663122658240795202377 * t19 - 0.992708874098053992801 * t20 + 0.82298386589365639458 * t21 - 0.239315664287557767149 * t22 - 0.464723172043768545656 * t23 + 0.93501624268541482344 * t24;
+  p.St(y + 8 * os, -t35);
+  const T t36 = t0 - 0.970941817426052027157 * t13 + 0.8854560256532098959 * t14 - 0.748510748171101098635 * t15 + 0.568064746731155802512 * t16 - 0.35460488704253562597 * t17 + 0.120536680255323053349 * t18;
+  p.St(y + 6 * os, t36);
+  const T t37 = 0.239315664287557767149 * t19 - 0.464723172043768545656 * t20 + 0.663122658240795202377 * t21 - 0.82298386589365639458 * t22 + 0.93501624268541482344 * t23 - 0.992708874098053992801 * t24;
+  p.St(y + 7 * os, -t37);
+}
+
+template <class P>
+FFTK_BODY void RealTw13(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = p.Ld(a + 5 * s);
+  const T t27 = p.LdB(b + 5 * s);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  const T t32 = p.Ld(a + 6 * s);
+  const T t33 = p.LdB(b + 6 * s);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = p.Ld(a + 7 * s);
+  const T t39 = p.LdB(b + 7 * s);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  const T t44 = p.Ld(a + 8 * s);
+  const T t45 = p.LdB(b + 8 * s);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  const T t50 = p.Ld(a + 9 * s);
+  const T t51 = p.LdB(b + 9 * s);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  const T t56 = p.Ld(a + 10 * s);
+  const T t57 = p.LdB(b + 10 * s);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  const T t62 = p.Ld(a + 11 * s);
+  const T t63 = p.LdB(b + 11 * s);
+  const T t64 = p.LdW(wc + 10);
+  const T t65 = p.LdW(ws + 10);
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
+  const T t68 = p.Ld(a + 12 * s);
+  const T t69 = p.LdB(b + 12 * s);
+  const T t70 = p.LdW(wc + 11);
+  const T t71 = p.LdW(ws + 11);
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
+  const T t74 = t6 + t72;
+  const T t75 = t7 + t73;
+  const T t76 = t12 + t66;
+  const T t77 = t13 + t67;
+  const T t78 = t18 + t60;
+  const T t79 = t19 + t61;
+  const T t80 = t24 + t54;
+  const T t81 = t25 + t55;
+  const T t82 = t30 + t48;
+  const T t83 = t31 + t49;
+  const T t84 = t36 + t42;
+  const T t85 = t37 + t43;
+  const T t86 = t6 - t72;
+  const T t87 = t7 - t73;
+  const T t88 = t12 - t66;
+  const T t89 = t13 - t67;
+  const T t90 = t18 - t60;
+  const T t91 = t19 - t61;
+  const T t92 = t24 - t54;
+  const T t93 = t25 - t55;
+  const T t94 = t30 - t48;
+  const T t95 = t31 - t49;
+  const T t96 = t36 - t42;
+  const T t97 = t37 - t43;
+  const T t0 = p.Ld(a);
+  const T t98 = t0 + t74 + t76 + t78 + t80 + t82 + t84;
+  const T t1 = p.LdB(b);
+  p.St(a, t98);
+  const T t99 = t1 + t75 + t77 + t79 + t81 + t83 + t85;
+  p.StB(b + 12 * s, t99);
+  const T t100 = t0 + 0.8854560256532098959 * t74 + 0.568064746731155802512 * t76 + 0.120536680255323053349 * t78 - 0.35460488704253562597 * t80 - 0.748510748171101098635 * t82 - 0.970941817426052027157 * t84;
+  const T t101 = t1 + 0.8854560256532098959 * t75 + 0.568064746731155802512 * t77 + 0.120536680255323053349 * t79 - 0.35460488704253562597 * t81 - 0.748510748171101098635 * t83 - 0.970941817426052027157 * t85;
+  const T t102 = 0.464723172043768545656 * t87 + 0.82298386589365639458 * t89 + 0.992708874098053992801 * t91 + 0.93501624268541482344 * t93 + 0.663122658240795202377 * t95 + 0.239315664287557767149 * t97;
+  const T t103 = 0.464723172043768545656 * t86 + 0.82298386589365639458 * t88 + 0.992708874098053992801 * t90 + 0.93501624268541482344 * t92 + 0.663122658240795202377 * t94 + 0.239315664287557767149 * t96;
+  const T t104 = t100 + t102;
+  p.St(a + s, t104);
+  const T t105 = t101 - t103;
+  p.StB(b + 11 * s, t105);
+  const T t106 = t100 - t102;
+  p.StB(b, t106);
+  const T t107 = t101 + t103;
+  p.St(a + 12 * s, -t107);
+  const T t108 = t0 + 0.568064746731155802512 * t74 - 0.35460488704253562597 * t76 - 0.970941817426052027157 * t78 - 0.748510748171101098635 * t80 + 0.120536680255323053349 * t82 + 0.8854560256532098959 * t84;
+  const T t109 = t1 + 0.568064746731155802512 * t75 - 0.35460488704253562597 * t77 - 0.970941817426052027157 * t79 - 0.748510748171101098635 * t81 + 0.120536680255323053349 * t83 + 0.8854560256532098959 * t85;
+  const T t110 = 0.82298386589365639458 * t87 + 0.93501624268541482344 * t89 + 0.239315664287557767149 * t91 - 0.663122658240795202377 * t93 - 0.992708874098053992801 * t95 - 0.464723172043768545656 * t97;
+  const T t111 = 0.82298386589365639458 * t86 + 0.93501624268541482344 * t88 + 0.239315664287557767149 * t90 - 0.663122658240795202377 * t92 - 0.992708874098053992801 * t94 - 0.464723172043768545656 * t96;
+  const T t112 = t108 + t110;
+  p.St(a + 2 * s, t112);
+  const T t113 = t109 - t111;
+  p.StB(b + 10 * s, t113);
+  const T t114 = t108 - t110;
+  p.StB(b + s, t114);
+  const T t115 = t109 + t111;
+  p.St(a + 11 * s, -t115);
+  const T t116 = t0 + 0.120536680255323053349 * t74 - 0.970941817426052027157 * t76 - 0.35460488704253562597 * t78 + 0.8854560256532098959 * t80 + 0.568064746731155802512 * t82 - 0.748510748171101098635 * t84;
+  const T t117 = t1 + 0.120536680255323053349 * t75 - 0.970941817426052027157 * t77 - 0.35460488704253562597 * t79 + 0.8854560256532098959 * t81 + 0.568064746731155802512 * t83 - 0.748510748171101098635 * t85;
+  const T t118 = 0.992708874098053992801 * t87 + 0.239315664287557767149 * t89 - 0.93501624268541482344 * t91 - 0.464723172043768545656 * t93 + 0.82298386589365639458 * t95 + 0.663122658240795202377 * t97;
+  const T t119 = 0.992708874098053992801 * t86 + 0.239315664287557767149 * t88 - 0.93501624268541482344 * t90 - 0.464723172043768545656 * t92 + 0.82298386589365639458 * t94 + 0.663122658240795202377 * t96;
+  const T t120 = t116 + t118;
+  p.St(a + 3 * s, t120);
+  const T t121 = t117 - t119;
+  p.StB(b + 9 * s, t121);
+  const T t122 = t116 - t118;
+  p.StB(b + 2 * s, t122);
+  const T t123 = t117 + t119;
+  p.St(a + 10 * s, -t123);
+  const T t124 = t0 - 0.35460488704253562597 * t74 - 0.748510748171101098635 * t76 + 0.8854560256532098959 * t78 + 0.120536680255323053349 * t80 - 0.970941817426052027157 * t82 + 0.568064746731155802512 * t84;
+  const T t125 = t1 - 0.35460488704253562597 * t75 - 0.748510748171101098635 * t77 + 0.8854560256532098959 * t79 + 0.120536680255323053349 * t81 - 0.970941817426052027157 * t83 + 0.568064746731155802512 * t85;
+  const T t126 = 0.93501624268541482344 * t87 - 0.663122658240795202377 * t89 - 0.464723172043768545656 * t91 + 0.992708874098053992801 * t93 - 0.239315664287557767149 * t95 - 0.82298386589365639458 * t97;
+  const T t127 = 0.93501624268541482344 * t86 - 0.663122658240795202377 * t88 - 0.464723172043768545656 * t90 + 0.992708874098053992801 * t92 - 0.239315664287557767149 * t94 - 0.82298386589365639458 * t96;
+  const T t128 = t124 + t126;
+  p.St(a + 4 * s, t128);
+  const T t129 = t125 - t127;
+  p.StB(b + 8 * s, t129);
+  const T t130 = t124 - t126;
+  p.StB(b + 3 * s, t130);
+  const T t131 = t125 + t127;
+  p.St(a + 9 * s, -t131);
+  const T t132 = t0 - 0.748510748171101098635 * t74 + 0.120536680255323053349 * t76 + 0.568064746731155802512 * t78 - 0.970941817426052027157 * t80 + 0.8854560256532098959 * t82 - 0.35460488704253562597 * t84;
+  const T t133 = t1 - 0.748510748171101098635 * t75 + 0.120536680255323053349 * t77 + 0.568064746731155802512 * t79 - 0.970941817426052027157 * t81 + 0.8854560256532098959 * t83 - 0.35460488704253562597 * t85;
+  const T t134 = 0.663122658240795202377 * t87 - 0.992708874098053992801 * t89 + 0.82298386589365639458 * t91 - 0.239315664287557767149 * t93 - 0.464723172043768545656 * t95 + 0.93501624268541482344 * t97;
+  const T t135 = 0.663122658240795202377 * t86 - 0.992708874098053992801 * t88 + 0.82298386589365639458 * t90 - 0.239315664287557767149 * t92 - 0.464723172043768545656 * t94 + 0.93501624268541482344 * t96;
+  const T t136 = t132 + t134;
+  p.St(a + 5 * s, t136);
+  const T t137 = t133 - t135;
+  p.StB(b + 7 * s, t137);
+  const T t138 = t132 - t134;
+  p.StB(b + 4 * s, t138);
+  const T t139 = t133 + t135;
+  p.St(a + 8 * s, -t139);
+  const T t140 = t0 - 0.970941817426052027157 * t74 + 0.8854560256532098959 * t76 - 0.748510748171101098635 * t78 + 0.568064746731155802512 * t80 - 0.35460488704253562597 * t82 + 0.120536680255323053349 * t84;
+  const T t141 = t1 - 0.970941817426052027157 * t75 + 0.8854560256532098959 * t77 - 0.748510748171101098635 * t79 + 0.568064746731155802512 * t81 - 0.35460488704253562597 * t83 + 0.120536680255323053349 * t85;
+  const T t142 = 0.239315664287557767149 * t87 - 0.464723172043768545656 * t89 + 0.663122658240795202377 * t91 - 0.82298386589365639458 * t93 + 0.93501624268541482344 * t95 - 0.992708874098053992801 * t97;
+  const T t143 = 0.239315664287557767149 * t86 - 0.464723172043768545656 * t88 + 0.663122658240795202377 * t90 - 0.82298386589365639458 * t92 + 0.93501624268541482344 * t94 - 0.992708874098053992801 * t96;
+  const T t144 = t140 + t142;
+  p.St(a + 6 * s, t144);
+  const T t145 = t141 - t143;
+  p.StB(b + 6 * s, t145);
+  const T t146 = t140 - t142;
+  p.StB(b + 5 * s, t146);
+  const T t147 = t141 + t143;
+  p.St(a + 7 * s, -t147);
+}
+
+template <class P>
+FFTK_BODY void RealHalf13(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.970941817426052027157 * t1;
+  const T t3 = 0.239315664287557767149 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.8854560256532098959 * t4;
+  const T t6 = 0.464723172043768545656 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.748510748171101098635 * t7;
+  const T t9 = 0.663122658240795202377 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.568064746731155802512 * t10;
+  const T t12 = 0.82298386589365639458 * t10;
+  const T t13 = p.Ld(x + 5 * s);
+  const T t14 = 0.35460488704253562597 * t13;
+  const T t15 = 0.93501624268541482344 * t13;
+  const T t16 = p.Ld(x + 6 * s);
+  const T t17 = 0.120536680255323053349 * t16;
+  const T t18 = 0.992708874098053992801 * t16;
+  const T t19 = p.Ld(x + 7 * s);
+  const T t20 = 0.120536680255323053349 * t19;
+  const T t21 = 0.992708874098053992801 * t19;
+  const T t22 = p.Ld(x + 8 * s);
+  const T t23 = 0.35460488704253562597 * t22;
+  const T t24 = 0.93501624268541482344 * t22;
+  const T t25 = p.Ld(x + 9 * s);
+  const T t26 = 0.568064746731155802512 * t25;
+  const T t27 = 0.82298386589365639458 * t25;
+  const T t28 = p.Ld(x + 10 * s);
+  const T t29 = 0.748510748171101098635 * t28;
+  const T t30 = 0.663122658240795202377 * t28;
+  const T t31 = p.Ld(x + 11 * s);
+  const T t32 = 0.8854560256532098959 * t31;
+  const T t33 = 0.464723172043768545656 * t31;
+  const T t34 = p.Ld(x + 12 * s);
+  const T t35 = 0.970941817426052027157 * t34;
+  const T t36 = 0.239315664287557767149 * t34;
+  const T t37 = t2 - t35;
+  const T t38 = t3 + t36;
+  const T t39 = t5 - t32;
+  const T t40 = t6 + t33;
+  const T t41 = t8 - t29;
+  const T t42 = t9 + t30;
+  const T t43 = t11 - t26;
+  const T t44 = t12 + t27;
+  const T t45 = t14 - t23;
+  const T t46 = t15 + t24;
+  const T t47 = t17 - t20;
+  const T t48 = t18 + t21;
+  const T t49 = t2 + t35;
+  const T t50 = t36 - t3;
+  const T t51 = t5 + t32;
+  const T t52 = t33 - t6;
+  const T t53 = t8 + t29;
+  const T t54 = t30 - t9;
+  const T t55 = t11 + t26;
+  const T t56 = t27 - t12;
+  const T t57 = t14 + t23;
+  const T t58 = t24 - t15;
+  const T t59 = t17 + t20;
+  const T t60 = t21 - t18;
+  const T t0 = p.Ld(x);
+  const T t61 = t0 + t37 + t39 + t41 + t43 + t45 + t47;
+  p.St(x, t61);
+  const T t62 = t38 + t40 + t42 + t44 + t46 + t48;
+  p.St(x + 12 * s, -t62);
+  const T t63 = t0 + 0.8854560256532098959 * t37 + 0.568064746731155802512 * t39 + 0.120536680255323053349 * t41 - 0.35460488704253562597 * t43 - 0.748510748171101098635 * t45 - 0.970941817426052027157 * t47;
+  const T t64 = 0.8854560256532098959 * t38 + 0.568064746731155802512 * t40 + 0.120536680255323053349 * t42 - 0.35460488704253562597 * t44 - 0.748510748171101098635 * t46 - 0.970941817426052027157 * t48;
+  const T t65 = 0.464723172043768545656 * t50 + 0.82298386589365639458 * t52 + 0.992708874098053992801 * t54 + 0.93501624268541482344 * t56 + 0.663122658240795202377 * t58 + 0.239315664287557767149 * t60;
+  const T t66 = 0.464723172043768545656 * t49 + 0.82298386589365639458 * t51 + 0.992708874098053992801 * t53 + 0.93501624268541482344 * t55 + 0.663122658240795202377 * t57 + 0.239315664287557767149 * t59;
+  const T t67 = t63 + t65;
+  p.St(x + s, t67);
+  const T t68 = t64 + t66;
+  p.St(x + 11 * s, -t68);
+  const T t71 = t0 + 0.568064746731155802512 * t37 - 0.35460488704253562597 * t39 - 0.970941817426052027157 * t41 - 0.748510748171101098635 * t43 + 0.120536680255323053349 * t45 + 0.8854560256532098959 * t47;
+  const T t72 = 0.35460488704253562597 * t40 - 0.568064746731155802512 * t38 + 0.970941817426052027157 * t42 + 0.748510748171101098635 * t44 - 0.120536680255323053349 * t46 - 0.8854560256532098959 * t48;
+  const T t73 = 0.82298386589365639458 * t50 + 0.93501624268541482344 * t52 + 0.239315664287557767149 * t54 - 0.663122658240795202377 * t56 - 0.992708874098053992801 * t58 - 0.464723172043768545656 * t60;
+  const T t74 = 0.82298386589365639458 * t49 + 0.93501624268541482344 * t51 + 0.239315664287557767149 * t53 - 0.663122658240795202377 * t55 - 0.992708874098053992801 * t57 - 0.464723172043768545656 * t59;
+  const T t75 = t71 + t73;
+  p.St(x + 2 * s, t75);
+  const T t76 = t72 - t74;
+  p.St(x + 10 * s, t76);
+  const T t79 = t0 + 0.120536680255323053349 * t37 - 0.970941817426052027157 * t39 - 0.35460488704253562597 * t41 + 0.8854560256532098959 * t43 + 0.568064746731155802512 * t45 - 0.748510748171101098635 * t47;
+  const T t80 = 0.970941817426052027157 * t40 - 0.120536680255323053349 * t38 + 0.35460488704253562597 * t42 - 0.8854560256532098959 * t44 - 0.568064746731155802512 * t46 + 0.748510748171101098635 * t48;
+  const T t81 = 0.992708874098053992801 * t50 + 0.239315664287557767149 * t52 - 0.93501624268541482344 * t54 - 0.464723172043768545656 * t56 + 0.82298386589365639458 * t58 + 0.663122658240795202377 * t60;
+  const T t82 = 0.992708874098053992801 * t49 + 0.239315664287557767149 * t51 - 0.93501624268541482344 * t53 - 0.464723172043768545656 * t55 + 0.82298386589365639458 * t57 + 0.663122658240795202377 * t59;
+  const T t83 = t79 + t81;
+  p.St(x + 3 * s, t83);
+  const T t84 = t80 - t82;
+  p.St(x + 9 * s, t84);
+  const T t87 = t0 - 0.35460488704253562597 * t37 - 0.748510748171101098635 * t39 + 0.8854560256532098959 * t41 + 0.120536680255323053349 * t43 - 0.970941817426052027157 * t45 + 0.568064746731155802512 * t47;
+  const T t88 = 0.35460488704253562597 * t38 + 0.748510748171101098635 * t40 - 0.8854560256532098959 * t42 - 0.120536680255323053349 * t44 + 0.970941817426052027157 * t46 - 0.568064746731155802512 * t48;
+  const T t89 = 0.93501624268541482344 * t50 - 0.663122658240795202377 * t52 - 0.464723172043768545656 * t54 + 0.992708874098053992801 * t56 - 0.239315664287557767149 * t58 - 0.82298386589365639458 * t60;
+  const T t90 = 0.93501624268541482344 * t49 - 0.663122658240795202377 * t51 - 0.464723172043768545656 * t53 + 0.992708874098053992801 * t55 - 0.239315664287557767149 * t57 - 0.82298386589365639458 * t59;
+  const T t91 = t87 + t89;
+  p.St(x + 4 * s, t91);
+  const T t92 = t88 - t90;
+  p.St(x + 8 * s, t92);
+  const T t95 = t0 - 0.748510748171101098635 * t37 + 0.120536680255323053349 * t39 + 0.568064746731155802512 * t41 - 0.970941817426052027157 * t43 + 0.8854560256532098959 * t45 - 0.35460488704253562597 * t47;
+  const T t96 = 0.748510748171101098635 * t38 - 0.120536680255323053349 * t40 - 0.568064746731155802512 * t42 + 0.970941817426052027157 * t44 - 0.8854560256532098959 * t46 + 0.35460488704253562597 * t48;
+  const T t97 = 0.663122658240795202377 * t50 - 0.992708874098053992801 * t52 + 0.82298386589365639458 * t54 - 0.239315664287557767149 * t56 - 0.464723172043768545656 * t58 + 0.93501624268541482344 * t60;
+  const T t98 = 0.663122658240795202377 * t49 - 0.992708874098053992801 * t51 + 0.82298386589365639458 * t53 - 0.239315664287557767149 * t55 - 0.464723172043768545656 * t57 + 0.93501624268541482344 * t59;
+  const T t99 = t95 + t97;
+  p.St(x + 5 * s, t99);
+  const T t100 = t96 - t98;
+  p.St(x + 7 * s, t100);
+  const T t103 = t0 - 0.970941817426052027157 * t37 + 0.8854560256532098959 * t39 - 0.748510748171101098635 * t41 + 0.568064746731155802512 * t43 - 0.35460488704253562597 * t45 + 0.120536680255323053349 * t47;
+  const T t105 = 0.239315664287557767149 * t50 - 0.464723172043768545656 * t52 + 0.663122658240795202377 * t54 - 0.82298386589365639458 * t56 + 0.93501624268541482344 * t58 - 0.992708874098053992801 * t60;
+  const T t107 = t103 + t105;
+  p.St(x + 6 * s, t107);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 13 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft13(p, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
+  } else {
+    const Lane4Access p{is, 13 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft13(p, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw13(Interleaved4FirstAccess{os, os, 0, 12}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 12};
+    for (; k + 3 < m; k += 4) DftTw13(p, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
+  } else {
+    DftTw13(Lane4FirstAccess{os, os, 0, 12}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 12};
+    for (; k + 3 < m; k += 4) DftTw13(p, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 13 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft13(p, in + t * is, ls, out + t * 13 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 12};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw13(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf13(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 13 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft13(p, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft13(p, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
   } else {
     const LaneAccess p{is, 13 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft13(p, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft13(p, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft13(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os,
-          outIm + t * 13 * os, os);
-  }
+  for (; t < c; ++t) Dft13(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle13(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle13(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft13(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft13(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 12};
-    for (; k + 1 < m; k += 2) {
-      DftTw13(p, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
-    }
+    for (; k + 1 < m; k += 2) DftTw13(p, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
   } else {
     const LaneAccess p{os, os, 0, 12};
-    for (; k + 1 < m; k += 2) {
-      DftTw13(p, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
-    }
+    for (; k + 1 < m; k += 2) DftTw13(p, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
   }
-  for (; k < m; ++k) {
-    DftTw13(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 12,
-           twSin + (k - 1) * 12);
-  }
+  for (; k < m; ++k) DftTw13(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
 }
 
 FFTK_CLONES
 void FftRealLeaf13(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 13 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 13 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft13(p, in + t * is, ls, out + t * 13 * os, os);
   for (; t < c; ++t) RealDft13(ScalarAccess{}, in + t * is, ls, out + t * 13 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle13(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle13(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft13(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 12};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw13(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 12,
-            twSin + (k - 1) * 12);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw13(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 12,
-            twSin + (k - 1) * 12);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 12};
+  for (; 2 * (k + 1) < m; k += 2) RealTw13(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
+  for (; 2 * k < m; ++k) RealTw13(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
   if (m % 2 == 0) RealHalf13(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

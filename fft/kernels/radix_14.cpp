@@ -4,8 +4,9 @@
 // twiddled complex DFT 186, 148; real DFT 83, 60; real combining group 186, 148.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -17,8 +18,8 @@ using fftk::LaneAccess;
 using fftk::ScalarAccess;
 
 template <class P>
-inline void Dft14(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+FFTK_BODY void Dft14(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
@@ -181,87 +182,87 @@ inline void Dft14(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 }
 
 template <class P>
-inline void DftTw14(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+FFTK_BODY void DftTw14(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   T t26, t27;
   p.LdC(re + 5 * s, im + 5 * s, t26, t27);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   T t32, t33;
   p.LdC(re + 6 * s, im + 6 * s, t32, t33);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   T t38, t39;
   p.LdC(re + 7 * s, im + 7 * s, t38, t39);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   T t44, t45;
   p.LdC(re + 8 * s, im + 8 * s, t44, t45);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   T t50, t51;
   p.LdC(re + 9 * s, im + 9 * s, t50, t51);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   T t56, t57;
   p.LdC(re + 10 * s, im + 10 * s, t56, t57);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   T t62, t63;
   p.LdC(re + 11 * s, im + 11 * s, t62, t63);
   const T t64 = p.LdW(wc + 10);
   const T t65 = p.LdW(ws + 10);
-  const T t66 = t62 * t64 - t63 * t65;
-  const T t67 = t63 * t64 + t62 * t65;
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
   T t68, t69;
   p.LdC(re + 12 * s, im + 12 * s, t68, t69);
   const T t70 = p.LdW(wc + 11);
   const T t71 = p.LdW(ws + 11);
-  const T t72 = t68 * t70 - t69 * t71;
-  const T t73 = t69 * t70 + t68 * t71;
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
   T t74, t75;
   p.LdC(re + 13 * s, im + 13 * s, t74, t75);
   const T t76 = p.LdW(wc + 12);
   const T t77 = p.LdW(ws + 12);
-  const T t78 = t74 * t76 - t75 * t77;
-  const T t79 = t75 * t76 + t74 * t77;
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
   T t0, t1;
   p.LdC(re, im, t0, t1);
   const T t80 = t0 + t42;
@@ -397,7 +398,7 @@ inline void DftTw14(const P& p, double* re, double* im, ptrdiff_t s, const doubl
 }
 
 template <class P>
-inline void RealDft14(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+FFTK_BODY void RealDft14(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t0 = p.Ld(x);
   const T t7 = p.Ld(x + 7 * is);
@@ -498,87 +499,87 @@ inline void RealDft14(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 }
 
 template <class P>
-inline void RealTw14(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+FFTK_BODY void RealTw14(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = p.Ld(a + 5 * s);
   const T t27 = p.LdB(b + 5 * s);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   const T t32 = p.Ld(a + 6 * s);
   const T t33 = p.LdB(b + 6 * s);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = p.Ld(a + 7 * s);
   const T t39 = p.LdB(b + 7 * s);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   const T t44 = p.Ld(a + 8 * s);
   const T t45 = p.LdB(b + 8 * s);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   const T t50 = p.Ld(a + 9 * s);
   const T t51 = p.LdB(b + 9 * s);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   const T t56 = p.Ld(a + 10 * s);
   const T t57 = p.LdB(b + 10 * s);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   const T t62 = p.Ld(a + 11 * s);
   const T t63 = p.LdB(b + 11 * s);
   const T t64 = p.LdW(wc + 10);
   const T t65 = p.LdW(ws + 10);
-  const T t66 = t62 * t64 - t63 * t65;
-  const T t67 = t63 * t64 + t62 * t65;
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
   const T t68 = p.Ld(a + 12 * s);
   const T t69 = p.LdB(b + 12 * s);
   const T t70 = p.LdW(wc + 11);
   const T t71 = p.LdW(ws + 11);
-  const T t72 = t68 * t70 - t69 * t71;
-  const T t73 = t69 * t70 + t68 * t71;
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
   const T t74 = p.Ld(a + 13 * s);
   const T t75 = p.LdB(b + 13 * s);
   const T t76 = p.LdW(wc + 12);
   const T t77 = p.LdW(ws + 12);
-  const T t78 = t74 * t76 - t75 * t77;
-  const T t79 = t75 * t76 + t74 * t77;
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
   const T t0 = p.Ld(a);
   const T t80 = t0 + t42;
   const T t1 = p.LdB(b);
@@ -728,7 +729,7 @@ inline void RealTw14(const P& p, double* a, double* b, ptrdiff_t s, const double
 }
 
 template <class P>
-inline void RealHalf14(const P& p, double* x, ptrdiff_t s) {
+FFTK_BODY void RealHalf14(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
   const T t1 = p.Ld(x + s);
   const T t2 = 0.974927912181823607018 * t1;
@@ -880,75 +881,992 @@ inline void RealHalf14(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf14(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+FFTK_BODY void Dft14(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
+  const T t28 = t0 + t14;
+  const T t29 = t1 + t15;
+  const T t30 = t0 - t14;
+  const T t31 = t1 - t15;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t16, t17;
+  p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
+  const T t32 = t2 + t16;
+  const T t33 = t3 + t17;
+  const T t34 = t2 - t16;
+  const T t35 = t3 - t17;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t18, t19;
+  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
+  const T t36 = t4 + t18;
+  const T t37 = t5 + t19;
+  const T t38 = t4 - t18;
+  const T t39 = t5 - t19;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t20, t21;
+  p.LdC(xr + 10 * is, xi + 10 * is, t20, t21);
+  const T t40 = t6 + t20;
+  const T t41 = t7 + t21;
+  const T t42 = t6 - t20;
+  const T t43 = t7 - t21;
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  T t22, t23;
+  p.LdC(xr + 11 * is, xi + 11 * is, t22, t23);
+  const T t44 = t8 + t22;
+  const T t45 = t9 + t23;
+  const T t46 = t8 - t22;
+  const T t47 = t9 - t23;
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  T t24, t25;
+  p.LdC(xr + 12 * is, xi + 12 * is, t24, t25);
+  const T t48 = t10 + t24;
+  const T t49 = t11 + t25;
+  const T t50 = t10 - t24;
+  const T t51 = t11 - t25;
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  T t26, t27;
+  p.LdC(xr + 13 * is, xi + 13 * is, t26, t27);
+  const T t52 = t12 + t26;
+  const T t53 = t13 + t27;
+  const T t54 = t12 - t26;
+  const T t55 = t13 - t27;
+  const T t56 = t32 + t52;
+  const T t57 = t33 + t53;
+  const T t58 = t36 + t48;
+  const T t59 = t37 + t49;
+  const T t60 = t40 + t44;
+  const T t61 = t41 + t45;
+  const T t62 = t32 - t52;
+  const T t63 = t33 - t53;
+  const T t64 = t36 - t48;
+  const T t65 = t37 - t49;
+  const T t66 = t40 - t44;
+  const T t67 = t41 - t45;
+  const T t68 = t28 + t56 + t58 + t60;
+  const T t69 = t29 + t57 + t59 + t61;
+  p.StC(yr, yi, t68, t69);
+  const T t70 = t28 + 0.623489801858733530525 * t56 - 0.222520933956314404289 * t58 - 0.900968867902419126236 * t60;
+  const T t71 = t29 + 0.623489801858733530525 * t57 - 0.222520933956314404289 * t59 - 0.900968867902419126236 * t61;
+  const T t72 = 0.781831482468029808708 * t63 + 0.974927912181823607018 * t65 + 0.433883739117558120476 * t67;
+  const T t73 = 0.781831482468029808708 * t62 + 0.974927912181823607018 * t64 + 0.433883739117558120476 * t66;
+  const T t74 = t70 + t72;
+  const T t75 = t71 - t73;
+  p.StC(yr + 2 * os, yi + 2 * os, t74, t75);
+  const T t76 = t70 - t72;
+  const T t77 = t71 + t73;
+  p.StC(yr + 12 * os, yi + 12 * os, t76, t77);
+  const T t78 = t28 - 0.222520933956314404289 * t56 - 0.900968867902419126236 * t58 + 0.623489801858733530525 * t60;
+  const T t79 = t29 - 0.222520933956314404289 * t57 - 0.900968867902419126236 * t59 + 0.623489801858733530525 * t61;
+  const T t80 = 0.974927912181823607018 * t63 - 0.433883739117558120476 * t65 - 0.781831482468029808708 * t67;
+  const T t81 = 0.974927912181823607018 * t62 - 0.433883739117558120476 * t64 - 0.781831482468029808708 * t66;
+  const T t82 = t78 + t80;
+  const T t83 = t79 - t81;
+  p.StC(yr + 4 * os, yi + 4 * os, t82, t83);
+  const T t84 = t78 - t80;
+  const T t85 = t79 + t81;
+  p.StC(yr + 10 * os, yi + 10 * os, t84, t85);
+  const T t86 = t28 - 0.900968867902419126236 * t56 + 0.623489801858733530525 * t58 - 0.222520933956314404289 * t60;
+  const T t87 = t29 - 0.900968867902419126236 * t57 + 0.623489801858733530525 * t59 - 0.222520933956314404289 * t61;
+  const T t88 = 0.433883739117558120476 * t63 - 0.781831482468029808708 * t65 + 0.974927912181823607018 * t67;
+  const T t89 = 0.433883739117558120476 * t62 - 0.781831482468029808708 * t64 + 0.974927912181823607018 * t66;
+  const T t90 = t86 + t88;
+  const T t91 = t87 - t89;
+  p.StC(yr + 6 * os, yi + 6 * os, t90, t91);
+  const T t92 = t86 - t88;
+  const T t93 = t87 + t89;
+  p.StC(yr + 8 * os, yi + 8 * os, t92, t93);
+  const T t94 = 0.900968867902419126236 * t34 + 0.433883739117558120476 * t35;
+  const T t95 = 0.900968867902419126236 * t35 - 0.433883739117558120476 * t34;
+  const T t96 = 0.623489801858733530525 * t38 + 0.781831482468029808708 * t39;
+  const T t97 = 0.623489801858733530525 * t39 - 0.781831482468029808708 * t38;
+  const T t98 = 0.222520933956314404289 * t42 + 0.974927912181823607018 * t43;
+  const T t99 = 0.222520933956314404289 * t43 - 0.974927912181823607018 * t42;
+  const T t100 = 0.974927912181823607018 * t47 - 0.222520933956314404289 * t46;
+  const T t101 = 0.222520933956314404289 * t47 + 0.974927912181823607018 * t46;
+  const T t102 = 0.781831482468029808708 * t51 - 0.623489801858733530525 * t50;
+  const T t103 = 0.623489801858733530525 * t51 + 0.781831482468029808708 * t50;
+  const T t104 = 0.433883739117558120476 * t55 - 0.900968867902419126236 * t54;
+  const T t105 = 0.900968867902419126236 * t55 + 0.433883739117558120476 * t54;
+  const T t106 = t94 + t104;
+  const T t107 = t95 - t105;
+  const T t108 = t96 + t102;
+  const T t109 = t97 - t103;
+  const T t110 = t98 + t100;
+  const T t111 = t99 - t101;
+  const T t112 = t94 - t104;
+  const T t113 = t95 + t105;
+  const T t114 = t96 - t102;
+  const T t115 = t97 + t103;
+  const T t116 = t98 - t100;
+  const T t117 = t99 + t101;
+  const T t118 = t30 + t106 + t108 + t110;
+  const T t119 = t31 + t107 + t109 + t111;
+  p.StC(yr + os, yi + os, t118, t119);
+  const T t120 = t30 + 0.623489801858733530525 * t106 - 0.222520933956314404289 * t108 - 0.900968867902419126236 * t110;
+  const T t121 = t31 + 0.623489801858733530525 * t107 - 0.222520933956314404289 * t109 - 0.900968867902419126236 * t111;
+  const T t122 = 0.781831482468029808708 * t113 + 0.974927912181823607018 * t115 + 0.433883739117558120476 * t117;
+  const T t123 = 0.781831482468029808708 * t112 + 0.974927912181823607018 * t114 + 0.433883739117558120476 * t116;
+  const T t124 = t120 + t122;
+  const T t125 = t121 - t123;
+  p.StC(yr + 3 * os, yi + 3 * os, t124, t125);
+  const T t126 = t120 - t122;
+  const T t127 = t121 + t123;
+  p.StC(yr + 13 * os, yi + 13 * os, t126, t127);
+  const T t128 = t30 - 0.222520933956314404289 * t106 - 0.900968867902419126236 * t108 + 0.623489801858733530525 * t110;
+  const T t129 = t31 - 0.222520933956314404289 * t107 - 0.900968867902419126236 * t109 + 0.623489801858733530525 * t111;
+  const T t130 = 0.974927912181823607018 * t113 - 0.433883739117558120476 * t115 - 0.781831482468029808708 * t117;
+  const T t131 = 0.974927912181823607018 * t112 - 0.433883739117558120476 * t114 - 0.781831482468029808708 * t116;
+  const T t132 = t128 + t130;
+  const T t133 = t129 - t131;
+  p.StC(yr + 5 * os, yi + 5 * os, t132, t133);
+  const T t134 = t128 - t130;
+  const T t135 = t129 + t131;
+  p.StC(yr + 11 * os, yi + 11 * os, t134, t135);
+  const T t136 = t30 - 0.900968867902419126236 * t106 + 0.623489801858733530525 * t108 - 0.222520933956314404289 * t110;
+  const T t137 = t31 - 0.900968867902419126236 * t107 + 0.623489801858733530525 * t109 - 0.222520933956314404289 * t111;
+  const T t138 = 0.433883739117558120476 * t113 - 0.781831482468029808708 * t115 + 0.974927912181823607018 * t117;
+  const T t139 = 0.433883739117558120476 * t112 - 0.781831482468029808708 * t114 + 0.974927912181823607018 * t116;
+  const T t140 = t136 + t138;
+  const T t141 = t137 - t139;
+  p.StC(yr + 7 * os, yi + 7 * os, t140, t141);
+  const T t142 = t136 - t138;
+  const T t143 = t137 + t139;
+  p.StC(yr + 9 * os, yi + 9 * os, t142, t143);
+}
+
+template <class P>
+FFTK_BODY void DftTw14(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  T t26, t27;
+  p.LdC(re + 5 * s, im + 5 * s, t26, t27);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  T t32, t33;
+  p.LdC(re + 6 * s, im + 6 * s, t32, t33);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  T t38, t39;
+  p.LdC(re + 7 * s, im + 7 * s, t38, t39);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  T t44, t45;
+  p.LdC(re + 8 * s, im + 8 * s, t44, t45);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  T t50, t51;
+  p.LdC(re + 9 * s, im + 9 * s, t50, t51);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  T t56, t57;
+  p.LdC(re + 10 * s, im + 10 * s, t56, t57);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  T t62, t63;
+  p.LdC(re + 11 * s, im + 11 * s, t62, t63);
+  const T t64 = p.LdW(wc + 10);
+  const T t65 = p.LdW(ws + 10);
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
+  T t68, t69;
+  p.LdC(re + 12 * s, im + 12 * s, t68, t69);
+  const T t70 = p.LdW(wc + 11);
+  const T t71 = p.LdW(ws + 11);
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
+  T t74, t75;
+  p.LdC(re + 13 * s, im + 13 * s, t74, t75);
+  const T t76 = p.LdW(wc + 12);
+  const T t77 = p.LdW(ws + 12);
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t80 = t0 + t42;
+  const T t81 = t1 + t43;
+  const T t82 = t0 - t42;
+  const T t83 = t1 - t43;
+  const T t84 = t6 + t48;
+  const T t85 = t7 + t49;
+  const T t86 = t6 - t48;
+  const T t87 = t7 - t49;
+  const T t88 = t12 + t54;
+  const T t89 = t13 + t55;
+  const T t90 = t12 - t54;
+  const T t91 = t13 - t55;
+  const T t92 = t18 + t60;
+  const T t93 = t19 + t61;
+  const T t94 = t18 - t60;
+  const T t95 = t19 - t61;
+  const T t96 = t24 + t66;
+  const T t97 = t25 + t67;
+  const T t98 = t24 - t66;
+  const T t99 = t25 - t67;
+  const T t100 = t30 + t72;
+  const T t101 = t31 + t73;
+  const T t102 = t30 - t72;
+  const T t103 = t31 - t73;
+  const T t104 = t36 + t78;
+  const T t105 = t37 + t79;
+  const T t106 = t36 - t78;
+  const T t107 = t37 - t79;
+  const T t108 = t84 + t104;
+  const T t109 = t85 + t105;
+  const T t110 = t88 + t100;
+  const T t111 = t89 + t101;
+  const T t112 = t92 + t96;
+  const T t113 = t93 + t97;
+  const T t114 = t84 - t104;
+  const T t115 = t85 - t105;
+  const T t116 = t88 - t100;
+  const T t117 = t89 - t101;
+  const T t118 = t92 - t96;
+  const T t119 = t93 - t97;
+  const T t120 = t80 + t108 + t110 + t112;
+  const T t121 = t81 + t109 + t111 + t113;
+  p.StC(re, im, t120, t121);
+  const T t122 = t80 + 0.623489801858733530525 * t108 - 0.222520933956314404289 * t110 - 0.900968867902419126236 * t112;
+  const T t123 = t81 + 0.623489801858733530525 * t109 - 0.222520933956314404289 * t111 - 0.900968867902419126236 * t113;
+  const T t124 = 0.781831482468029808708 * t115 + 0.974927912181823607018 * t117 + 0.433883739117558120476 * t119;
+  const T t125 = 0.781831482468029808708 * t114 + 0.974927912181823607018 * t116 + 0.433883739117558120476 * t118;
+  const T t126 = t122 + t124;
+  const T t127 = t123 - t125;
+  p.StC(re + 2 * s, im + 2 * s, t126, t127);
+  const T t128 = t122 - t124;
+  const T t129 = t123 + t125;
+  p.StC(re + 12 * s, im + 12 * s, t128, t129);
+  const T t130 = t80 - 0.222520933956314404289 * t108 - 0.900968867902419126236 * t110 + 0.623489801858733530525 * t112;
+  const T t131 = t81 - 0.222520933956314404289 * t109 - 0.900968867902419126236 * t111 + 0.623489801858733530525 * t113;
+  const T t132 = 0.974927912181823607018 * t115 - 0.433883739117558120476 * t117 - 0.781831482468029808708 * t119;
+  const T t133 = 0.974927912181823607018 * t114 - 0.433883739117558120476 * t116 - 0.781831482468029808708 * t118;
+  const T t134 = t130 + t132;
+  const T t135 = t131 - t133;
+  p.StC(re + 4 * s, im + 4 * s, t134, t135);
+  const T t136 = t130 - t132;
+  const T t137 = t131 + t133;
+  p.StC(re + 10 * s, im + 10 * s, t136, t137);
+  const T t138 = t80 - 0.900968867902419126236 * t108 + 0.623489801858733530525 * t110 - 0.222520933956314404289 * t112;
+  const T t139 = t81 - 0.900968867902419126236 * t109 + 0.623489801858733530525 * t111 - 0.222520933956314404289 * t113;
+  const T t140 = 0.433883739117558120476 * t115 - 0.781831482468029808708 * t117 + 0.974927912181823607018 * t119;
+  const T t141 = 0.433883739117558120476 * t114 - 0.781831482468029808708 * t116 + 0.974927912181823607018 * t118;
+  const T t142 = t138 + t140;
+  const T t143 = t139 - t141;
+  p.StC(re + 6 * s, im + 6 * s, t142, t143);
+  const T t144 = t138 - t140;
+  const T t145 = t139 + t141;
+  p.StC(re + 8 * s, im + 8 * s, t144, t145);
+  const T t146 = 0.900968867902419126236 * t86 + 0.433883739117558120476 * t87;
+  const T t147 = 0.900968867902419126236 * t87 - 0.433883739117558120476 * t86;
+  const T t148 = 0.623489801858733530525 * t90 + 0.781831482468029808708 * t91;
+  const T t149 = 0.623489801858733530525 * t91 - 0.781831482468029808708 * t90;
+  const T t150 = 0.222520933956314404289 * t94 + 0.974927912181823607018 * t95;
+  const T t151 = 0.222520933956314404289 * t95 - 0.974927912181823607018 * t94;
+  const T t152 = 0.974927912181823607018 * t99 - 0.222520933956314404289 * t98;
+  const T t153 = 0.222520933956314404289 * t99 + 0.974927912181823607018 * t98;
+  const T t154 = 0.781831482468029808708 * t103 - 0.623489801858733530525 * t102;
+  const T t155 = 0.623489801858733530525 * t103 + 0.781831482468029808708 * t102;
+  const T t156 = 0.433883739117558120476 * t107 - 0.900968867902419126236 * t106;
+  const T t157 = 0.900968867902419126236 * t107 + 0.433883739117558120476 * t106;
+  const T t158 = t146 + t156;
+  const T t159 = t147 - t157;
+  const T t160 = t148 + t154;
+  const T t161 = t149 - t155;
+  const T t162 = t150 + t152;
+  const T t163 = t151 - t153;
+  const T t164 = t146 - t156;
+  const T t165 = t147 + t157;
+  const T t166 = t148 - t154;
+  const T t167 = t149 + t155;
+  const T t168 = t150 - t152;
+  const T t169 = t151 + t153;
+  const T t170 = t82 + t158 + t160 + t162;
+  const T t171 = t83 + t159 + t161 + t163;
+  p.StC(re + s, im + s, t170, t171);
+  const T t172 = t82 + 0.623489801858733530525 * t158 - 0.222520933956314404289 * t160 - 0.900968867902419126236 * t162;
+  const T t173 = t83 + 0.623489801858733530525 * t159 - 0.222520933956314404289 * t161 - 0.900968867902419126236 * t163;
+  const T t174 = 0.781831482468029808708 * t165 + 0.974927912181823607018 * t167 + 0.433883739117558120476 * t169;
+  const T t175 = 0.781831482468029808708 * t164 + 0.974927912181823607018 * t166 + 0.433883739117558120476 * t168;
+  const T t176 = t172 + t174;
+  const T t177 = t173 - t175;
+  p.StC(re + 3 * s, im + 3 * s, t176, t177);
+  const T t178 = t172 - t174;
+  const T t179 = t173 + t175;
+  p.StC(re + 13 * s, im + 13 * s, t178, t179);
+  const T t180 = t82 - 0.222520933956314404289 * t158 - 0.900968867902419126236 * t160 + 0.623489801858733530525 * t162;
+  const T t181 = t83 - 0.222520933956314404289 * t159 - 0.900968867902419126236 * t161 + 0.623489801858733530525 * t163;
+  const T t182 = 0.974927912181823607018 * t165 - 0.433883739117558120476 * t167 - 0.781831482468029808708 * t169;
+  const T t183 = 0.974927912181823607018 * t164 - 0.433883739117558120476 * t166 - 0.781831482468029808708 * t168;
+  const T t184 = t180 + t182;
+  const T t185 = t181 - t183;
+  p.StC(re + 5 * s, im + 5 * s, t184, t185);
+  const T t186 = t180 - t182;
+  const T t187 = t181 + t183;
+  p.StC(re + 11 * s, im + 11 * s, t186, t187);
+  const T t188 = t82 - 0.900968867902419126236 * t158 + 0.623489801858733530525 * t160 - 0.222520933956314404289 * t162;
+  const T t189 = t83 - 0.900968867902419126236 * t159 + 0.623489801858733530525 * t161 - 0.222520933956314404289 * t163;
+  const T t190 = 0.433883739117558120476 * t165 - 0.781831482468029808708 * t167 + 0.974927912181823607018 * t169;
+  const T t191 = 0.433883739117558120476 * t164 - 0.781831482468029808708 * t166 + 0.974927912181823607018 * t168;
+  const T t192 = t188 + t190;
+  const T t193 = t189 - t191;
+  p.StC(re + 7 * s, im + 7 * s, t192, t193);
+  const T t194 = t188 - t190;
+  const T t195 = t189 + t191;
+  p.StC(re + 9 * s, im + 9 * s, t194, t195);
+}
+
+template <class P>
+FFTK_BODY void RealDft14(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t7 = p.Ld(x + 7 * is);
+  const T t14 = t0 + t7;
+  const T t15 = t0 - t7;
+  const T t1 = p.Ld(x + is);
+  const T t8 = p.Ld(x + 8 * is);
+  const T t16 = t1 + t8;
+  const T t17 = t1 - t8;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t9 = p.Ld(x + 9 * is);
+  const T t18 = t2 + t9;
+  const T t19 = t2 - t9;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t10 = p.Ld(x + 10 * is);
+  const T t20 = t3 + t10;
+  const T t21 = t3 - t10;
+  const T t4 = p.Ld(x + 4 * is);
+  const T t11 = p.Ld(x + 11 * is);
+  const T t22 = t4 + t11;
+  const T t23 = t4 - t11;
+  const T t5 = p.Ld(x + 5 * is);
+  const T t12 = p.Ld(x + 12 * is);
+  const T t24 = t5 + t12;
+  const T t25 = t5 - t12;
+  const T t6 = p.Ld(x + 6 * is);
+  const T t13 = p.Ld(x + 13 * is);
+  const T t26 = t6 + t13;
+  const T t27 = t6 - t13;
+  const T t28 = t16 + t26;
+  const T t29 = t18 + t24;
+  const T t30 = t20 + t22;
+  const T t31 = t16 - t26;
+  const T t32 = t18 - t24;
+  const T t33 = t20 - t22;
+  const T t34 = t14 + t28 + t29 + t30;
+  p.St(y, t34);
+  const T t35 = t14 + 0.623489801858733530525 * t28 - 0.222520933956314404289 * t29 - 0.900968867902419126236 * t30;
+  p.St(y + 2 * os, t35);
+  const T t36 = 0.781831482468029808708 * t31 + 0.974927912181823607018 * t32 + 0.433883739117558120476 * t33;
+  p.St(y + 12 * os, -t36);
+  const T t37 = t14 - 0.222520933956314404289 * t28 - 0.900968867902419126236 * t29 + 0.623489801858733530525 * t30;
+  p.St(y + 4 * os, t37);
+  const T t38 = 0.974927912181823607018 * t31 - 0.433883739117558120476 * t32 - 0.781831482468029808708 * t33;
+  p.St(y + 10 * os, -t38);
+  const T t39 = t14 - 0.900968867902419126236 * t28 + 0.623489801858733530525 * t29 - 0.222520933956314404289 * t30;
+  p.St(y + 6 * os, t39);
+  const T t40 = 0.433883739117558120476 * t31 - 0.781831482468029808708 * t32 + 0.974927912181823607018 * t33;
+  p.St(y + 8 * os, -t40);
+  const T t41 = 0.900968867902419126236 * t17;
+  const T t42 = 0.433883739117558120476 * t17;
+  const T t43 = 0.623489801858733530525 * t19;
+  const T t44 = 0.781831482468029808708 * t19;
+  const T t45 = 0.222520933956314404289 * t21;
+  const T t46 = 0.974927912181823607018 * t21;
+  const T t47 = 0.222520933956314404289 * t23;
+  const T t48 = 0.974927912181823607018 * t23;
+  const T t49 = 0.623489801858733530525 * t25;
+  const T t50 = 0.781831482468029808708 * t25;
+  const T t51 = 0.900968867902419126236 * t27;
+  const T t52 = 0.433883739117558120476 * t27;
+  const T t53 = t41 - t51;
+  const T t54 = t42 + t52;
+  const T t55 = t43 - t49;
+  const T t56 = t44 + t50;
+  const T t57 = t45 - t47;
+  const T t58 = t46 + t48;
+  const T t59 = t41 + t51;
+  const T t60 = t52 - t42;
+  const T t61 = t43 + t49;
+  const T t62 = t50 - t44;
+  const T t63 = t45 + t47;
+  const T t64 = t48 - t46;
+  const T t65 = t15 + t53 + t55 + t57;
+  p.St(y + os, t65);
+  const T t66 = t54 + t56 + t58;
+  p.St(y + 13 * os, -t66);
+  const T t67 = t15 + 0.623489801858733530525 * t53 - 0.222520933956314404289 * t55 - 0.900968867902419126236 * t57;
+  const T t68 = 0.222520933956314404289 * t56 - 0.623489801858733530525 * t54 + 0.900968867902419126236 * t58;
+  const T t69 = 0.781831482468029808708 * t60 + 0.974927912181823607018 * t62 + 0.433883739117558120476 * t64;
+  const T t70 = 0.781831482468029808708 * t59 + 0.974927912181823607018 * t61 + 0.433883739117558120476 * t63;
+  const T t71 = t67 + t69;
+  p.St(y + 3 * os, t71);
+  const T t72 = t68 - t70;
+  p.St(y + 11 * os, t72);
+  const T t75 = t15 - 0.222520933956314404289 * t53 - 0.900968867902419126236 * t55 + 0.623489801858733530525 * t57;
+  const T t76 = 0.222520933956314404289 * t54 + 0.900968867902419126236 * t56 - 0.623489801858733530525 * t58;
+  const T t77 = 0.974927912181823607018 * t60 - 0.433883739117558120476 * t62 - 0.781831482468029808708 * t64;
+  const T t78 = 0.974927912181823607018 * t59 - 0.433883739117558120476 * t61 - 0.781831482468029808708 * t63;
+  const T t79 = t75 + t77;
+  p.St(y + 5 * os, t79);
+  const T t80 = t76 - t78;
+  p.St(y + 9 * os, t80);
+  const T t83 = t15 - 0.900968867902419126236 * t53 + 0.623489801858733530525 * t55 - 0.222520933956314404289 * t57;
+  const T t85 = 0.433883739117558120476 * t60 - 0.781831482468029808708 * t62 + 0.974927912181823607018 * t64;
+  const T t87 = t83 + t85;
+  p.St(y + 7 * os, t87);
+}
+
+template <class P>
+FFTK_BODY void RealTw14(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = p.Ld(a + 5 * s);
+  const T t27 = p.LdB(b + 5 * s);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  const T t32 = p.Ld(a + 6 * s);
+  const T t33 = p.LdB(b + 6 * s);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = p.Ld(a + 7 * s);
+  const T t39 = p.LdB(b + 7 * s);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  const T t44 = p.Ld(a + 8 * s);
+  const T t45 = p.LdB(b + 8 * s);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  const T t50 = p.Ld(a + 9 * s);
+  const T t51 = p.LdB(b + 9 * s);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  const T t56 = p.Ld(a + 10 * s);
+  const T t57 = p.LdB(b + 10 * s);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  const T t62 = p.Ld(a + 11 * s);
+  const T t63 = p.LdB(b + 11 * s);
+  const T t64 = p.LdW(wc + 10);
+  const T t65 = p.LdW(ws + 10);
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
+  const T t68 = p.Ld(a + 12 * s);
+  const T t69 = p.LdB(b + 12 * s);
+  const T t70 = p.LdW(wc + 11);
+  const T t71 = p.LdW(ws + 11);
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
+  const T t74 = p.Ld(a + 13 * s);
+  const T t75 = p.LdB(b + 13 * s);
+  const T t76 = p.LdW(wc + 12);
+  const T t77 = p.LdW(ws + 12);
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
+  const T t0 = p.Ld(a);
+  const T t80 = t0 + t42;
+  const T t1 = p.LdB(b);
+  const T t81 = t1 + t43;
+  const T t82 = t0 - t42;
+  const T t83 = t1 - t43;
+  const T t84 = t6 + t48;
+  const T t85 = t7 + t49;
+  const T t86 = t6 - t48;
+  const T t87 = t7 - t49;
+  const T t88 = t12 + t54;
+  const T t89 = t13 + t55;
+  const T t90 = t12 - t54;
+  const T t91 = t13 - t55;
+  const T t92 = t18 + t60;
+  const T t93 = t19 + t61;
+  const T t94 = t18 - t60;
+  const T t95 = t19 - t61;
+  const T t96 = t24 + t66;
+  const T t97 = t25 + t67;
+  const T t98 = t24 - t66;
+  const T t99 = t25 - t67;
+  const T t100 = t30 + t72;
+  const T t101 = t31 + t73;
+  const T t102 = t30 - t72;
+  const T t103 = t31 - t73;
+  const T t104 = t36 + t78;
+  const T t105 = t37 + t79;
+  const T t106 = t36 - t78;
+  const T t107 = t37 - t79;
+  const T t108 = t84 + t104;
+  const T t109 = t85 + t105;
+  const T t110 = t88 + t100;
+  const T t111 = t89 + t101;
+  const T t112 = t92 + t96;
+  const T t113 = t93 + t97;
+  const T t114 = t84 - t104;
+  const T t115 = t85 - t105;
+  const T t116 = t88 - t100;
+  const T t117 = t89 - t101;
+  const T t118 = t92 - t96;
+  const T t119 = t93 - t97;
+  const T t120 = t80 + t108 + t110 + t112;
+  p.St(a, t120);
+  const T t121 = t81 + t109 + t111 + t113;
+  p.StB(b + 13 * s, t121);
+  const T t122 = t80 + 0.623489801858733530525 * t108 - 0.222520933956314404289 * t110 - 0.900968867902419126236 * t112;
+  const T t123 = t81 + 0.623489801858733530525 * t109 - 0.222520933956314404289 * t111 - 0.900968867902419126236 * t113;
+  const T t124 = 0.781831482468029808708 * t115 + 0.974927912181823607018 * t117 + 0.433883739117558120476 * t119;
+  const T t125 = 0.781831482468029808708 * t114 + 0.974927912181823607018 * t116 + 0.433883739117558120476 * t118;
+  const T t126 = t122 + t124;
+  p.St(a + 2 * s, t126);
+  const T t127 = t123 - t125;
+  p.StB(b + 11 * s, t127);
+  const T t128 = t122 - t124;
+  p.StB(b + s, t128);
+  const T t129 = t123 + t125;
+  p.St(a + 12 * s, -t129);
+  const T t130 = t80 - 0.222520933956314404289 * t108 - 0.900968867902419126236 * t110 + 0.623489801858733530525 * t112;
+  const T t131 = t81 - 0.222520933956314404289 * t109 - 0.900968867902419126236 * t111 + 0.623489801858733530525 * t113;
+  const T t132 = 0.974927912181823607018 * t115 - 0.433883739117558120476 * t117 - 0.781831482468029808708 * t119;
+  const T t133 = 0.974927912181823607018 * t114 - 0.433883739117558120476 * t116 - 0.781831482468029808708 * t118;
+  const T t134 = t130 + t132;
+  p.St(a + 4 * s, t134);
+  const T t135 = t131 - t133;
+  p.StB(b + 9 * s, t135);
+  const T t136 = t130 - t132;
+  p.StB(b + 3 * s, t136);
+  const T t137 = t131 + t133;
+  p.St(a + 10 * s, -t137);
+  const T t138 = t80 - 0.900968867902419126236 * t108 + 0.623489801858733530525 * t110 - 0.222520933956314404289 * t112;
+  const T t139 = t81 - 0.900968867902419126236 * t109 + 0.623489801858733530525 * t111 - 0.222520933956314404289 * t113;
+  const T t140 = 0.433883739117558120476 * t115 - 0.781831482468029808708 * t117 + 0.974927912181823607018 * t119;
+  const T t141 = 0.433883739117558120476 * t114 - 0.781831482468029808708 * t116 + 0.974927912181823607018 * t118;
+  const T t142 = t138 + t140;
+  p.St(a + 6 * s, t142);
+  const T t143 = t139 - t141;
+  p.StB(b + 7 * s, t143);
+  const T t144 = t138 - t140;
+  p.StB(b + 5 * s, t144);
+  const T t145 = t139 + t141;
+  p.St(a + 8 * s, -t145);
+  const T t146 = 0.900968867902419126236 * t86 + 0.433883739117558120476 * t87;
+  const T t147 = 0.900968867902419126236 * t87 - 0.433883739117558120476 * t86;
+  const T t148 = 0.623489801858733530525 * t90 + 0.781831482468029808708 * t91;
+  const T t149 = 0.623489801858733530525 * t91 - 0.781831482468029808708 * t90;
+  const T t150 = 0.222520933956314404289 * t94 + 0.974927912181823607018 * t95;
+  const T t151 = 0.222520933956314404289 * t95 - 0.974927912181823607018 * t94;
+  const T t152 = 0.974927912181823607018 * t99 - 0.222520933956314404289 * t98;
+  const T t153 = 0.222520933956314404289 * t99 + 0.974927912181823607018 * t98;
+  const T t154 = 0.781831482468029808708 * t103 - 0.623489801858733530525 * t102;
+  const T t155 = 0.623489801858733530525 * t103 + 0.781831482468029808708 * t102;
+  const T t156 = 0.433883739117558120476 * t107 - 0.900968867902419126236 * t106;
+  const T t157 = 0.900968867902419126236 * t107 + 0.433883739117558120476 * t106;
+  const T t158 = t146 + t156;
+  const T t159 = t147 - t157;
+  const T t160 = t148 + t154;
+  const T t161 = t149 - t155;
+  const T t162 = t150 + t152;
+  const T t163 = t151 - t153;
+  const T t164 = t146 - t156;
+  const T t165 = t147 + t157;
+  const T t166 = t148 - t154;
+  const T t167 = t149 + t155;
+  const T t168 = t150 - t152;
+  const T t169 = t151 + t153;
+  const T t170 = t82 + t158 + t160 + t162;
+  p.St(a + s, t170);
+  const T t171 = t83 + t159 + t161 + t163;
+  p.StB(b + 12 * s, t171);
+  const T t172 = t82 + 0.623489801858733530525 * t158 - 0.222520933956314404289 * t160 - 0.900968867902419126236 * t162;
+  const T t173 = t83 + 0.623489801858733530525 * t159 - 0.222520933956314404289 * t161 - 0.900968867902419126236 * t163;
+  const T t174 = 0.781831482468029808708 * t165 + 0.974927912181823607018 * t167 + 0.433883739117558120476 * t169;
+  const T t175 = 0.781831482468029808708 * t164 + 0.974927912181823607018 * t166 + 0.433883739117558120476 * t168;
+  const T t176 = t172 + t174;
+  p.St(a + 3 * s, t176);
+  const T t177 = t173 - t175;
+  p.StB(b + 10 * s, t177);
+  const T t178 = t172 - t174;
+  p.StB(b, t178);
+  const T t179 = t173 + t175;
+  p.St(a + 13 * s, -t179);
+  const T t180 = t82 - 0.222520933956314404289 * t158 - 0.900968867902419126236 * t160 + 0.623489801858733530525 * t162;
+  const T t181 = t83 - 0.222520933956314404289 * t159 - 0.900968867902419126236 * t161 + 0.623489801858733530525 * t163;
+  const T t182 = 0.974927912181823607018 * t165 - 0.433883739117558120476 * t167 - 0.781831482468029808708 * t169;
+  const T t183 = 0.974927912181823607018 * t164 - 0.433883739117558120476 * t166 - 0.781831482468029808708 * t168;
+  const T t184 = t180 + t182;
+  p.St(a + 5 * s, t184);
+  const T t185 = t181 - t183;
+  p.StB(b + 8 * s, t185);
+  const T t186 = t180 - t182;
+  p.StB(b + 2 * s, t186);
+  const T t187 = t181 + t183;
+  p.St(a + 11 * s, -t187);
+  const T t188 = t82 - 0.900968867902419126236 * t158 + 0.623489801858733530525 * t160 - 0.222520933956314404289 * t162;
+  const T t189 = t83 - 0.900968867902419126236 * t159 + 0.623489801858733530525 * t161 - 0.222520933956314404289 * t163;
+  const T t190 = 0.433883739117558120476 * t165 - 0.781831482468029808708 * t167 + 0.974927912181823607018 * t169;
+  const T t191 = 0.433883739117558120476 * t164 - 0.781831482468029808708 * t166 + 0.974927912181823607018 * t168;
+  const T t192 = t188 + t190;
+  p.StB(b + 6 * s, t192);
+  const T t193 = t189 - t191;
+  p.St(a + 7 * s, -t193);
+  const T t194 = t188 - t190;
+  p.StB(b + 4 * s, t194);
+  const T t195 = t189 + t191;
+  p.St(a + 9 * s, -t195);
+}
+
+template <class P>
+FFTK_BODY void RealHalf14(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.974927912181823607018 * t1;
+  const T t3 = 0.222520933956314404289 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.900968867902419126236 * t4;
+  const T t6 = 0.433883739117558120476 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.781831482468029808708 * t7;
+  const T t9 = 0.623489801858733530525 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.623489801858733530525 * t10;
+  const T t12 = 0.781831482468029808708 * t10;
+  const T t13 = p.Ld(x + 5 * s);
+  const T t14 = 0.433883739117558120476 * t13;
+  const T t15 = 0.900968867902419126236 * t13;
+  const T t16 = p.Ld(x + 6 * s);
+  const T t17 = 0.222520933956314404289 * t16;
+  const T t18 = 0.974927912181823607018 * t16;
+  const T t20 = p.Ld(x + 8 * s);
+  const T t21 = 0.222520933956314404289 * t20;
+  const T t22 = 0.974927912181823607018 * t20;
+  const T t23 = p.Ld(x + 9 * s);
+  const T t24 = 0.433883739117558120476 * t23;
+  const T t25 = 0.900968867902419126236 * t23;
+  const T t26 = p.Ld(x + 10 * s);
+  const T t27 = 0.623489801858733530525 * t26;
+  const T t28 = 0.781831482468029808708 * t26;
+  const T t29 = p.Ld(x + 11 * s);
+  const T t30 = 0.781831482468029808708 * t29;
+  const T t31 = 0.623489801858733530525 * t29;
+  const T t32 = p.Ld(x + 12 * s);
+  const T t33 = 0.900968867902419126236 * t32;
+  const T t34 = 0.433883739117558120476 * t32;
+  const T t35 = p.Ld(x + 13 * s);
+  const T t36 = 0.974927912181823607018 * t35;
+  const T t37 = 0.222520933956314404289 * t35;
+  const T t38 = t2 - t21;
+  const T t39 = t3 + t22;
+  const T t40 = t2 + t21;
+  const T t41 = t22 - t3;
+  const T t42 = t5 - t24;
+  const T t43 = t6 + t25;
+  const T t44 = t5 + t24;
+  const T t45 = t25 - t6;
+  const T t46 = t8 - t27;
+  const T t47 = t9 + t28;
+  const T t48 = t8 + t27;
+  const T t49 = t28 - t9;
+  const T t50 = t11 - t30;
+  const T t51 = t12 + t31;
+  const T t52 = t11 + t30;
+  const T t53 = t31 - t12;
+  const T t54 = t14 - t33;
+  const T t55 = t15 + t34;
+  const T t56 = t14 + t33;
+  const T t57 = t34 - t15;
+  const T t58 = t17 - t36;
+  const T t59 = t18 + t37;
+  const T t60 = t17 + t36;
+  const T t61 = t37 - t18;
+  const T t62 = t38 + t58;
+  const T t63 = t39 + t59;
+  const T t64 = t42 + t54;
+  const T t65 = t43 + t55;
+  const T t66 = t46 + t50;
+  const T t67 = t47 + t51;
+  const T t68 = t38 - t58;
+  const T t69 = t59 - t39;
+  const T t70 = t42 - t54;
+  const T t71 = t55 - t43;
+  const T t72 = t46 - t50;
+  const T t73 = t51 - t47;
+  const T t0 = p.Ld(x);
+  const T t74 = t0 + t62 + t64 + t66;
+  const T t19 = p.Ld(x + 7 * s);
+  p.St(x, t74);
+  const T t75 = t19 + t63 + t65 + t67;
+  p.St(x + 13 * s, -t75);
+  const T t76 = t0 + 0.623489801858733530525 * t62 - 0.222520933956314404289 * t64 - 0.900968867902419126236 * t66;
+  const T t77 = t19 + 0.623489801858733530525 * t63 - 0.222520933956314404289 * t65 - 0.900968867902419126236 * t67;
+  const T t78 = 0.781831482468029808708 * t69 + 0.974927912181823607018 * t71 + 0.433883739117558120476 * t73;
+  const T t79 = 0.781831482468029808708 * t68 + 0.974927912181823607018 * t70 + 0.433883739117558120476 * t72;
+  const T t80 = t76 + t78;
+  p.St(x + 2 * s, t80);
+  const T t81 = t77 + t79;
+  p.St(x + 11 * s, -t81);
+  const T t84 = t0 - 0.222520933956314404289 * t62 - 0.900968867902419126236 * t64 + 0.623489801858733530525 * t66;
+  const T t85 = 0.222520933956314404289 * t63 - t19 + 0.900968867902419126236 * t65 - 0.623489801858733530525 * t67;
+  const T t86 = 0.974927912181823607018 * t69 - 0.433883739117558120476 * t71 - 0.781831482468029808708 * t73;
+  const T t87 = 0.974927912181823607018 * t68 - 0.433883739117558120476 * t70 - 0.781831482468029808708 * t72;
+  const T t88 = t84 + t86;
+  p.St(x + 4 * s, t88);
+  const T t89 = t85 - t87;
+  p.St(x + 9 * s, t89);
+  const T t92 = t0 - 0.900968867902419126236 * t62 + 0.623489801858733530525 * t64 - 0.222520933956314404289 * t66;
+  const T t93 = 0.900968867902419126236 * t63 - t19 - 0.623489801858733530525 * t65 + 0.222520933956314404289 * t67;
+  const T t94 = 0.433883739117558120476 * t69 - 0.781831482468029808708 * t71 + 0.974927912181823607018 * t73;
+  const T t95 = 0.433883739117558120476 * t68 - 0.781831482468029808708 * t70 + 0.974927912181823607018 * t72;
+  const T t96 = t92 + t94;
+  p.St(x + 6 * s, t96);
+  const T t97 = t93 - t95;
+  p.St(x + 7 * s, t97);
+  const T t100 = 0.900968867902419126236 * t40 + 0.433883739117558120476 * t41;
+  const T t101 = 0.900968867902419126236 * t41 - 0.433883739117558120476 * t40;
+  const T t102 = 0.623489801858733530525 * t44 + 0.781831482468029808708 * t45;
+  const T t103 = 0.623489801858733530525 * t45 - 0.781831482468029808708 * t44;
+  const T t104 = 0.222520933956314404289 * t48 + 0.974927912181823607018 * t49;
+  const T t105 = 0.222520933956314404289 * t49 - 0.974927912181823607018 * t48;
+  const T t106 = 0.974927912181823607018 * t53 - 0.222520933956314404289 * t52;
+  const T t107 = 0.222520933956314404289 * t53 + 0.974927912181823607018 * t52;
+  const T t108 = 0.781831482468029808708 * t57 - 0.623489801858733530525 * t56;
+  const T t109 = 0.623489801858733530525 * t57 + 0.781831482468029808708 * t56;
+  const T t110 = 0.433883739117558120476 * t61 - 0.900968867902419126236 * t60;
+  const T t111 = 0.900968867902419126236 * t61 + 0.433883739117558120476 * t60;
+  const T t112 = t100 + t110;
+  const T t113 = t101 - t111;
+  const T t114 = t102 + t108;
+  const T t115 = t103 - t109;
+  const T t116 = t104 + t106;
+  const T t117 = t105 - t107;
+  const T t118 = t100 - t110;
+  const T t119 = t101 + t111;
+  const T t120 = t102 - t108;
+  const T t121 = t103 + t109;
+  const T t122 = t104 - t106;
+  const T t123 = t105 + t107;
+  const T t124 = t0 + t112 + t114 + t116;
+  p.St(x + s, t124);
+  const T t125 = t19 + t113 + t115 + t117;
+  p.St(x + 12 * s, t125);
+  const T t126 = t0 + 0.623489801858733530525 * t112 - 0.222520933956314404289 * t114 - 0.900968867902419126236 * t116;
+  const T t127 = t19 + 0.623489801858733530525 * t113 - 0.222520933956314404289 * t115 - 0.900968867902419126236 * t117;
+  const T t128 = 0.781831482468029808708 * t119 + 0.974927912181823607018 * t121 + 0.433883739117558120476 * t123;
+  const T t129 = 0.781831482468029808708 * t118 + 0.974927912181823607018 * t120 + 0.433883739117558120476 * t122;
+  const T t130 = t126 + t128;
+  p.St(x + 3 * s, t130);
+  const T t131 = t127 - t129;
+  p.St(x + 10 * s, t131);
+  const T t134 = t0 - 0.222520933956314404289 * t112 - 0.900968867902419126236 * t114 + 0.623489801858733530525 * t116;
+  const T t135 = t19 - 0.222520933956314404289 * t113 - 0.900968867902419126236 * t115 + 0.623489801858733530525 * t117;
+  const T t136 = 0.974927912181823607018 * t119 - 0.433883739117558120476 * t121 - 0.781831482468029808708 * t123;
+  const T t137 = 0.974927912181823607018 * t118 - 0.433883739117558120476 * t120 - 0.781831482468029808708 * t122;
+  const T t138 = t134 + t136;
+  p.St(x + 5 * s, t138);
+  const T t139 = t135 - t137;
+  p.St(x + 8 * s, t139);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 14 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft14(p, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
+  } else {
+    const Lane4Access p{is, 14 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft14(p, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw14(Interleaved4FirstAccess{os, os, 0, 13}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 13};
+    for (; k + 3 < m; k += 4) DftTw14(p, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
+  } else {
+    DftTw14(Lane4FirstAccess{os, os, 0, 13}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 13};
+    for (; k + 3 < m; k += 4) DftTw14(p, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 14 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft14(p, in + t * is, ls, out + t * 14 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 13};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw14(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf14(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 14 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft14(p, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft14(p, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
   } else {
     const LaneAccess p{is, 14 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft14(p, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft14(p, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft14(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os,
-          outIm + t * 14 * os, os);
-  }
+  for (; t < c; ++t) Dft14(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle14(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle14(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft14(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft14(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 13};
-    for (; k + 1 < m; k += 2) {
-      DftTw14(p, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
-    }
+    for (; k + 1 < m; k += 2) DftTw14(p, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
   } else {
     const LaneAccess p{os, os, 0, 13};
-    for (; k + 1 < m; k += 2) {
-      DftTw14(p, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
-    }
+    for (; k + 1 < m; k += 2) DftTw14(p, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
   }
-  for (; k < m; ++k) {
-    DftTw14(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 13,
-           twSin + (k - 1) * 13);
-  }
+  for (; k < m; ++k) DftTw14(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
 }
 
 FFTK_CLONES
 void FftRealLeaf14(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 14 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 14 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft14(p, in + t * is, ls, out + t * 14 * os, os);
   for (; t < c; ++t) RealDft14(ScalarAccess{}, in + t * is, ls, out + t * 14 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle14(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle14(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft14(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 13};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw14(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 13,
-            twSin + (k - 1) * 13);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw14(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 13,
-            twSin + (k - 1) * 13);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 13};
+  for (; 2 * (k + 1) < m; k += 2) RealTw14(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
+  for (; 2 * k < m; ++k) RealTw14(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
   if (m % 2 == 0) RealHalf14(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

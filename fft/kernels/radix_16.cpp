@@ -4,8 +4,9 @@
 // twiddled complex DFT 174, 84; real DFT 74, 24; real combining group 174, 84.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -17,8 +18,8 @@ using fftk::LaneAccess;
 using fftk::ScalarAccess;
 
 template <class P>
-inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+FFTK_BODY void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t0, t1;
   p.LdC(xr, xi, t0, t1);
@@ -223,99 +224,99 @@ inline void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 }
 
 template <class P>
-inline void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+FFTK_BODY void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   T t26, t27;
   p.LdC(re + 5 * s, im + 5 * s, t26, t27);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   T t32, t33;
   p.LdC(re + 6 * s, im + 6 * s, t32, t33);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   T t38, t39;
   p.LdC(re + 7 * s, im + 7 * s, t38, t39);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   T t44, t45;
   p.LdC(re + 8 * s, im + 8 * s, t44, t45);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   T t50, t51;
   p.LdC(re + 9 * s, im + 9 * s, t50, t51);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   T t56, t57;
   p.LdC(re + 10 * s, im + 10 * s, t56, t57);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   T t62, t63;
   p.LdC(re + 11 * s, im + 11 * s, t62, t63);
   const T t64 = p.LdW(wc + 10);
   const T t65 = p.LdW(ws + 10);
-  const T t66 = t62 * t64 - t63 * t65;
-  const T t67 = t63 * t64 + t62 * t65;
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
   T t68, t69;
   p.LdC(re + 12 * s, im + 12 * s, t68, t69);
   const T t70 = p.LdW(wc + 11);
   const T t71 = p.LdW(ws + 11);
-  const T t72 = t68 * t70 - t69 * t71;
-  const T t73 = t69 * t70 + t68 * t71;
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
   T t74, t75;
   p.LdC(re + 13 * s, im + 13 * s, t74, t75);
   const T t76 = p.LdW(wc + 12);
   const T t77 = p.LdW(ws + 12);
-  const T t78 = t74 * t76 - t75 * t77;
-  const T t79 = t75 * t76 + t74 * t77;
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
   T t80, t81;
   p.LdC(re + 14 * s, im + 14 * s, t80, t81);
   const T t82 = p.LdW(wc + 13);
   const T t83 = p.LdW(ws + 13);
-  const T t84 = t80 * t82 - t81 * t83;
-  const T t85 = t81 * t82 + t80 * t83;
+  const T t84 = p.Tw0(t80, t80 * t82 - t81 * t83);
+  const T t85 = p.Tw0(t81, t81 * t82 + t80 * t83);
   T t86, t87;
   p.LdC(re + 15 * s, im + 15 * s, t86, t87);
   const T t88 = p.LdW(wc + 14);
   const T t89 = p.LdW(ws + 14);
-  const T t90 = t86 * t88 - t87 * t89;
-  const T t91 = t87 * t88 + t86 * t89;
+  const T t90 = p.Tw0(t86, t86 * t88 - t87 * t89);
+  const T t91 = p.Tw0(t87, t87 * t88 + t86 * t89);
   T t0, t1;
   p.LdC(re, im, t0, t1);
   const T t92 = t0 + t48;
@@ -489,7 +490,7 @@ inline void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const doubl
 }
 
 template <class P>
-inline void RealDft16(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+FFTK_BODY void RealDft16(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t0 = p.Ld(x);
   const T t8 = p.Ld(x + 8 * is);
@@ -608,99 +609,99 @@ inline void RealDft16(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 }
 
 template <class P>
-inline void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+FFTK_BODY void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = p.Ld(a + 5 * s);
   const T t27 = p.LdB(b + 5 * s);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   const T t32 = p.Ld(a + 6 * s);
   const T t33 = p.LdB(b + 6 * s);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = p.Ld(a + 7 * s);
   const T t39 = p.LdB(b + 7 * s);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   const T t44 = p.Ld(a + 8 * s);
   const T t45 = p.LdB(b + 8 * s);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   const T t50 = p.Ld(a + 9 * s);
   const T t51 = p.LdB(b + 9 * s);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   const T t56 = p.Ld(a + 10 * s);
   const T t57 = p.LdB(b + 10 * s);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   const T t62 = p.Ld(a + 11 * s);
   const T t63 = p.LdB(b + 11 * s);
   const T t64 = p.LdW(wc + 10);
   const T t65 = p.LdW(ws + 10);
-  const T t66 = t62 * t64 - t63 * t65;
-  const T t67 = t63 * t64 + t62 * t65;
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
   const T t68 = p.Ld(a + 12 * s);
   const T t69 = p.LdB(b + 12 * s);
   const T t70 = p.LdW(wc + 11);
   const T t71 = p.LdW(ws + 11);
-  const T t72 = t68 * t70 - t69 * t71;
-  const T t73 = t69 * t70 + t68 * t71;
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
   const T t74 = p.Ld(a + 13 * s);
   const T t75 = p.LdB(b + 13 * s);
   const T t76 = p.LdW(wc + 12);
   const T t77 = p.LdW(ws + 12);
-  const T t78 = t74 * t76 - t75 * t77;
-  const T t79 = t75 * t76 + t74 * t77;
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
   const T t80 = p.Ld(a + 14 * s);
   const T t81 = p.LdB(b + 14 * s);
   const T t82 = p.LdW(wc + 13);
   const T t83 = p.LdW(ws + 13);
-  const T t84 = t80 * t82 - t81 * t83;
-  const T t85 = t81 * t82 + t80 * t83;
+  const T t84 = p.Tw0(t80, t80 * t82 - t81 * t83);
+  const T t85 = p.Tw0(t81, t81 * t82 + t80 * t83);
   const T t86 = p.Ld(a + 15 * s);
   const T t87 = p.LdB(b + 15 * s);
   const T t88 = p.LdW(wc + 14);
   const T t89 = p.LdW(ws + 14);
-  const T t90 = t86 * t88 - t87 * t89;
-  const T t91 = t87 * t88 + t86 * t89;
+  const T t90 = p.Tw0(t86, t86 * t88 - t87 * t89);
+  const T t91 = p.Tw0(t87, t87 * t88 + t86 * t89);
   const T t0 = p.Ld(a);
   const T t92 = t0 + t48;
   const T t1 = p.LdB(b);
@@ -890,7 +891,7 @@ inline void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double
 }
 
 template <class P>
-inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
+FFTK_BODY void RealHalf16(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
   const T t1 = p.Ld(x + s);
   const T t2 = 0.980785280403230449126 * t1;
@@ -1088,75 +1089,1200 @@ inline void RealHalf16(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf16(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+FFTK_BODY void Dft16(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  T t16, t17;
+  p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
+  const T t32 = t0 + t16;
+  const T t33 = t1 + t17;
+  const T t34 = t0 - t16;
+  const T t35 = t1 - t17;
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  T t24, t25;
+  p.LdC(xr + 12 * is, xi + 12 * is, t24, t25);
+  const T t36 = t8 + t24;
+  const T t37 = t9 + t25;
+  const T t38 = t8 - t24;
+  const T t39 = t9 - t25;
+  const T t40 = t32 + t36;
+  const T t41 = t33 + t37;
+  const T t42 = t32 - t36;
+  const T t43 = t33 - t37;
+  const T t44 = t34 + t39;
+  const T t45 = t35 - t38;
+  const T t46 = t34 - t39;
+  const T t47 = t35 + t38;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t18, t19;
+  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
+  const T t48 = t2 + t18;
+  const T t49 = t3 + t19;
+  const T t50 = t2 - t18;
+  const T t51 = t3 - t19;
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  T t26, t27;
+  p.LdC(xr + 13 * is, xi + 13 * is, t26, t27);
+  const T t52 = t10 + t26;
+  const T t53 = t11 + t27;
+  const T t54 = t10 - t26;
+  const T t55 = t11 - t27;
+  const T t56 = t48 + t52;
+  const T t57 = t49 + t53;
+  const T t58 = t48 - t52;
+  const T t59 = t49 - t53;
+  const T t60 = t50 + t55;
+  const T t61 = t51 - t54;
+  const T t62 = t50 - t55;
+  const T t63 = t51 + t54;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t20, t21;
+  p.LdC(xr + 10 * is, xi + 10 * is, t20, t21);
+  const T t64 = t4 + t20;
+  const T t65 = t5 + t21;
+  const T t66 = t4 - t20;
+  const T t67 = t5 - t21;
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  T t28, t29;
+  p.LdC(xr + 14 * is, xi + 14 * is, t28, t29);
+  const T t68 = t12 + t28;
+  const T t69 = t13 + t29;
+  const T t70 = t12 - t28;
+  const T t71 = t13 - t29;
+  const T t72 = t64 + t68;
+  const T t73 = t65 + t69;
+  const T t74 = t64 - t68;
+  const T t75 = t65 - t69;
+  const T t76 = t66 + t71;
+  const T t77 = t67 - t70;
+  const T t78 = t66 - t71;
+  const T t79 = t67 + t70;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t22, t23;
+  p.LdC(xr + 11 * is, xi + 11 * is, t22, t23);
+  const T t80 = t6 + t22;
+  const T t81 = t7 + t23;
+  const T t82 = t6 - t22;
+  const T t83 = t7 - t23;
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
+  T t30, t31;
+  p.LdC(xr + 15 * is, xi + 15 * is, t30, t31);
+  const T t84 = t14 + t30;
+  const T t85 = t15 + t31;
+  const T t86 = t14 - t30;
+  const T t87 = t15 - t31;
+  const T t88 = t80 + t84;
+  const T t89 = t81 + t85;
+  const T t90 = t80 - t84;
+  const T t91 = t81 - t85;
+  const T t92 = t82 + t87;
+  const T t93 = t83 - t86;
+  const T t94 = t82 - t87;
+  const T t95 = t83 + t86;
+  const T t96 = t40 + t72;
+  const T t97 = t41 + t73;
+  const T t98 = t40 - t72;
+  const T t99 = t41 - t73;
+  const T t100 = t56 + t88;
+  const T t101 = t57 + t89;
+  const T t102 = t56 - t88;
+  const T t103 = t57 - t89;
+  const T t104 = t96 + t100;
+  const T t105 = t97 + t101;
+  p.StC(yr, yi, t104, t105);
+  const T t106 = t96 - t100;
+  const T t107 = t97 - t101;
+  p.StC(yr + 8 * os, yi + 8 * os, t106, t107);
+  const T t108 = t98 + t103;
+  const T t109 = t99 - t102;
+  p.StC(yr + 4 * os, yi + 4 * os, t108, t109);
+  const T t110 = t98 - t103;
+  const T t111 = t99 + t102;
+  p.StC(yr + 12 * os, yi + 12 * os, t110, t111);
+  const T t112 = 0.923879532511286756128 * t60 + 0.382683432365089771728 * t61;
+  const T t113 = 0.923879532511286756128 * t61 - 0.382683432365089771728 * t60;
+  const T t114 = t76 + t77;
+  const T t115 = 0.707106781186547524401 * t114;
+  const T t116 = t77 - t76;
+  const T t117 = 0.707106781186547524401 * t116;
+  const T t118 = 0.382683432365089771728 * t92 + 0.923879532511286756128 * t93;
+  const T t119 = 0.382683432365089771728 * t93 - 0.923879532511286756128 * t92;
+  const T t120 = t44 + t115;
+  const T t121 = t45 + t117;
+  const T t122 = t44 - t115;
+  const T t123 = t45 - t117;
+  const T t124 = t112 + t118;
+  const T t125 = t113 + t119;
+  const T t126 = t112 - t118;
+  const T t127 = t113 - t119;
+  const T t128 = t120 + t124;
+  const T t129 = t121 + t125;
+  p.StC(yr + os, yi + os, t128, t129);
+  const T t130 = t120 - t124;
+  const T t131 = t121 - t125;
+  p.StC(yr + 9 * os, yi + 9 * os, t130, t131);
+  const T t132 = t122 + t127;
+  const T t133 = t123 - t126;
+  p.StC(yr + 5 * os, yi + 5 * os, t132, t133);
+  const T t134 = t122 - t127;
+  const T t135 = t123 + t126;
+  p.StC(yr + 13 * os, yi + 13 * os, t134, t135);
+  const T t136 = t58 + t59;
+  const T t137 = 0.707106781186547524401 * t136;
+  const T t138 = t59 - t58;
+  const T t139 = 0.707106781186547524401 * t138;
+  const T t140 = t91 - t90;
+  const T t141 = 0.707106781186547524401 * t140;
+  const T t142 = t90 + t91;
+  const T t143 = 0.707106781186547524401 * t142;
+  const T t144 = t42 + t75;
+  const T t145 = t43 - t74;
+  const T t146 = t42 - t75;
+  const T t147 = t43 + t74;
+  const T t148 = t137 + t141;
+  const T t149 = t139 - t143;
+  const T t150 = t137 - t141;
+  const T t151 = t139 + t143;
+  const T t152 = t144 + t148;
+  const T t153 = t145 + t149;
+  p.StC(yr + 2 * os, yi + 2 * os, t152, t153);
+  const T t154 = t144 - t148;
+  const T t155 = t145 - t149;
+  p.StC(yr + 10 * os, yi + 10 * os, t154, t155);
+  const T t156 = t146 + t151;
+  const T t157 = t147 - t150;
+  p.StC(yr + 6 * os, yi + 6 * os, t156, t157);
+  const T t158 = t146 - t151;
+  const T t159 = t147 + t150;
+  p.StC(yr + 14 * os, yi + 14 * os, t158, t159);
+  const T t160 = 0.382683432365089771728 * t62 + 0.923879532511286756128 * t63;
+  const T t161 = 0.382683432365089771728 * t63 - 0.923879532511286756128 * t62;
+  const T t162 = t79 - t78;
+  const T t163 = 0.707106781186547524401 * t162;
+  const T t164 = t78 + t79;
+  const T t165 = 0.707106781186547524401 * t164;
+  const T t166 = 0.923879532511286756128 * t94 + 0.382683432365089771728 * t95;
+  const T t167 = 0.382683432365089771728 * t94 - 0.923879532511286756128 * t95;
+  const T t168 = t46 + t163;
+  const T t169 = t47 - t165;
+  const T t170 = t46 - t163;
+  const T t171 = t47 + t165;
+  const T t172 = t160 - t166;
+  const T t173 = t161 + t167;
+  const T t174 = t160 + t166;
+  const T t175 = t161 - t167;
+  const T t176 = t168 + t172;
+  const T t177 = t169 + t173;
+  p.StC(yr + 3 * os, yi + 3 * os, t176, t177);
+  const T t178 = t168 - t172;
+  const T t179 = t169 - t173;
+  p.StC(yr + 11 * os, yi + 11 * os, t178, t179);
+  const T t180 = t170 + t175;
+  const T t181 = t171 - t174;
+  p.StC(yr + 7 * os, yi + 7 * os, t180, t181);
+  const T t182 = t170 - t175;
+  const T t183 = t171 + t174;
+  p.StC(yr + 15 * os, yi + 15 * os, t182, t183);
+}
+
+template <class P>
+FFTK_BODY void DftTw16(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  T t26, t27;
+  p.LdC(re + 5 * s, im + 5 * s, t26, t27);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  T t32, t33;
+  p.LdC(re + 6 * s, im + 6 * s, t32, t33);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  T t38, t39;
+  p.LdC(re + 7 * s, im + 7 * s, t38, t39);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  T t44, t45;
+  p.LdC(re + 8 * s, im + 8 * s, t44, t45);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  T t50, t51;
+  p.LdC(re + 9 * s, im + 9 * s, t50, t51);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  T t56, t57;
+  p.LdC(re + 10 * s, im + 10 * s, t56, t57);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  T t62, t63;
+  p.LdC(re + 11 * s, im + 11 * s, t62, t63);
+  const T t64 = p.LdW(wc + 10);
+  const T t65 = p.LdW(ws + 10);
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
+  T t68, t69;
+  p.LdC(re + 12 * s, im + 12 * s, t68, t69);
+  const T t70 = p.LdW(wc + 11);
+  const T t71 = p.LdW(ws + 11);
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
+  T t74, t75;
+  p.LdC(re + 13 * s, im + 13 * s, t74, t75);
+  const T t76 = p.LdW(wc + 12);
+  const T t77 = p.LdW(ws + 12);
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
+  T t80, t81;
+  p.LdC(re + 14 * s, im + 14 * s, t80, t81);
+  const T t82 = p.LdW(wc + 13);
+  const T t83 = p.LdW(ws + 13);
+  const T t84 = p.Tw0(t80, t80 * t82 - t81 * t83);
+  const T t85 = p.Tw0(t81, t81 * t82 + t80 * t83);
+  T t86, t87;
+  p.LdC(re + 15 * s, im + 15 * s, t86, t87);
+  const T t88 = p.LdW(wc + 14);
+  const T t89 = p.LdW(ws + 14);
+  const T t90 = p.Tw0(t86, t86 * t88 - t87 * t89);
+  const T t91 = p.Tw0(t87, t87 * t88 + t86 * t89);
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t92 = t0 + t48;
+  const T t93 = t1 + t49;
+  const T t94 = t0 - t48;
+  const T t95 = t1 - t49;
+  const T t96 = t24 + t72;
+  const T t97 = t25 + t73;
+  const T t98 = t24 - t72;
+  const T t99 = t25 - t73;
+  const T t100 = t92 + t96;
+  const T t101 = t93 + t97;
+  const T t102 = t92 - t96;
+  const T t103 = t93 - t97;
+  const T t104 = t94 + t99;
+  const T t105 = t95 - t98;
+  const T t106 = t94 - t99;
+  const T t107 = t95 + t98;
+  const T t108 = t6 + t54;
+  const T t109 = t7 + t55;
+  const T t110 = t6 - t54;
+  const T t111 = t7 - t55;
+  const T t112 = t30 + t78;
+  const T t113 = t31 + t79;
+  const T t114 = t30 - t78;
+  const T t115 = t31 - t79;
+  const T t116 = t108 + t112;
+  const T t117 = t109 + t113;
+  const T t118 = t108 - t112;
+  const T t119 = t109 - t113;
+  const T t120 = t110 + t115;
+  const T t121 = t111 - t114;
+  const T t122 = t110 - t115;
+  const T t123 = t111 + t114;
+  const T t124 = t12 + t60;
+  const T t125 = t13 + t61;
+  const T t126 = t12 - t60;
+  const T t127 = t13 - t61;
+  const T t128 = t36 + t84;
+  const T t129 = t37 + t85;
+  const T t130 = t36 - t84;
+  const T t131 = t37 - t85;
+  const T t132 = t124 + t128;
+  const T t133 = t125 + t129;
+  const T t134 = t124 - t128;
+  const T t135 = t125 - t129;
+  const T t136 = t126 + t131;
+  const T t137 = t127 - t130;
+  const T t138 = t126 - t131;
+  const T t139 = t127 + t130;
+  const T t140 = t18 + t66;
+  const T t141 = t19 + t67;
+  const T t142 = t18 - t66;
+  const T t143 = t19 - t67;
+  const T t144 = t42 + t90;
+  const T t145 = t43 + t91;
+  const T t146 = t42 - t90;
+  const T t147 = t43 - t91;
+  const T t148 = t140 + t144;
+  const T t149 = t141 + t145;
+  const T t150 = t140 - t144;
+  const T t151 = t141 - t145;
+  const T t152 = t142 + t147;
+  const T t153 = t143 - t146;
+  const T t154 = t142 - t147;
+  const T t155 = t143 + t146;
+  const T t156 = t100 + t132;
+  const T t157 = t101 + t133;
+  const T t158 = t100 - t132;
+  const T t159 = t101 - t133;
+  const T t160 = t116 + t148;
+  const T t161 = t117 + t149;
+  const T t162 = t116 - t148;
+  const T t163 = t117 - t149;
+  const T t164 = t156 + t160;
+  const T t165 = t157 + t161;
+  p.StC(re, im, t164, t165);
+  const T t166 = t156 - t160;
+  const T t167 = t157 - t161;
+  p.StC(re + 8 * s, im + 8 * s, t166, t167);
+  const T t168 = t158 + t163;
+  const T t169 = t159 - t162;
+  p.StC(re + 4 * s, im + 4 * s, t168, t169);
+  const T t170 = t158 - t163;
+  const T t171 = t159 + t162;
+  p.StC(re + 12 * s, im + 12 * s, t170, t171);
+  const T t172 = 0.923879532511286756128 * t120 + 0.382683432365089771728 * t121;
+  const T t173 = 0.923879532511286756128 * t121 - 0.382683432365089771728 * t120;
+  const T t174 = t136 + t137;
+  const T t175 = 0.707106781186547524401 * t174;
+  const T t176 = t137 - t136;
+  const T t177 = 0.707106781186547524401 * t176;
+  const T t178 = 0.382683432365089771728 * t152 + 0.923879532511286756128 * t153;
+  const T t179 = 0.382683432365089771728 * t153 - 0.923879532511286756128 * t152;
+  const T t180 = t104 + t175;
+  const T t181 = t105 + t177;
+  const T t182 = t104 - t175;
+  const T t183 = t105 - t177;
+  const T t184 = t172 + t178;
+  const T t185 = t173 + t179;
+  const T t186 = t172 - t178;
+  const T t187 = t173 - t179;
+  const T t188 = t180 + t184;
+  const T t189 = t181 + t185;
+  p.StC(re + s, im + s, t188, t189);
+  const T t190 = t180 - t184;
+  const T t191 = t181 - t185;
+  p.StC(re + 9 * s, im + 9 * s, t190, t191);
+  const T t192 = t182 + t187;
+  const T t193 = t183 - t186;
+  p.StC(re + 5 * s, im + 5 * s, t192, t193);
+  const T t194 = t182 - t187;
+  const T t195 = t183 + t186;
+  p.StC(re + 13 * s, im + 13 * s, t194, t195);
+  const T t196 = t118 + t119;
+  const T t197 = 0.707106781186547524401 * t196;
+  const T t198 = t119 - t118;
+  const T t199 = 0.707106781186547524401 * t198;
+  const T t200 = t151 - t150;
+  const T t201 = 0.707106781186547524401 * t200;
+  const T t202 = t150 + t151;
+  const T t203 = 0.707106781186547524401 * t202;
+  const T t204 = t102 + t135;
+  const T t205 = t103 - t134;
+  const T t206 = t102 - t135;
+  const T t207 = t103 + t134;
+  const T t208 = t197 + t201;
+  const T t209 = t199 - t203;
+  const T t210 = t197 - t201;
+  const T t211 = t199 + t203;
+  const T t212 = t204 + t208;
+  const T t213 = t205 + t209;
+  p.StC(re + 2 * s, im + 2 * s, t212, t213);
+  const T t214 = t204 - t208;
+  const T t215 = t205 - t209;
+  p.StC(re + 10 * s, im + 10 * s, t214, t215);
+  const T t216 = t206 + t211;
+  const T t217 = t207 - t210;
+  p.StC(re + 6 * s, im + 6 * s, t216, t217);
+  const T t218 = t206 - t211;
+  const T t219 = t207 + t210;
+  p.StC(re + 14 * s, im + 14 * s, t218, t219);
+  const T t220 = 0.382683432365089771728 * t122 + 0.923879532511286756128 * t123;
+  const T t221 = 0.382683432365089771728 * t123 - 0.923879532511286756128 * t122;
+  const T t222 = t139 - t138;
+  const T t223 = 0.707106781186547524401 * t222;
+  const T t224 = t138 + t139;
+  const T t225 = 0.707106781186547524401 * t224;
+  const T t226 = 0.923879532511286756128 * t154 + 0.382683432365089771728 * t155;
+  const T t227 = 0.382683432365089771728 * t154 - 0.923879532511286756128 * t155;
+  const T t228 = t106 + t223;
+  const T t229 = t107 - t225;
+  const T t230 = t106 - t223;
+  const T t231 = t107 + t225;
+  const T t232 = t220 - t226;
+  const T t233 = t221 + t227;
+  const T t234 = t220 + t226;
+  const T t235 = t221 - t227;
+  const T t236 = t228 + t232;
+  const T t237 = t229 + t233;
+  p.StC(re + 3 * s, im + 3 * s, t236, t237);
+  const T t238 = t228 - t232;
+  const T t239 = t229 - t233;
+  p.StC(re + 11 * s, im + 11 * s, t238, t239);
+  const T t240 = t230 + t235;
+  const T t241 = t231 - t234;
+  p.StC(re + 7 * s, im + 7 * s, t240, t241);
+  const T t242 = t230 - t235;
+  const T t243 = t231 + t234;
+  p.StC(re + 15 * s, im + 15 * s, t242, t243);
+}
+
+template <class P>
+FFTK_BODY void RealDft16(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t0 = p.Ld(x);
+  const T t8 = p.Ld(x + 8 * is);
+  const T t16 = t0 + t8;
+  const T t17 = t0 - t8;
+  const T t4 = p.Ld(x + 4 * is);
+  const T t12 = p.Ld(x + 12 * is);
+  const T t18 = t4 + t12;
+  const T t19 = t4 - t12;
+  const T t20 = t16 + t18;
+  const T t21 = t16 - t18;
+  const T t1 = p.Ld(x + is);
+  const T t9 = p.Ld(x + 9 * is);
+  const T t22 = t1 + t9;
+  const T t23 = t1 - t9;
+  const T t5 = p.Ld(x + 5 * is);
+  const T t13 = p.Ld(x + 13 * is);
+  const T t24 = t5 + t13;
+  const T t25 = t5 - t13;
+  const T t26 = t22 + t24;
+  const T t27 = t22 - t24;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t10 = p.Ld(x + 10 * is);
+  const T t28 = t2 + t10;
+  const T t29 = t2 - t10;
+  const T t6 = p.Ld(x + 6 * is);
+  const T t14 = p.Ld(x + 14 * is);
+  const T t30 = t6 + t14;
+  const T t31 = t6 - t14;
+  const T t32 = t28 + t30;
+  const T t33 = t28 - t30;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t11 = p.Ld(x + 11 * is);
+  const T t34 = t3 + t11;
+  const T t35 = t3 - t11;
+  const T t7 = p.Ld(x + 7 * is);
+  const T t15 = p.Ld(x + 15 * is);
+  const T t36 = t7 + t15;
+  const T t37 = t7 - t15;
+  const T t38 = t34 + t36;
+  const T t39 = t34 - t36;
+  const T t40 = t20 + t32;
+  const T t41 = t20 - t32;
+  p.St(y + 4 * os, t41);
+  const T t42 = t26 + t38;
+  const T t43 = t26 - t38;
+  p.St(y + 12 * os, -t43);
+  const T t44 = t40 + t42;
+  p.St(y, t44);
+  const T t45 = t40 - t42;
+  p.St(y + 8 * os, t45);
+  const T t46 = 0.923879532511286756128 * t23 - 0.382683432365089771728 * t25;
+  const T t47 = 0.923879532511286756128 * t25 + 0.382683432365089771728 * t23;
+  const T t48 = t29 - t31;
+  const T t49 = 0.707106781186547524401 * t48;
+  const T t50 = t31 + t29;
+  const T t51 = 0.707106781186547524401 * t50;
+  const T t52 = 0.382683432365089771728 * t35 - 0.923879532511286756128 * t37;
+  const T t53 = 0.382683432365089771728 * t37 + 0.923879532511286756128 * t35;
+  const T t54 = t17 + t49;
+  const T t55 = t19 + t51;
+  const T t56 = t17 - t49;
+  const T t57 = t51 - t19;
+  const T t58 = t46 + t52;
+  const T t59 = t47 + t53;
+  const T t60 = t46 - t52;
+  const T t61 = t53 - t47;
+  const T t62 = t54 + t58;
+  p.St(y + os, t62);
+  const T t63 = t55 + t59;
+  p.St(y + 15 * os, -t63);
+  const T t66 = t56 + t61;
+  p.St(y + 5 * os, t66);
+  const T t67 = t57 - t60;
+  p.St(y + 11 * os, t67);
+  const T t70 = 0.707106781186547524401 * t27;
+  const T t71 = 0.707106781186547524401 * t27;
+  const T t72 = 0.707106781186547524401 * t39;
+  const T t73 = 0.707106781186547524401 * t39;
+  const T t74 = t70 - t72;
+  const T t75 = t71 + t73;
+  const T t76 = t70 + t72;
+  const T t77 = t73 - t71;
+  const T t78 = t21 + t74;
+  p.St(y + 2 * os, t78);
+  const T t79 = t33 + t75;
+  p.St(y + 14 * os, -t79);
+  const T t82 = t21 + t77;
+  p.St(y + 6 * os, t82);
+  const T t83 = t33 - t76;
+  p.St(y + 10 * os, t83);
+  const T t86 = 0.382683432365089771728 * t23 + 0.923879532511286756128 * t25;
+  const T t87 = 0.382683432365089771728 * t25 - 0.923879532511286756128 * t23;
+  const T t88 = t31 - t29;
+  const T t89 = 0.707106781186547524401 * t88;
+  const T t90 = t29 + t31;
+  const T t91 = 0.707106781186547524401 * t90;
+  const T t92 = 0.923879532511286756128 * t35 + 0.382683432365089771728 * t37;
+  const T t93 = 0.382683432365089771728 * t35 - 0.923879532511286756128 * t37;
+  const T t94 = t17 + t89;
+  const T t95 = t19 - t91;
+  const T t96 = t17 - t89;
+  const T t97 = t19 + t91;
+  const T t98 = t86 - t92;
+  const T t99 = t87 + t93;
+  const T t100 = t86 + t92;
+  const T t101 = t87 - t93;
+  const T t102 = t94 + t98;
+  p.St(y + 3 * os, t102);
+  const T t103 = t95 + t99;
+  p.St(y + 13 * os, t103);
+  const T t106 = t96 + t101;
+  p.St(y + 7 * os, t106);
+  const T t107 = t97 - t100;
+  p.St(y + 9 * os, t107);
+}
+
+template <class P>
+FFTK_BODY void RealTw16(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = p.Ld(a + 5 * s);
+  const T t27 = p.LdB(b + 5 * s);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  const T t32 = p.Ld(a + 6 * s);
+  const T t33 = p.LdB(b + 6 * s);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = p.Ld(a + 7 * s);
+  const T t39 = p.LdB(b + 7 * s);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  const T t44 = p.Ld(a + 8 * s);
+  const T t45 = p.LdB(b + 8 * s);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  const T t50 = p.Ld(a + 9 * s);
+  const T t51 = p.LdB(b + 9 * s);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  const T t56 = p.Ld(a + 10 * s);
+  const T t57 = p.LdB(b + 10 * s);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  const T t62 = p.Ld(a + 11 * s);
+  const T t63 = p.LdB(b + 11 * s);
+  const T t64 = p.LdW(wc + 10);
+  const T t65 = p.LdW(ws + 10);
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
+  const T t68 = p.Ld(a + 12 * s);
+  const T t69 = p.LdB(b + 12 * s);
+  const T t70 = p.LdW(wc + 11);
+  const T t71 = p.LdW(ws + 11);
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
+  const T t74 = p.Ld(a + 13 * s);
+  const T t75 = p.LdB(b + 13 * s);
+  const T t76 = p.LdW(wc + 12);
+  const T t77 = p.LdW(ws + 12);
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
+  const T t80 = p.Ld(a + 14 * s);
+  const T t81 = p.LdB(b + 14 * s);
+  const T t82 = p.LdW(wc + 13);
+  const T t83 = p.LdW(ws + 13);
+  const T t84 = p.Tw0(t80, t80 * t82 - t81 * t83);
+  const T t85 = p.Tw0(t81, t81 * t82 + t80 * t83);
+  const T t86 = p.Ld(a + 15 * s);
+  const T t87 = p.LdB(b + 15 * s);
+  const T t88 = p.LdW(wc + 14);
+  const T t89 = p.LdW(ws + 14);
+  const T t90 = p.Tw0(t86, t86 * t88 - t87 * t89);
+  const T t91 = p.Tw0(t87, t87 * t88 + t86 * t89);
+  const T t0 = p.Ld(a);
+  const T t92 = t0 + t48;
+  const T t1 = p.LdB(b);
+  const T t93 = t1 + t49;
+  const T t94 = t0 - t48;
+  const T t95 = t1 - t49;
+  const T t96 = t24 + t72;
+  const T t97 = t25 + t73;
+  const T t98 = t24 - t72;
+  const T t99 = t25 - t73;
+  const T t100 = t92 + t96;
+  const T t101 = t93 + t97;
+  const T t102 = t92 - t96;
+  const T t103 = t93 - t97;
+  const T t104 = t94 + t99;
+  const T t105 = t95 - t98;
+  const T t106 = t94 - t99;
+  const T t107 = t95 + t98;
+  const T t108 = t6 + t54;
+  const T t109 = t7 + t55;
+  const T t110 = t6 - t54;
+  const T t111 = t7 - t55;
+  const T t112 = t30 + t78;
+  const T t113 = t31 + t79;
+  const T t114 = t30 - t78;
+  const T t115 = t31 - t79;
+  const T t116 = t108 + t112;
+  const T t117 = t109 + t113;
+  const T t118 = t108 - t112;
+  const T t119 = t109 - t113;
+  const T t120 = t110 + t115;
+  const T t121 = t111 - t114;
+  const T t122 = t110 - t115;
+  const T t123 = t111 + t114;
+  const T t124 = t12 + t60;
+  const T t125 = t13 + t61;
+  const T t126 = t12 - t60;
+  const T t127 = t13 - t61;
+  const T t128 = t36 + t84;
+  const T t129 = t37 + t85;
+  const T t130 = t36 - t84;
+  const T t131 = t37 - t85;
+  const T t132 = t124 + t128;
+  const T t133 = t125 + t129;
+  const T t134 = t124 - t128;
+  const T t135 = t125 - t129;
+  const T t136 = t126 + t131;
+  const T t137 = t127 - t130;
+  const T t138 = t126 - t131;
+  const T t139 = t127 + t130;
+  const T t140 = t18 + t66;
+  const T t141 = t19 + t67;
+  const T t142 = t18 - t66;
+  const T t143 = t19 - t67;
+  const T t144 = t42 + t90;
+  const T t145 = t43 + t91;
+  const T t146 = t42 - t90;
+  const T t147 = t43 - t91;
+  const T t148 = t140 + t144;
+  const T t149 = t141 + t145;
+  const T t150 = t140 - t144;
+  const T t151 = t141 - t145;
+  const T t152 = t142 + t147;
+  const T t153 = t143 - t146;
+  const T t154 = t142 - t147;
+  const T t155 = t143 + t146;
+  const T t156 = t100 + t132;
+  const T t157 = t101 + t133;
+  const T t158 = t100 - t132;
+  const T t159 = t101 - t133;
+  const T t160 = t116 + t148;
+  const T t161 = t117 + t149;
+  const T t162 = t116 - t148;
+  const T t163 = t117 - t149;
+  const T t164 = t156 + t160;
+  p.St(a, t164);
+  const T t165 = t157 + t161;
+  p.StB(b + 15 * s, t165);
+  const T t166 = t156 - t160;
+  p.StB(b + 7 * s, t166);
+  const T t167 = t157 - t161;
+  p.St(a + 8 * s, -t167);
+  const T t168 = t158 + t163;
+  p.St(a + 4 * s, t168);
+  const T t169 = t159 - t162;
+  p.StB(b + 11 * s, t169);
+  const T t170 = t158 - t163;
+  p.StB(b + 3 * s, t170);
+  const T t171 = t159 + t162;
+  p.St(a + 12 * s, -t171);
+  const T t172 = 0.923879532511286756128 * t120 + 0.382683432365089771728 * t121;
+  const T t173 = 0.923879532511286756128 * t121 - 0.382683432365089771728 * t120;
+  const T t174 = t136 + t137;
+  const T t175 = 0.707106781186547524401 * t174;
+  const T t176 = t137 - t136;
+  const T t177 = 0.707106781186547524401 * t176;
+  const T t178 = 0.382683432365089771728 * t152 + 0.923879532511286756128 * t153;
+  const T t179 = 0.382683432365089771728 * t153 - 0.923879532511286756128 * t152;
+  const T t180 = t104 + t175;
+  const T t181 = t105 + t177;
+  const T t182 = t104 - t175;
+  const T t183 = t105 - t177;
+  const T t184 = t172 + t178;
+  const T t185 = t173 + t179;
+  const T t186 = t172 - t178;
+  const T t187 = t173 - t179;
+  const T t188 = t180 + t184;
+  p.St(a + s, t188);
+  const T t189 = t181 + t185;
+  p.StB(b + 14 * s, t189);
+  const T t190 = t180 - t184;
+  p.StB(b + 6 * s, t190);
+  const T t191 = t181 - t185;
+  p.St(a + 9 * s, -t191);
+  const T t192 = t182 + t187;
+  p.St(a + 5 * s, t192);
+  const T t193 = t183 - t186;
+  p.StB(b + 10 * s, t193);
+  const T t194 = t182 - t187;
+  p.StB(b + 2 * s, t194);
+  const T t195 = t183 + t186;
+  p.St(a + 13 * s, -t195);
+  const T t196 = t118 + t119;
+  const T t197 = 0.707106781186547524401 * t196;
+  const T t198 = t119 - t118;
+  const T t199 = 0.707106781186547524401 * t198;
+  const T t200 = t151 - t150;
+  const T t201 = 0.707106781186547524401 * t200;
+  const T t202 = t150 + t151;
+  const T t203 = 0.707106781186547524401 * t202;
+  const T t204 = t102 + t135;
+  const T t205 = t103 - t134;
+  const T t206 = t102 - t135;
+  const T t207 = t103 + t134;
+  const T t208 = t197 + t201;
+  const T t209 = t199 - t203;
+  const T t210 = t197 - t201;
+  const T t211 = t199 + t203;
+  const T t212 = t204 + t208;
+  p.St(a + 2 * s, t212);
+  const T t213 = t205 + t209;
+  p.StB(b + 13 * s, t213);
+  const T t214 = t204 - t208;
+  p.StB(b + 5 * s, t214);
+  const T t215 = t205 - t209;
+  p.St(a + 10 * s, -t215);
+  const T t216 = t206 + t211;
+  p.St(a + 6 * s, t216);
+  const T t217 = t207 - t210;
+  p.StB(b + 9 * s, t217);
+  const T t218 = t206 - t211;
+  p.StB(b + s, t218);
+  const T t219 = t207 + t210;
+  p.St(a + 14 * s, -t219);
+  const T t220 = 0.382683432365089771728 * t122 + 0.923879532511286756128 * t123;
+  const T t221 = 0.382683432365089771728 * t123 - 0.923879532511286756128 * t122;
+  const T t222 = t139 - t138;
+  const T t223 = 0.707106781186547524401 * t222;
+  const T t224 = t138 + t139;
+  const T t225 = 0.707106781186547524401 * t224;
+  const T t226 = 0.923879532511286756128 * t154 + 0.382683432365089771728 * t155;
+  const T t227 = 0.382683432365089771728 * t154 - 0.923879532511286756128 * t155;
+  const T t228 = t106 + t223;
+  const T t229 = t107 - t225;
+  const T t230 = t106 - t223;
+  const T t231 = t107 + t225;
+  const T t232 = t220 - t226;
+  const T t233 = t221 + t227;
+  const T t234 = t220 + t226;
+  const T t235 = t221 - t227;
+  const T t236 = t228 + t232;
+  p.St(a + 3 * s, t236);
+  const T t237 = t229 + t233;
+  p.StB(b + 12 * s, t237);
+  const T t238 = t228 - t232;
+  p.StB(b + 4 * s, t238);
+  const T t239 = t229 - t233;
+  p.St(a + 11 * s, -t239);
+  const T t240 = t230 + t235;
+  p.St(a + 7 * s, t240);
+  const T t241 = t231 - t234;
+  p.StB(b + 8 * s, t241);
+  const T t242 = t230 - t235;
+  p.StB(b, t242);
+  const T t243 = t231 + t234;
+  p.St(a + 15 * s, -t243);
+}
+
+template <class P>
+FFTK_BODY void RealHalf16(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.980785280403230449126 * t1;
+  const T t3 = 0.195090322016128267848 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.923879532511286756128 * t4;
+  const T t6 = 0.382683432365089771728 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.831469612302545237079 * t7;
+  const T t9 = 0.555570233019602224743 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.707106781186547524401 * t10;
+  const T t12 = 0.707106781186547524401 * t10;
+  const T t13 = p.Ld(x + 5 * s);
+  const T t14 = 0.555570233019602224743 * t13;
+  const T t15 = 0.831469612302545237079 * t13;
+  const T t16 = p.Ld(x + 6 * s);
+  const T t17 = 0.382683432365089771728 * t16;
+  const T t18 = 0.923879532511286756128 * t16;
+  const T t19 = p.Ld(x + 7 * s);
+  const T t20 = 0.195090322016128267848 * t19;
+  const T t21 = 0.980785280403230449126 * t19;
+  const T t23 = p.Ld(x + 9 * s);
+  const T t24 = 0.195090322016128267848 * t23;
+  const T t25 = 0.980785280403230449126 * t23;
+  const T t26 = p.Ld(x + 10 * s);
+  const T t27 = 0.382683432365089771728 * t26;
+  const T t28 = 0.923879532511286756128 * t26;
+  const T t29 = p.Ld(x + 11 * s);
+  const T t30 = 0.555570233019602224743 * t29;
+  const T t31 = 0.831469612302545237079 * t29;
+  const T t32 = p.Ld(x + 12 * s);
+  const T t33 = 0.707106781186547524401 * t32;
+  const T t34 = 0.707106781186547524401 * t32;
+  const T t35 = p.Ld(x + 13 * s);
+  const T t36 = 0.831469612302545237079 * t35;
+  const T t37 = 0.555570233019602224743 * t35;
+  const T t38 = p.Ld(x + 14 * s);
+  const T t39 = 0.923879532511286756128 * t38;
+  const T t40 = 0.382683432365089771728 * t38;
+  const T t41 = p.Ld(x + 15 * s);
+  const T t42 = 0.980785280403230449126 * t41;
+  const T t43 = 0.195090322016128267848 * t41;
+  const T t44 = t11 - t33;
+  const T t45 = t12 + t34;
+  const T t46 = t11 + t33;
+  const T t47 = t34 - t12;
+  const T t0 = p.Ld(x);
+  const T t48 = t0 + t44;
+  const T t22 = p.Ld(x + 8 * s);
+  const T t49 = t22 + t45;
+  const T t50 = t0 - t44;
+  const T t51 = t45 - t22;
+  const T t52 = t0 + t47;
+  const T t53 = t22 - t46;
+  const T t54 = t0 - t47;
+  const T t55 = t22 + t46;
+  const T t56 = t2 - t24;
+  const T t57 = t3 + t25;
+  const T t58 = t2 + t24;
+  const T t59 = t25 - t3;
+  const T t60 = t14 - t36;
+  const T t61 = t15 + t37;
+  const T t62 = t14 + t36;
+  const T t63 = t37 - t15;
+  const T t64 = t56 + t60;
+  const T t65 = t57 + t61;
+  const T t66 = t56 - t60;
+  const T t67 = t61 - t57;
+  const T t68 = t58 + t63;
+  const T t69 = t59 - t62;
+  const T t70 = t58 - t63;
+  const T t71 = t59 + t62;
+  const T t72 = t5 - t27;
+  const T t73 = t6 + t28;
+  const T t74 = t5 + t27;
+  const T t75 = t28 - t6;
+  const T t76 = t17 - t39;
+  const T t77 = t18 + t40;
+  const T t78 = t17 + t39;
+  const T t79 = t40 - t18;
+  const T t80 = t72 + t76;
+  const T t81 = t73 + t77;
+  const T t82 = t72 - t76;
+  const T t83 = t77 - t73;
+  const T t84 = t74 + t79;
+  const T t85 = t75 - t78;
+  const T t86 = t74 - t79;
+  const T t87 = t75 + t78;
+  const T t88 = t8 - t30;
+  const T t89 = t9 + t31;
+  const T t90 = t8 + t30;
+  const T t91 = t31 - t9;
+  const T t92 = t20 - t42;
+  const T t93 = t21 + t43;
+  const T t94 = t20 + t42;
+  const T t95 = t43 - t21;
+  const T t96 = t88 + t92;
+  const T t97 = t89 + t93;
+  const T t98 = t88 - t92;
+  const T t99 = t93 - t89;
+  const T t100 = t90 + t95;
+  const T t101 = t91 - t94;
+  const T t102 = t90 - t95;
+  const T t103 = t91 + t94;
+  const T t104 = t48 + t80;
+  const T t105 = t49 + t81;
+  const T t106 = t48 - t80;
+  const T t107 = t81 - t49;
+  const T t108 = t64 + t96;
+  const T t109 = t65 + t97;
+  const T t110 = t64 - t96;
+  const T t111 = t97 - t65;
+  const T t112 = t104 + t108;
+  p.St(x, t112);
+  const T t113 = t105 + t109;
+  p.St(x + 15 * s, -t113);
+  const T t116 = t106 + t111;
+  p.St(x + 4 * s, t116);
+  const T t117 = t107 - t110;
+  p.St(x + 11 * s, t117);
+  const T t120 = 0.923879532511286756128 * t68 + 0.382683432365089771728 * t69;
+  const T t121 = 0.923879532511286756128 * t69 - 0.382683432365089771728 * t68;
+  const T t122 = t84 + t85;
+  const T t123 = 0.707106781186547524401 * t122;
+  const T t124 = t85 - t84;
+  const T t125 = 0.707106781186547524401 * t124;
+  const T t126 = 0.382683432365089771728 * t100 + 0.923879532511286756128 * t101;
+  const T t127 = 0.382683432365089771728 * t101 - 0.923879532511286756128 * t100;
+  const T t128 = t52 + t123;
+  const T t129 = t53 + t125;
+  const T t130 = t52 - t123;
+  const T t131 = t53 - t125;
+  const T t132 = t120 + t126;
+  const T t133 = t121 + t127;
+  const T t134 = t120 - t126;
+  const T t135 = t121 - t127;
+  const T t136 = t128 + t132;
+  p.St(x + s, t136);
+  const T t137 = t129 + t133;
+  p.St(x + 14 * s, t137);
+  const T t140 = t130 + t135;
+  p.St(x + 5 * s, t140);
+  const T t141 = t131 - t134;
+  p.St(x + 10 * s, t141);
+  const T t144 = t66 + t67;
+  const T t145 = 0.707106781186547524401 * t144;
+  const T t146 = t67 - t66;
+  const T t147 = 0.707106781186547524401 * t146;
+  const T t148 = t99 - t98;
+  const T t149 = 0.707106781186547524401 * t148;
+  const T t150 = t98 + t99;
+  const T t151 = 0.707106781186547524401 * t150;
+  const T t152 = t50 + t83;
+  const T t153 = t51 - t82;
+  const T t154 = t50 - t83;
+  const T t155 = t51 + t82;
+  const T t156 = t145 + t149;
+  const T t157 = t147 - t151;
+  const T t158 = t145 - t149;
+  const T t159 = t147 + t151;
+  const T t160 = t152 + t156;
+  p.St(x + 2 * s, t160);
+  const T t161 = t153 + t157;
+  p.St(x + 13 * s, t161);
+  const T t164 = t154 + t159;
+  p.St(x + 6 * s, t164);
+  const T t165 = t155 - t158;
+  p.St(x + 9 * s, t165);
+  const T t168 = 0.382683432365089771728 * t70 + 0.923879532511286756128 * t71;
+  const T t169 = 0.382683432365089771728 * t71 - 0.923879532511286756128 * t70;
+  const T t170 = t87 - t86;
+  const T t171 = 0.707106781186547524401 * t170;
+  const T t172 = t86 + t87;
+  const T t173 = 0.707106781186547524401 * t172;
+  const T t174 = 0.923879532511286756128 * t102 + 0.382683432365089771728 * t103;
+  const T t175 = 0.382683432365089771728 * t102 - 0.923879532511286756128 * t103;
+  const T t176 = t54 + t171;
+  const T t177 = t55 - t173;
+  const T t178 = t54 - t171;
+  const T t179 = t55 + t173;
+  const T t180 = t168 - t174;
+  const T t181 = t169 + t175;
+  const T t182 = t168 + t174;
+  const T t183 = t169 - t175;
+  const T t184 = t176 + t180;
+  p.St(x + 3 * s, t184);
+  const T t185 = t177 + t181;
+  p.St(x + 12 * s, t185);
+  const T t188 = t178 + t183;
+  p.St(x + 7 * s, t188);
+  const T t189 = t179 - t182;
+  p.St(x + 8 * s, t189);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 16 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft16(p, inRe + t * is, inIm + t * is, ls, outRe + t * 16 * os, outIm + t * 16 * os, os);
+  } else {
+    const Lane4Access p{is, 16 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft16(p, inRe + t * is, inIm + t * is, ls, outRe + t * 16 * os, outIm + t * 16 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw16(Interleaved4FirstAccess{os, os, 0, 15}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 15};
+    for (; k + 3 < m; k += 4) DftTw16(p, re + k * os, im + k * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
+  } else {
+    DftTw16(Lane4FirstAccess{os, os, 0, 15}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 15};
+    for (; k + 3 < m; k += 4) DftTw16(p, re + k * os, im + k * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 16 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft16(p, in + t * is, ls, out + t * 16 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 15};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw16(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf16(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 16 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft16(p, inRe + t * is, inIm + t * is, ls, outRe + t * 16 * os, outIm + t * 16 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft16(p, inRe + t * is, inIm + t * is, ls, outRe + t * 16 * os, outIm + t * 16 * os, os);
   } else {
     const LaneAccess p{is, 16 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft16(p, inRe + t * is, inIm + t * is, ls, outRe + t * 16 * os, outIm + t * 16 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft16(p, inRe + t * is, inIm + t * is, ls, outRe + t * 16 * os, outIm + t * 16 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft16(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 16 * os,
-          outIm + t * 16 * os, os);
-  }
+  for (; t < c; ++t) Dft16(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 16 * os, outIm + t * 16 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle16(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle16(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft16(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft16(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 15};
-    for (; k + 1 < m; k += 2) {
-      DftTw16(p, re + k * os, im + k * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
-    }
+    for (; k + 1 < m; k += 2) DftTw16(p, re + k * os, im + k * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
   } else {
     const LaneAccess p{os, os, 0, 15};
-    for (; k + 1 < m; k += 2) {
-      DftTw16(p, re + k * os, im + k * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
-    }
+    for (; k + 1 < m; k += 2) DftTw16(p, re + k * os, im + k * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
   }
-  for (; k < m; ++k) {
-    DftTw16(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 15,
-           twSin + (k - 1) * 15);
-  }
+  for (; k < m; ++k) DftTw16(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
 }
 
 FFTK_CLONES
 void FftRealLeaf16(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 16 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 16 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft16(p, in + t * is, ls, out + t * 16 * os, os);
   for (; t < c; ++t) RealDft16(ScalarAccess{}, in + t * is, ls, out + t * 16 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle16(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle16(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft16(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 15};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw16(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 15,
-            twSin + (k - 1) * 15);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw16(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 15,
-            twSin + (k - 1) * 15);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 15};
+  for (; 2 * (k + 1) < m; k += 2) RealTw16(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
+  for (; 2 * k < m; ++k) RealTw16(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 15, twSin + (k - 1) * 15);
   if (m % 2 == 0) RealHalf16(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

@@ -4,8 +4,9 @@
 // twiddled complex DFT 432, 396; real DFT 180, 162; real combining group 432, 396.
 // Legend: xr/xi, x inputs; yr/yi, y outputs; re/im, a/b in-place legs; is/os/s strides
 // in doubles; wc/ws twiddles (cosine, negated sine) of legs 1..r-1; c repeat count;
-// m butterfly count; p the access policy (fft/kernel_access.h): pairs of transforms
-// or butterflies run in the two lanes of a vector, a last odd one alone.
+// m butterfly count; p the access policy (fft/kernel_access.h). Transforms or
+// butterflies run four at once in the wide variant (the same bodies compiled for
+// AVX in namespace wide), then in pairs, a last odd one alone.
 // clang-format off
 #include "fft/kernel_access.h"
 #include "fft/kernels/kernels.h"
@@ -17,8 +18,8 @@ using fftk::LaneAccess;
 using fftk::ScalarAccess;
 
 template <class P>
-inline void Dft19(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
-                 double* yi, ptrdiff_t os) {
+FFTK_BODY void Dft19(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(xr + is, xi + is, t2, t3);
@@ -190,117 +191,117 @@ inline void Dft19(const P& p, const double* xr, const double* xi, ptrdiff_t is, 
 }
 
 template <class P>
-inline void DftTw19(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
-                   const double* ws) {
+FFTK_BODY void DftTw19(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
   using T = typename P::T;
   T t2, t3;
   p.LdC(re + s, im + s, t2, t3);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   T t8, t9;
   p.LdC(re + 2 * s, im + 2 * s, t8, t9);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   T t14, t15;
   p.LdC(re + 3 * s, im + 3 * s, t14, t15);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   T t20, t21;
   p.LdC(re + 4 * s, im + 4 * s, t20, t21);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   T t26, t27;
   p.LdC(re + 5 * s, im + 5 * s, t26, t27);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   T t32, t33;
   p.LdC(re + 6 * s, im + 6 * s, t32, t33);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   T t38, t39;
   p.LdC(re + 7 * s, im + 7 * s, t38, t39);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   T t44, t45;
   p.LdC(re + 8 * s, im + 8 * s, t44, t45);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   T t50, t51;
   p.LdC(re + 9 * s, im + 9 * s, t50, t51);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   T t56, t57;
   p.LdC(re + 10 * s, im + 10 * s, t56, t57);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   T t62, t63;
   p.LdC(re + 11 * s, im + 11 * s, t62, t63);
   const T t64 = p.LdW(wc + 10);
   const T t65 = p.LdW(ws + 10);
-  const T t66 = t62 * t64 - t63 * t65;
-  const T t67 = t63 * t64 + t62 * t65;
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
   T t68, t69;
   p.LdC(re + 12 * s, im + 12 * s, t68, t69);
   const T t70 = p.LdW(wc + 11);
   const T t71 = p.LdW(ws + 11);
-  const T t72 = t68 * t70 - t69 * t71;
-  const T t73 = t69 * t70 + t68 * t71;
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
   T t74, t75;
   p.LdC(re + 13 * s, im + 13 * s, t74, t75);
   const T t76 = p.LdW(wc + 12);
   const T t77 = p.LdW(ws + 12);
-  const T t78 = t74 * t76 - t75 * t77;
-  const T t79 = t75 * t76 + t74 * t77;
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
   T t80, t81;
   p.LdC(re + 14 * s, im + 14 * s, t80, t81);
   const T t82 = p.LdW(wc + 13);
   const T t83 = p.LdW(ws + 13);
-  const T t84 = t80 * t82 - t81 * t83;
-  const T t85 = t81 * t82 + t80 * t83;
+  const T t84 = p.Tw0(t80, t80 * t82 - t81 * t83);
+  const T t85 = p.Tw0(t81, t81 * t82 + t80 * t83);
   T t86, t87;
   p.LdC(re + 15 * s, im + 15 * s, t86, t87);
   const T t88 = p.LdW(wc + 14);
   const T t89 = p.LdW(ws + 14);
-  const T t90 = t86 * t88 - t87 * t89;
-  const T t91 = t87 * t88 + t86 * t89;
+  const T t90 = p.Tw0(t86, t86 * t88 - t87 * t89);
+  const T t91 = p.Tw0(t87, t87 * t88 + t86 * t89);
   T t92, t93;
   p.LdC(re + 16 * s, im + 16 * s, t92, t93);
   const T t94 = p.LdW(wc + 15);
   const T t95 = p.LdW(ws + 15);
-  const T t96 = t92 * t94 - t93 * t95;
-  const T t97 = t93 * t94 + t92 * t95;
+  const T t96 = p.Tw0(t92, t92 * t94 - t93 * t95);
+  const T t97 = p.Tw0(t93, t93 * t94 + t92 * t95);
   T t98, t99;
   p.LdC(re + 17 * s, im + 17 * s, t98, t99);
   const T t100 = p.LdW(wc + 16);
   const T t101 = p.LdW(ws + 16);
-  const T t102 = t98 * t100 - t99 * t101;
-  const T t103 = t99 * t100 + t98 * t101;
+  const T t102 = p.Tw0(t98, t98 * t100 - t99 * t101);
+  const T t103 = p.Tw0(t99, t99 * t100 + t98 * t101);
   T t104, t105;
   p.LdC(re + 18 * s, im + 18 * s, t104, t105);
   const T t106 = p.LdW(wc + 17);
   const T t107 = p.LdW(ws + 17);
-  const T t108 = t104 * t106 - t105 * t107;
-  const T t109 = t105 * t106 + t104 * t107;
+  const T t108 = p.Tw0(t104, t104 * t106 - t105 * t107);
+  const T t109 = p.Tw0(t105, t105 * t106 + t104 * t107);
   const T t110 = t6 + t108;
   const T t111 = t7 + t109;
   const T t112 = t12 + t102;
@@ -435,7 +436,7 @@ inline void DftTw19(const P& p, double* re, double* im, ptrdiff_t s, const doubl
 }
 
 template <class P>
-inline void RealDft19(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+FFTK_BODY void RealDft19(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
   using T = typename P::T;
   const T t1 = p.Ld(x + is);
   const T t18 = p.Ld(x + 18 * is);
@@ -515,117 +516,117 @@ inline void RealDft19(const P& p, const double* x, ptrdiff_t is, double* y, ptrd
 }
 
 template <class P>
-inline void RealTw19(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
-                    const double* ws) {
+FFTK_BODY void RealTw19(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
   using T = typename P::T;
   const T t2 = p.Ld(a + s);
   const T t3 = p.LdB(b + s);
   const T t4 = p.LdW(wc + 0);
   const T t5 = p.LdW(ws + 0);
-  const T t6 = t2 * t4 - t3 * t5;
-  const T t7 = t3 * t4 + t2 * t5;
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
   const T t8 = p.Ld(a + 2 * s);
   const T t9 = p.LdB(b + 2 * s);
   const T t10 = p.LdW(wc + 1);
   const T t11 = p.LdW(ws + 1);
-  const T t12 = t8 * t10 - t9 * t11;
-  const T t13 = t9 * t10 + t8 * t11;
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
   const T t14 = p.Ld(a + 3 * s);
   const T t15 = p.LdB(b + 3 * s);
   const T t16 = p.LdW(wc + 2);
   const T t17 = p.LdW(ws + 2);
-  const T t18 = t14 * t16 - t15 * t17;
-  const T t19 = t15 * t16 + t14 * t17;
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
   const T t20 = p.Ld(a + 4 * s);
   const T t21 = p.LdB(b + 4 * s);
   const T t22 = p.LdW(wc + 3);
   const T t23 = p.LdW(ws + 3);
-  const T t24 = t20 * t22 - t21 * t23;
-  const T t25 = t21 * t22 + t20 * t23;
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
   const T t26 = p.Ld(a + 5 * s);
   const T t27 = p.LdB(b + 5 * s);
   const T t28 = p.LdW(wc + 4);
   const T t29 = p.LdW(ws + 4);
-  const T t30 = t26 * t28 - t27 * t29;
-  const T t31 = t27 * t28 + t26 * t29;
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
   const T t32 = p.Ld(a + 6 * s);
   const T t33 = p.LdB(b + 6 * s);
   const T t34 = p.LdW(wc + 5);
   const T t35 = p.LdW(ws + 5);
-  const T t36 = t32 * t34 - t33 * t35;
-  const T t37 = t33 * t34 + t32 * t35;
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
   const T t38 = p.Ld(a + 7 * s);
   const T t39 = p.LdB(b + 7 * s);
   const T t40 = p.LdW(wc + 6);
   const T t41 = p.LdW(ws + 6);
-  const T t42 = t38 * t40 - t39 * t41;
-  const T t43 = t39 * t40 + t38 * t41;
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
   const T t44 = p.Ld(a + 8 * s);
   const T t45 = p.LdB(b + 8 * s);
   const T t46 = p.LdW(wc + 7);
   const T t47 = p.LdW(ws + 7);
-  const T t48 = t44 * t46 - t45 * t47;
-  const T t49 = t45 * t46 + t44 * t47;
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
   const T t50 = p.Ld(a + 9 * s);
   const T t51 = p.LdB(b + 9 * s);
   const T t52 = p.LdW(wc + 8);
   const T t53 = p.LdW(ws + 8);
-  const T t54 = t50 * t52 - t51 * t53;
-  const T t55 = t51 * t52 + t50 * t53;
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
   const T t56 = p.Ld(a + 10 * s);
   const T t57 = p.LdB(b + 10 * s);
   const T t58 = p.LdW(wc + 9);
   const T t59 = p.LdW(ws + 9);
-  const T t60 = t56 * t58 - t57 * t59;
-  const T t61 = t57 * t58 + t56 * t59;
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
   const T t62 = p.Ld(a + 11 * s);
   const T t63 = p.LdB(b + 11 * s);
   const T t64 = p.LdW(wc + 10);
   const T t65 = p.LdW(ws + 10);
-  const T t66 = t62 * t64 - t63 * t65;
-  const T t67 = t63 * t64 + t62 * t65;
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
   const T t68 = p.Ld(a + 12 * s);
   const T t69 = p.LdB(b + 12 * s);
   const T t70 = p.LdW(wc + 11);
   const T t71 = p.LdW(ws + 11);
-  const T t72 = t68 * t70 - t69 * t71;
-  const T t73 = t69 * t70 + t68 * t71;
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
   const T t74 = p.Ld(a + 13 * s);
   const T t75 = p.LdB(b + 13 * s);
   const T t76 = p.LdW(wc + 12);
   const T t77 = p.LdW(ws + 12);
-  const T t78 = t74 * t76 - t75 * t77;
-  const T t79 = t75 * t76 + t74 * t77;
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
   const T t80 = p.Ld(a + 14 * s);
   const T t81 = p.LdB(b + 14 * s);
   const T t82 = p.LdW(wc + 13);
   const T t83 = p.LdW(ws + 13);
-  const T t84 = t80 * t82 - t81 * t83;
-  const T t85 = t81 * t82 + t80 * t83;
+  const T t84 = p.Tw0(t80, t80 * t82 - t81 * t83);
+  const T t85 = p.Tw0(t81, t81 * t82 + t80 * t83);
   const T t86 = p.Ld(a + 15 * s);
   const T t87 = p.LdB(b + 15 * s);
   const T t88 = p.LdW(wc + 14);
   const T t89 = p.LdW(ws + 14);
-  const T t90 = t86 * t88 - t87 * t89;
-  const T t91 = t87 * t88 + t86 * t89;
+  const T t90 = p.Tw0(t86, t86 * t88 - t87 * t89);
+  const T t91 = p.Tw0(t87, t87 * t88 + t86 * t89);
   const T t92 = p.Ld(a + 16 * s);
   const T t93 = p.LdB(b + 16 * s);
   const T t94 = p.LdW(wc + 15);
   const T t95 = p.LdW(ws + 15);
-  const T t96 = t92 * t94 - t93 * t95;
-  const T t97 = t93 * t94 + t92 * t95;
+  const T t96 = p.Tw0(t92, t92 * t94 - t93 * t95);
+  const T t97 = p.Tw0(t93, t93 * t94 + t92 * t95);
   const T t98 = p.Ld(a + 17 * s);
   const T t99 = p.LdB(b + 17 * s);
   const T t100 = p.LdW(wc + 16);
   const T t101 = p.LdW(ws + 16);
-  const T t102 = t98 * t100 - t99 * t101;
-  const T t103 = t99 * t100 + t98 * t101;
+  const T t102 = p.Tw0(t98, t98 * t100 - t99 * t101);
+  const T t103 = p.Tw0(t99, t99 * t100 + t98 * t101);
   const T t104 = p.Ld(a + 18 * s);
   const T t105 = p.LdB(b + 18 * s);
   const T t106 = p.LdW(wc + 17);
   const T t107 = p.LdW(ws + 17);
-  const T t108 = t104 * t106 - t105 * t107;
-  const T t109 = t105 * t106 + t104 * t107;
+  const T t108 = p.Tw0(t104, t104 * t106 - t105 * t107);
+  const T t109 = p.Tw0(t105, t105 * t106 + t104 * t107);
   const T t110 = t6 + t108;
   const T t111 = t7 + t109;
   const T t112 = t12 + t102;
@@ -779,7 +780,7 @@ inline void RealTw19(const P& p, double* a, double* b, ptrdiff_t s, const double
 }
 
 template <class P>
-inline void RealHalf19(const P& p, double* x, ptrdiff_t s) {
+FFTK_BODY void RealHalf19(const P& p, double* x, ptrdiff_t s) {
   using T = typename P::T;
   const T t1 = p.Ld(x + s);
   const T t2 = 0.986361303402722373603 * t1;
@@ -948,75 +949,1060 @@ inline void RealHalf19(const P& p, double* x, ptrdiff_t s) {
 
 }  // namespace
 
-FFTK_CLONES
-void FftComplexLeaf19(const double* inRe, const double* inIm, double* outRe, double* outIm,
-                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+#if FFTK_WIDE
+#pragma GCC push_options
+#pragma GCC target("avx")
+namespace {
+namespace wide {
+
+using fftk::Interleaved4Access;
+using fftk::Interleaved4FirstAccess;
+using fftk::Lane4Access;
+using fftk::Lane4FirstAccess;
+
+template <class P>
+FFTK_BODY void Dft19(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr,
+         double* yi, ptrdiff_t os) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(xr + is, xi + is, t2, t3);
+  T t36, t37;
+  p.LdC(xr + 18 * is, xi + 18 * is, t36, t37);
+  const T t38 = t2 + t36;
+  const T t39 = t3 + t37;
+  T t4, t5;
+  p.LdC(xr + 2 * is, xi + 2 * is, t4, t5);
+  T t34, t35;
+  p.LdC(xr + 17 * is, xi + 17 * is, t34, t35);
+  const T t40 = t4 + t34;
+  const T t41 = t5 + t35;
+  T t6, t7;
+  p.LdC(xr + 3 * is, xi + 3 * is, t6, t7);
+  T t32, t33;
+  p.LdC(xr + 16 * is, xi + 16 * is, t32, t33);
+  const T t42 = t6 + t32;
+  const T t43 = t7 + t33;
+  T t8, t9;
+  p.LdC(xr + 4 * is, xi + 4 * is, t8, t9);
+  T t30, t31;
+  p.LdC(xr + 15 * is, xi + 15 * is, t30, t31);
+  const T t44 = t8 + t30;
+  const T t45 = t9 + t31;
+  T t10, t11;
+  p.LdC(xr + 5 * is, xi + 5 * is, t10, t11);
+  T t28, t29;
+  p.LdC(xr + 14 * is, xi + 14 * is, t28, t29);
+  const T t46 = t10 + t28;
+  const T t47 = t11 + t29;
+  T t12, t13;
+  p.LdC(xr + 6 * is, xi + 6 * is, t12, t13);
+  T t26, t27;
+  p.LdC(xr + 13 * is, xi + 13 * is, t26, t27);
+  const T t48 = t12 + t26;
+  const T t49 = t13 + t27;
+  T t14, t15;
+  p.LdC(xr + 7 * is, xi + 7 * is, t14, t15);
+  T t24, t25;
+  p.LdC(xr + 12 * is, xi + 12 * is, t24, t25);
+  const T t50 = t14 + t24;
+  const T t51 = t15 + t25;
+  T t16, t17;
+  p.LdC(xr + 8 * is, xi + 8 * is, t16, t17);
+  T t22, t23;
+  p.LdC(xr + 11 * is, xi + 11 * is, t22, t23);
+  const T t52 = t16 + t22;
+  const T t53 = t17 + t23;
+  T t18, t19;
+  p.LdC(xr + 9 * is, xi + 9 * is, t18, t19);
+  T t20, t21;
+  p.LdC(xr + 10 * is, xi + 10 * is, t20, t21);
+  const T t54 = t18 + t20;
+  const T t55 = t19 + t21;
+  const T t56 = t2 - t36;
+  const T t57 = t3 - t37;
+  const T t58 = t4 - t34;
+  const T t59 = t5 - t35;
+  const T t60 = t6 - t32;
+  const T t61 = t7 - t33;
+  const T t62 = t8 - t30;
+  const T t63 = t9 - t31;
+  const T t64 = t10 - t28;
+  const T t65 = t11 - t29;
+  const T t66 = t12 - t26;
+  const T t67 = t13 - t27;
+  const T t68 = t14 - t24;
+  const T t69 = t15 - t25;
+  const T t70 = t16 - t22;
+  const T t71 = t17 - t23;
+  const T t72 = t18 - t20;
+  const T t73 = t19 - t21;
+  T t0, t1;
+  p.LdC(xr, xi, t0, t1);
+  const T t74 = t0 + t38 + t40 + t42 + t44 + t46 + t48 + t50 + t52 + t54;
+  const T t75 = t1 + t39 + t41 + t43 + t45 + t47 + t49 + t51 + t53 + t55;
+  p.StC(yr, yi, t74, t75);
+  const T t76 = t0 + 0.94581724170063467902 * t38 + 0.789140509396393599219 * t40 + 0.546948158122426874712 * t42 + 0.245485487140799148922 * t44 - 0.0825793454723323246003 * t46 - 0.401695424652969457517 * t48 - 0.677281571625741074762 * t50 - 0.879473751206489071391 * t52 - 0.986361303402722373603 * t54;
+  const T t77 = t1 + 0.94581724170063467902 * t39 + 0.789140509396393599219 * t41 + 0.546948158122426874712 * t43 + 0.245485487140799148922 * t45 - 0.0825793454723323246003 * t47 - 0.401695424652969457517 * t49 - 0.677281571625741074762 * t51 - 0.879473751206489071391 * t53 - 0.986361303402722373603 * t55;
+  const T t78 = 0.324699469204683487408 * t57 + 0.614212712689667817444 * t59 + 0.837166478262528574806 * t61 + 0.969400265939330416736 * t63 + 0.996584493006669849819 * t65 + 0.915773326655057439919 * t67 + 0.735723910673131624774 * t69 + 0.475947393037073544431 * t71 + 0.164594590280733894144 * t73;
+  const T t79 = 0.324699469204683487408 * t56 + 0.614212712689667817444 * t58 + 0.837166478262528574806 * t60 + 0.969400265939330416736 * t62 + 0.996584493006669849819 * t64 + 0.915773326655057439919 * t66 + 0.735723910673131624774 * t68 + 0.475947393037073544431 * t70 + 0.164594590280733894144 * t72;
+  const T t80 = t76 + t78;
+  const T t81 = t77 - t79;
+  p.StC(yr + os, yi + os, t80, t81);
+  const T t82 = t76 - t78;
+  const T t83 = t77 + t79;
+  p.StC(yr + 18 * os, yi + 18 * os, t82, t83);
+  const T t84 = t0 + 0.789140509396393599219 * t38 + 0.245485487140799148922 * t40 - 0.401695424652969457517 * t42 - 0.879473751206489071391 * t44 - 0.986361303402722373603 * t46 - 0.677281571625741074762 * t48 - 0.0825793454723323246003 * t50 + 0.546948158122426874712 * t52 + 0.94581724170063467902 * t54;
+  const T t85 = t1 + 0.789140509396393599219 * t39 + 0.245485487140799148922 * t41 - 0.401695424652969457517 * t43 - 0.879473751206489071391 * t45 - 0.986361303402722373603 * t47 - 0.677281571625741074762 * t49 - 0.0825793454723323246003 * t51 + 0.546948158122426874712 * t53 + 0.94581724170063467902 * t55;
+  const T t86 = 0.614212712689667817444 * t57 + 0.969400265939330416736 * t59 + 0.915773326655057439919 * t61 + 0.475947393037073544431 * t63 - 0.164594590280733894144 * t65 - 0.735723910673131624774 * t67 - 0.996584493006669849819 * t69 - 0.837166478262528574806 * t71 - 0.324699469204683487408 * t73;
+  const T t87 = 0.614212712689667817444 * t56 + 0.969400265939330416736 * t58 + 0.915773326655057439919 * t60 + 0.475947393037073544431 * t62 - 0.164594590280733894144 * t64 - 0.735723910673131624774 * t66 - 0.996584493006669849819 * t68 - 0.837166478262528574806 * t70 - 0.324699469204683487408 * t72;
+  const T t88 = t84 + t86;
+  const T t89 = t85 - t87;
+  p.StC(yr + 2 * os, yi + 2 * os, t88, t89);
+  const T t90 = t84 - t86;
+  const T t91 = t85 + t87;
+  p.StC(yr + 17 * os, yi + 17 * os, t90, t91);
+  const T t92 = t0 + 0.546948158122426874712 * t38 - 0.401695424652969457517 * t40 - 0.986361303402722373603 * t42 - 0.677281571625741074762 * t44 + 0.245485487140799148922 * t46 + 0.94581724170063467902 * t48 + 0.789140509396393599219 * t50 - 0.0825793454723323246003 * t52 - 0.879473751206489071391 * t54;
+  const T t93 = t1 + 0.546948158122426874712 * t39 - 0.401695424652969457517 * t41 - 0.986361303402722373603 * t43 - 0.677281571625741074762 * t45 + 0.245485487140799148922 * t47 + 0.94581724170063467902 * t49 + 0.789140509396393599219 * t51 - 0.0825793454723323246003 * t53 - 0.879473751206489071391 * t55;
+  const T t94 = 0.837166478262528574806 * t57 + 0.915773326655057439919 * t59 + 0.164594590280733894144 * t61 - 0.735723910673131624774 * t63 - 0.969400265939330416736 * t65 - 0.324699469204683487408 * t67 + 0.614212712689667817444 * t69 + 0.996584493006669849819 * t71 + 0.475947393037073544431 * t73;
+  const T t95 = 0.837166478262528574806 * t56 + 0.915773326655057439919 * t58 + 0.164594590280733894144 * t60 - 0.735723910673131624774 * t62 - 0.969400265939330416736 * t64 - 0.324699469204683487408 * t66 + 0.614212712689667817444 * t68 + 0.996584493006669849819 * t70 + 0.475947393037073544431 * t72;
+  const T t96 = t92 + t94;
+  const T t97 = t93 - t95;
+  p.StC(yr + 3 * os, yi + 3 * os, t96, t97);
+  const T t98 = t92 - t94;
+  const T t99 = t93 + t95;
+  p.StC(yr + 16 * os, yi + 16 * os, t98, t99);
+  const T t100 = t0 + 0.245485487140799148922 * t38 - 0.879473751206489071391 * t40 - 0.677281571625741074762 * t42 + 0.546948158122426874712 * t44 + 0.94581724170063467902 * t46 - 0.0825793454723323246003 * t48 - 0.986361303402722373603 * t50 - 0.401695424652969457517 * t52 + 0.789140509396393599219 * t54;
+  const T t101 = t1 + 0.245485487140799148922 * t39 - 0.879473751206489071391 * t41 - 0.677281571625741074762 * t43 + 0.546948158122426874712 * t45 + 0.94581724170063467902 * t47 - 0.0825793454723323246003 * t49 - 0.986361303402722373603 * t51 - 0.401695424652969457517 * t53 + 0.789140509396393599219 * t55;
+  const T t102 = 0.969400265939330416736 * t57 + 0.475947393037073544431 * t59 - 0.735723910673131624774 * t61 - 0.837166478262528574806 * t63 + 0.324699469204683487408 * t65 + 0.996584493006669849819 * t67 + 0.164594590280733894144 * t69 - 0.915773326655057439919 * t71 - 0.614212712689667817444 * t73;
+  const T t103 = 0.969400265939330416736 * t56 + 0.475947393037073544431 * t58 - 0.735723910673131624774 * t60 - 0.837166478262528574806 * t62 + 0.324699469204683487408 * t64 + 0.996584493006669849819 * t66 + 0.164594590280733894144 * t68 - 0.915773326655057439919 * t70 - 0.614212712689667817444 * t72;
+  const T t104 = t100 + t102;
+  const T t105 = t101 - t103;
+  p.StC(yr + 4 * os, yi + 4 * os, t104, t105);
+  const T t106 = t100 - t102;
+  const T t107 = t101 + t103;
+  p.StC(yr + 15 * os, yi + 15 * os, t106, t107);
+  const T t108 = t0 - 0.0825793454723323246003 * t38 - 0.986361303402722373603 * t40 + 0.245485487140799148922 * t42 + 0.94581724170063467902 * t44 - 0.401695424652969457517 * t46 - 0.879473751206489071391 * t48 + 0.546948158122426874712 * t50 + 0.789140509396393599219 * t52 - 0.677281571625741074762 * t54;
+  const T t109 = t1 - 0.0825793454723323246003 * t39 - 0.986361303402722373603 * t41 + 0.245485487140799148922 * t43 + 0.94581724170063467902 * t45 - 0.401695424652969457517 * t47 - 0.879473751206489071391 * t49 + 0.546948158122426874712 * t51 + 0.789140509396393599219 * t53 - 0.677281571625741074762 * t55;
+  const T t110 = 0.996584493006669849819 * t57 - 0.164594590280733894144 * t59 - 0.969400265939330416736 * t61 + 0.324699469204683487408 * t63 + 0.915773326655057439919 * t65 - 0.475947393037073544431 * t67 - 0.837166478262528574806 * t69 + 0.614212712689667817444 * t71 + 0.735723910673131624774 * t73;
+  const T t111 = 0.996584493006669849819 * t56 - 0.164594590280733894144 * t58 - 0.969400265939330416736 * t60 + 0.324699469204683487408 * t62 + 0.915773326655057439919 * t64 - 0.475947393037073544431 * t66 - 0.837166478262528574806 * t68 + 0.614212712689667817444 * t70 + 0.735723910673131624774 * t72;
+  const T t112 = t108 + t110;
+  const T t113 = t109 - t111;
+  p.StC(yr + 5 * os, yi + 5 * os, t112, t113);
+  const T t114 = t108 - t110;
+  const T t115 = t109 + t111;
+  p.StC(yr + 14 * os, yi + 14 * os, t114, t115);
+  const T t116 = t0 - 0.401695424652969457517 * t38 - 0.677281571625741074762 * t40 + 0.94581724170063467902 * t42 - 0.0825793454723323246003 * t44 - 0.879473751206489071391 * t46 + 0.789140509396393599219 * t48 + 0.245485487140799148922 * t50 - 0.986361303402722373603 * t52 + 0.546948158122426874712 * t54;
+  const T t117 = t1 - 0.401695424652969457517 * t39 - 0.677281571625741074762 * t41 + 0.94581724170063467902 * t43 - 0.0825793454723323246003 * t45 - 0.879473751206489071391 * t47 + 0.789140509396393599219 * t49 + 0.245485487140799148922 * t51 - 0.986361303402722373603 * t53 + 0.546948158122426874712 * t55;
+  const T t118 = 0.915773326655057439919 * t57 - 0.735723910673131624774 * t59 - 0.324699469204683487408 * t61 + 0.996584493006669849819 * t63 - 0.475947393037073544431 * t65 - 0.614212712689667817444 * t67 + 0.969400265939330416736 * t69 - 0.164594590280733894144 * t71 - 0.837166478262528574806 * t73;
+  const T t119 = 0.915773326655057439919 * t56 - 0.735723910673131624774 * t58 - 0.324699469204683487408 * t60 + 0.996584493006669849819 * t62 - 0.475947393037073544431 * t64 - 0.614212712689667817444 * t66 + 0.969400265939330416736 * t68 - 0.164594590280733894144 * t70 - 0.837166478262528574806 * t72;
+  const T t120 = t116 + t118;
+  const T t121 = t117 - t119;
+  p.StC(yr + 6 * os, yi + 6 * os, t120, t121);
+  const T t122 = t116 - t118;
+  const T t123 = t117 + t119;
+  p.StC(yr + 13 * os, yi + 13 * os, t122, t123);
+  const T t124 = t0 - 0.677281571625741074762 * t38 - 0.0825793454723323246003 * t40 + 0.789140509396393599219 * t42 - 0.986361303402722373603 * t44 + 0.546948158122426874712 * t46 + 0.245485487140799148922 * t48 - 0.879473751206489071391 * t50 + 0.94581724170063467902 * t52 - 0.401695424652969457517 * t54;
+  const T t125 = t1 - 0.677281571625741074762 * t39 - 0.0825793454723323246003 * t41 + 0.789140509396393599219 * t43 - 0.986361303402722373603 * t45 + 0.546948158122426874712 * t47 + 0.245485487140799148922 * t49 - 0.879473751206489071391 * t51 + 0.94581724170063467902 * t53 - 0.401695424652969457517 * t55;
+  const T t126 = 0.735723910673131624774 * t57 - 0.996584493006669849819 * t59 + 0.614212712689667817444 * t61 + 0.164594590280733894144 * t63 - 0.837166478262528574806 * t65 + 0.969400265939330416736 * t67 - 0.475947393037073544431 * t69 - 0.324699469204683487408 * t71 + 0.915773326655057439919 * t73;
+  const T t127 = 0.735723910673131624774 * t56 - 0.996584493006669849819 * t58 + 0.614212712689667817444 * t60 + 0.164594590280733894144 * t62 - 0.837166478262528574806 * t64 + 0.969400265939330416736 * t66 - 0.475947393037073544431 * t68 - 0.324699469204683487408 * t70 + 0.915773326655057439919 * t72;
+  const T t128 = t124 + t126;
+  const T t129 = t125 - t127;
+  p.StC(yr + 7 * os, yi + 7 * os, t128, t129);
+  const T t130 = t124 - t126;
+  const T t131 = t125 + t127;
+  p.StC(yr + 12 * os, yi + 12 * os, t130, t131);
+  const T t132 = t0 - 0.879473751206489071391 * t38 + 0.546948158122426874712 * t40 - 0.0825793454723323246003 * t42 - 0.401695424652969457517 * t44 + 0.789140509396393599219 * t46 - 0.986361303402722373603 * t48 + 0.94581724170063467902 * t50 - 0.677281571625741074762 * t52 + 0.245485487140799148922 * t54;
+  const T t133 = t1 - 0.879473751206489071391 * t39 + 0.546948158122426874712 * t41 - 0.0825793454723323246003 * t43 - 0.401695424652969457517 * t45 + 0.789140509396393599219 * t47 - 0.986361303402722373603 * t49 + 0.94581724170063467902 * t51 - 0.677281571625741074762 * t53 + 0.245485487140799148922 * t55;
+  const T t134 = 0.475947393037073544431 * t57 - 0.837166478262528574806 * t59 + 0.996584493006669849819 * t61 - 0.915773326655057439919 * t63 + 0.614212712689667817444 * t65 - 0.164594590280733894144 * t67 - 0.324699469204683487408 * t69 + 0.735723910673131624774 * t71 - 0.969400265939330416736 * t73;
+  const T t135 = 0.475947393037073544431 * t56 - 0.837166478262528574806 * t58 + 0.996584493006669849819 * t60 - 0.915773326655057439919 * t62 + 0.614212712689667817444 * t64 - 0.164594590280733894144 * t66 - 0.324699469204683487408 * t68 + 0.735723910673131624774 * t70 - 0.969400265939330416736 * t72;
+  const T t136 = t132 + t134;
+  const T t137 = t133 - t135;
+  p.StC(yr + 8 * os, yi + 8 * os, t136, t137);
+  const T t138 = t132 - t134;
+  const T t139 = t133 + t135;
+  p.StC(yr + 11 * os, yi + 11 * os, t138, t139);
+  const T t140 = t0 - 0.986361303402722373603 * t38 + 0.94581724170063467902 * t40 - 0.879473751206489071391 * t42 + 0.789140509396393599219 * t44 - 0.677281571625741074762 * t46 + 0.546948158122426874712 * t48 - 0.401695424652969457517 * t50 + 0.245485487140799148922 * t52 - 0.0825793454723323246003 * t54;
+  const T t141 = t1 - 0.986361303402722373603 * t39 + 0.94581724170063467902 * t41 - 0.879473751206489071391 * t43 + 0.789140509396393599219 * t45 - 0.677281571625741074762 * t47 + 0.546948158122426874712 * t49 - 0.401695424652969457517 * t51 + 0.245485487140799148922 * t53 - 0.0825793454723323246003 * t55;
+  const T t142 = 0.164594590280733894144 * t57 - 0.324699469204683487408 * t59 + 0.475947393037073544431 * t61 - 0.614212712689667817444 * t63 + 0.735723910673131624774 * t65 - 0.837166478262528574806 * t67 + 0.915773326655057439919 * t69 - 0.969400265939330416736 * t71 + 0.996584493006669849819 * t73;
+  const T t143 = 0.164594590280733894144 * t56 - 0.324699469204683487408 * t58 + 0.475947393037073544431 * t60 - 0.614212712689667817444 * t62 + 0.735723910673131624774 * t64 - 0.837166478262528574806 * t66 + 0.915773326655057439919 * t68 - 0.969400265939330416736 * t70 + 0.996584493006669849819 * t72;
+  const T t144 = t140 + t142;
+  const T t145 = t141 - t143;
+  p.StC(yr + 9 * os, yi + 9 * os, t144, t145);
+  const T t146 = t140 - t142;
+  const T t147 = t141 + t143;
+  p.StC(yr + 10 * os, yi + 10 * os, t146, t147);
+}
+
+template <class P>
+FFTK_BODY void DftTw19(const P& p, double* re, double* im, ptrdiff_t s, const double* wc,
+           const double* ws) {
+  using T = typename P::T;
+  T t2, t3;
+  p.LdC(re + s, im + s, t2, t3);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  T t8, t9;
+  p.LdC(re + 2 * s, im + 2 * s, t8, t9);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  T t14, t15;
+  p.LdC(re + 3 * s, im + 3 * s, t14, t15);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  T t20, t21;
+  p.LdC(re + 4 * s, im + 4 * s, t20, t21);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  T t26, t27;
+  p.LdC(re + 5 * s, im + 5 * s, t26, t27);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  T t32, t33;
+  p.LdC(re + 6 * s, im + 6 * s, t32, t33);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  T t38, t39;
+  p.LdC(re + 7 * s, im + 7 * s, t38, t39);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  T t44, t45;
+  p.LdC(re + 8 * s, im + 8 * s, t44, t45);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  T t50, t51;
+  p.LdC(re + 9 * s, im + 9 * s, t50, t51);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  T t56, t57;
+  p.LdC(re + 10 * s, im + 10 * s, t56, t57);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  T t62, t63;
+  p.LdC(re + 11 * s, im + 11 * s, t62, t63);
+  const T t64 = p.LdW(wc + 10);
+  const T t65 = p.LdW(ws + 10);
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
+  T t68, t69;
+  p.LdC(re + 12 * s, im + 12 * s, t68, t69);
+  const T t70 = p.LdW(wc + 11);
+  const T t71 = p.LdW(ws + 11);
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
+  T t74, t75;
+  p.LdC(re + 13 * s, im + 13 * s, t74, t75);
+  const T t76 = p.LdW(wc + 12);
+  const T t77 = p.LdW(ws + 12);
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
+  T t80, t81;
+  p.LdC(re + 14 * s, im + 14 * s, t80, t81);
+  const T t82 = p.LdW(wc + 13);
+  const T t83 = p.LdW(ws + 13);
+  const T t84 = p.Tw0(t80, t80 * t82 - t81 * t83);
+  const T t85 = p.Tw0(t81, t81 * t82 + t80 * t83);
+  T t86, t87;
+  p.LdC(re + 15 * s, im + 15 * s, t86, t87);
+  const T t88 = p.LdW(wc + 14);
+  const T t89 = p.LdW(ws + 14);
+  const T t90 = p.Tw0(t86, t86 * t88 - t87 * t89);
+  const T t91 = p.Tw0(t87, t87 * t88 + t86 * t89);
+  T t92, t93;
+  p.LdC(re + 16 * s, im + 16 * s, t92, t93);
+  const T t94 = p.LdW(wc + 15);
+  const T t95 = p.LdW(ws + 15);
+  const T t96 = p.Tw0(t92, t92 * t94 - t93 * t95);
+  const T t97 = p.Tw0(t93, t93 * t94 + t92 * t95);
+  T t98, t99;
+  p.LdC(re + 17 * s, im + 17 * s, t98, t99);
+  const T t100 = p.LdW(wc + 16);
+  const T t101 = p.LdW(ws + 16);
+  const T t102 = p.Tw0(t98, t98 * t100 - t99 * t101);
+  const T t103 = p.Tw0(t99, t99 * t100 + t98 * t101);
+  T t104, t105;
+  p.LdC(re + 18 * s, im + 18 * s, t104, t105);
+  const T t106 = p.LdW(wc + 17);
+  const T t107 = p.LdW(ws + 17);
+  const T t108 = p.Tw0(t104, t104 * t106 - t105 * t107);
+  const T t109 = p.Tw0(t105, t105 * t106 + t104 * t107);
+  const T t110 = t6 + t108;
+  const T t111 = t7 + t109;
+  const T t112 = t12 + t102;
+  const T t113 = t13 + t103;
+  const T t114 = t18 + t96;
+  const T t115 = t19 + t97;
+  const T t116 = t24 + t90;
+  const T t117 = t25 + t91;
+  const T t118 = t30 + t84;
+  const T t119 = t31 + t85;
+  const T t120 = t36 + t78;
+  const T t121 = t37 + t79;
+  const T t122 = t42 + t72;
+  const T t123 = t43 + t73;
+  const T t124 = t48 + t66;
+  const T t125 = t49 + t67;
+  const T t126 = t54 + t60;
+  const T t127 = t55 + t61;
+  const T t128 = t6 - t108;
+  const T t129 = t7 - t109;
+  const T t130 = t12 - t102;
+  const T t131 = t13 - t103;
+  const T t132 = t18 - t96;
+  const T t133 = t19 - t97;
+  const T t134 = t24 - t90;
+  const T t135 = t25 - t91;
+  const T t136 = t30 - t84;
+  const T t137 = t31 - t85;
+  const T t138 = t36 - t78;
+  const T t139 = t37 - t79;
+  const T t140 = t42 - t72;
+  const T t141 = t43 - t73;
+  const T t142 = t48 - t66;
+  const T t143 = t49 - t67;
+  const T t144 = t54 - t60;
+  const T t145 = t55 - t61;
+  T t0, t1;
+  p.LdC(re, im, t0, t1);
+  const T t146 = t0 + t110 + t112 + t114 + t116 + t118 + t120 + t122 + t124 + t126;
+  const T t147 = t1 + t111 + t113 + t115 + t117 + t119 + t121 + t123 + t125 + t127;
+  p.StC(re, im, t146, t147);
+  const T t148 = t0 + 0.94581724170063467902 * t110 + 0.789140509396393599219 * t112 + 0.546948158122426874712 * t114 + 0.245485487140799148922 * t116 - 0.0825793454723323246003 * t118 - 0.401695424652969457517 * t120 - 0.677281571625741074762 * t122 - 0.879473751206489071391 * t124 - 0.986361303402722373603 * t126;
+  const T t149 = t1 + 0.94581724170063467902 * t111 + 0.789140509396393599219 * t113 + 0.546948158122426874712 * t115 + 0.245485487140799148922 * t117 - 0.0825793454723323246003 * t119 - 0.401695424652969457517 * t121 - 0.677281571625741074762 * t123 - 0.879473751206489071391 * t125 - 0.986361303402722373603 * t127;
+  const T t150 = 0.324699469204683487408 * t129 + 0.614212712689667817444 * t131 + 0.837166478262528574806 * t133 + 0.969400265939330416736 * t135 + 0.996584493006669849819 * t137 + 0.915773326655057439919 * t139 + 0.735723910673131624774 * t141 + 0.475947393037073544431 * t143 + 0.164594590280733894144 * t145;
+  const T t151 = 0.324699469204683487408 * t128 + 0.614212712689667817444 * t130 + 0.837166478262528574806 * t132 + 0.969400265939330416736 * t134 + 0.996584493006669849819 * t136 + 0.915773326655057439919 * t138 + 0.735723910673131624774 * t140 + 0.475947393037073544431 * t142 + 0.164594590280733894144 * t144;
+  const T t152 = t148 + t150;
+  const T t153 = t149 - t151;
+  p.StC(re + s, im + s, t152, t153);
+  const T t154 = t148 - t150;
+  const T t155 = t149 + t151;
+  p.StC(re + 18 * s, im + 18 * s, t154, t155);
+  const T t156 = t0 + 0.789140509396393599219 * t110 + 0.245485487140799148922 * t112 - 0.401695424652969457517 * t114 - 0.879473751206489071391 * t116 - 0.986361303402722373603 * t118 - 0.677281571625741074762 * t120 - 0.0825793454723323246003 * t122 + 0.546948158122426874712 * t124 + 0.94581724170063467902 * t126;
+  const T t157 = t1 + 0.789140509396393599219 * t111 + 0.245485487140799148922 * t113 - 0.401695424652969457517 * t115 - 0.879473751206489071391 * t117 - 0.986361303402722373603 * t119 - 0.677281571625741074762 * t121 - 0.0825793454723323246003 * t123 + 0.546948158122426874712 * t125 + 0.94581724170063467902 * t127;
+  const T t158 = 0.614212712689667817444 * t129 + 0.969400265939330416736 * t131 + 0.915773326655057439919 * t133 + 0.475947393037073544431 * t135 - 0.164594590280733894144 * t137 - 0.735723910673131624774 * t139 - 0.996584493006669849819 * t141 - 0.837166478262528574806 * t143 - 0.324699469204683487408 * t145;
+  const T t159 = 0.614212712689667817444 * t128 + 0.969400265939330416736 * t130 + 0.915773326655057439919 * t132 + 0.475947393037073544431 * t134 - 0.164594590280733894144 * t136 - 0.735723910673131624774 * t138 - 0.996584493006669849819 * t140 - 0.837166478262528574806 * t142 - 0.324699469204683487408 * t144;
+  const T t160 = t156 + t158;
+  const T t161 = t157 - t159;
+  p.StC(re + 2 * s, im + 2 * s, t160, t161);
+  const T t162 = t156 - t158;
+  const T t163 = t157 + t159;
+  p.StC(re + 17 * s, im + 17 * s, t162, t163);
+  const T t164 = t0 + 0.546948158122426874712 * t110 - 0.401695424652969457517 * t112 - 0.986361303402722373603 * t114 - 0.677281571625741074762 * t116 + 0.245485487140799148922 * t118 + 0.94581724170063467902 * t120 + 0.789140509396393599219 * t122 - 0.0825793454723323246003 * t124 - 0.879473751206489071391 * t126;
+  const T t165 = t1 + 0.546948158122426874712 * t111 - 0.401695424652969457517 * t113 - 0.986361303402722373603 * t115 - 0.677281571625741074762 * t117 + 0.245485487140799148922 * t119 + 0.94581724170063467902 * t121 + 0.789140509396393599219 * t123 - 0.0825793454723323246003 * t125 - 0.879473751206489071391 * t127;
+  const T t166 = 0.837166478262528574806 * t129 + 0.915773326655057439919 * t131 + 0.164594590280733894144 * t133 - 0.735723910673131624774 * t135 - 0.969400265939330416736 * t137 - 0.324699469204683487408 * t139 + 0.614212712689667817444 * t141 + 0.996584493006669849819 * t143 + 0.475947393037073544431 * t145;
+  const T t167 = 0.837166478262528574806 * t128 + 0.915773326655057439919 * t130 + 0.164594590280733894144 * t132 - 0.735723910673131624774 * t134 - 0.969400265939330416736 * t136 - 0.324699469204683487408 * t138 + 0.614212712689667817444 * t140 + 0.996584493006669849819 * t142 + 0.475947393037073544431 * t144;
+  const T t168 = t164 + t166;
+  const T t169 = t165 - t167;
+  p.StC(re + 3 * s, im + 3 * s, t168, t169);
+  const T t170 = t164 - t166;
+  const T t171 = t165 + t167;
+  p.StC(re + 16 * s, im + 16 * s, t170, t171);
+  const T t172 = t0 + 0.245485487140799148922 * t110 - 0.879473751206489071391 * t112 - 0.677281571625741074762 * t114 + 0.546948158122426874712 * t116 + 0.94581724170063467902 * t118 - 0.0825793454723323246003 * t120 - 0.986361303402722373603 * t122 - 0.401695424652969457517 * t124 + 0.789140509396393599219 * t126;
+  const T t173 = t1 + 0.245485487140799148922 * t111 - 0.879473751206489071391 * t113 - 0.677281571625741074762 * t115 + 0.546948158122426874712 * t117 + 0.94581724170063467902 * t119 - 0.0825793454723323246003 * t121 - 0.986361303402722373603 * t123 - 0.401695424652969457517 * t125 + 0.789140509396393599219 * t127;
+  const T t174 = 0.969400265939330416736 * t129 + 0.475947393037073544431 * t131 - 0.735723910673131624774 * t133 - 0.837166478262528574806 * t135 + 0.324699469204683487408 * t137 + 0.996584493006669849819 * t139 + 0.164594590280733894144 * t141 - 0.915773326655057439919 * t143 - 0.614212712689667817444 * t145;
+  const T t175 = 0.969400265939330416736 * t128 + 0.475947393037073544431 * t130 - 0.735723910673131624774 * t132 - 0.837166478262528574806 * t134 + 0.324699469204683487408 * t136 + 0.996584493006669849819 * t138 + 0.164594590280733894144 * t140 - 0.915773326655057439919 * t142 - 0.614212712689667817444 * t144;
+  const T t176 = t172 + t174;
+  const T t177 = t173 - t175;
+  p.StC(re + 4 * s, im + 4 * s, t176, t177);
+  const T t178 = t172 - t174;
+  const T t179 = t173 + t175;
+  p.StC(re + 15 * s, im + 15 * s, t178, t179);
+  const T t180 = t0 - 0.0825793454723323246003 * t110 - 0.986361303402722373603 * t112 + 0.245485487140799148922 * t114 + 0.94581724170063467902 * t116 - 0.401695424652969457517 * t118 - 0.879473751206489071391 * t120 + 0.546948158122426874712 * t122 + 0.789140509396393599219 * t124 - 0.677281571625741074762 * t126;
+  const T t181 = t1 - 0.0825793454723323246003 * t111 - 0.986361303402722373603 * t113 + 0.245485487140799148922 * t115 + 0.94581724170063467902 * t117 - 0.401695424652969457517 * t119 - 0.879473751206489071391 * t121 + 0.546948158122426874712 * t123 + 0.789140509396393599219 * t125 - 0.677281571625741074762 * t127;
+  const T t182 = 0.996584493006669849819 * t129 - 0.164594590280733894144 * t131 - 0.969400265939330416736 * t133 + 0.324699469204683487408 * t135 + 0.915773326655057439919 * t137 - 0.475947393037073544431 * t139 - 0.837166478262528574806 * t141 + 0.614212712689667817444 * t143 + 0.735723910673131624774 * t145;
+  const T t183 = 0.996584493006669849819 * t128 - 0.164594590280733894144 * t130 - 0.969400265939330416736 * t132 + 0.324699469204683487408 * t134 + 0.915773326655057439919 * t136 - 0.475947393037073544431 * t138 - 0.837166478262528574806 * t140 + 0.614212712689667817444 * t142 + 0.735723910673131624774 * t144;
+  const T t184 = t180 + t182;
+  const T t185 = t181 - t183;
+  p.StC(re + 5 * s, im + 5 * s, t184, t185);
+  const T t186 = t180 - t182;
+  const T t187 = t181 + t183;
+  p.StC(re + 14 * s, im + 14 * s, t186, t187);
+  const T t188 = t0 - 0.401695424652969457517 * t110 - 0.677281571625741074762 * t112 + 0.94581724170063467902 * t114 - 0.0825793454723323246003 * t116 - 0.879473751206489071391 * t118 + 0.789140509396393599219 * t120 + 0.245485487140799148922 * t122 - 0.986361303402722373603 * t124 + 0.546948158122426874712 * t126;
+  const T t189 = t1 - 0.401695424652969457517 * t111 - 0.677281571625741074762 * t113 + 0.94581724170063467902 * t115 - 0.0825793454723323246003 * t117 - 0.879473751206489071391 * t119 + 0.789140509396393599219 * t121 + 0.245485487140799148922 * t123 - 0.986361303402722373603 * t125 + 0.546948158122426874712 * t127;
+  const T t190 = 0.915773326655057439919 * t129 - 0.735723910673131624774 * t131 - 0.324699469204683487408 * t133 + 0.996584493006669849819 * t135 - 0.475947393037073544431 * t137 - 0.614212712689667817444 * t139 + 0.969400265939330416736 * t141 - 0.164594590280733894144 * t143 - 0.837166478262528574806 * t145;
+  const T t191 = 0.915773326655057439919 * t128 - 0.735723910673131624774 * t130 - 0.324699469204683487408 * t132 + 0.996584493006669849819 * t134 - 0.475947393037073544431 * t136 - 0.614212712689667817444 * t138 + 0.969400265939330416736 * t140 - 0.164594590280733894144 * t142 - 0.837166478262528574806 * t144;
+  const T t192 = t188 + t190;
+  const T t193 = t189 - t191;
+  p.StC(re + 6 * s, im + 6 * s, t192, t193);
+  const T t194 = t188 - t190;
+  const T t195 = t189 + t191;
+  p.StC(re + 13 * s, im + 13 * s, t194, t195);
+  const T t196 = t0 - 0.677281571625741074762 * t110 - 0.0825793454723323246003 * t112 + 0.789140509396393599219 * t114 - 0.986361303402722373603 * t116 + 0.546948158122426874712 * t118 + 0.245485487140799148922 * t120 - 0.879473751206489071391 * t122 + 0.94581724170063467902 * t124 - 0.401695424652969457517 * t126;
+  const T t197 = t1 - 0.677281571625741074762 * t111 - 0.0825793454723323246003 * t113 + 0.789140509396393599219 * t115 - 0.986361303402722373603 * t117 + 0.546948158122426874712 * t119 + 0.245485487140799148922 * t121 - 0.879473751206489071391 * t123 + 0.94581724170063467902 * t125 - 0.401695424652969457517 * t127;
+  const T t198 = 0.735723910673131624774 * t129 - 0.996584493006669849819 * t131 + 0.614212712689667817444 * t133 + 0.164594590280733894144 * t135 - 0.837166478262528574806 * t137 + 0.969400265939330416736 * t139 - 0.475947393037073544431 * t141 - 0.324699469204683487408 * t143 + 0.915773326655057439919 * t145;
+  const T t199 = 0.735723910673131624774 * t128 - 0.996584493006669849819 * t130 + 0.614212712689667817444 * t132 + 0.164594590280733894144 * t134 - 0.837166478262528574806 * t136 + 0.969400265939330416736 * t138 - 0.475947393037073544431 * t140 - 0.324699469204683487408 * t142 + 0.915773326655057439919 * t144;
+  const T t200 = t196 + t198;
+  const T t201 = t197 - t199;
+  p.StC(re + 7 * s, im + 7 * s, t200, t201);
+  const T t202 = t196 - t198;
+  const T t203 = t197 + t199;
+  p.StC(re + 12 * s, im + 12 * s, t202, t203);
+  const T t204 = t0 - 0.879473751206489071391 * t110 + 0.546948158122426874712 * t112 - 0.0825793454723323246003 * t114 - 0.401695424652969457517 * t116 + 0.789140509396393599219 * t118 - 0.986361303402722373603 * t120 + 0.94581724170063467902 * t122 - 0.677281571625741074762 * t124 + 0.245485487140799148922 * t126;
+  const T t205 = t1 - 0.879473751206489071391 * t111 + 0.546948158122426874712 * t113 - 0.0825793454723323246003 * t115 - 0.401695424652969457517 * t117 + 0.789140509396393599219 * t119 - 0.986361303402722373603 * t121 + 0.94581724170063467902 * t123 - 0.677281571625741074762 * t125 + 0.245485487140799148922 * t127;
+  const T t206 = 0.475947393037073544431 * t129 - 0.837166478262528574806 * t131 + 0.996584493006669849819 * t133 - 0.915773326655057439919 * t135 + 0.614212712689667817444 * t137 - 0.164594590280733894144 * t139 - 0.324699469204683487408 * t141 + 0.735723910673131624774 * t143 - 0.969400265939330416736 * t145;
+  const T t207 = 0.475947393037073544431 * t128 - 0.837166478262528574806 * t130 + 0.996584493006669849819 * t132 - 0.915773326655057439919 * t134 + 0.614212712689667817444 * t136 - 0.164594590280733894144 * t138 - 0.324699469204683487408 * t140 + 0.735723910673131624774 * t142 - 0.969400265939330416736 * t144;
+  const T t208 = t204 + t206;
+  const T t209 = t205 - t207;
+  p.StC(re + 8 * s, im + 8 * s, t208, t209);
+  const T t210 = t204 - t206;
+  const T t211 = t205 + t207;
+  p.StC(re + 11 * s, im + 11 * s, t210, t211);
+  const T t212 = t0 - 0.986361303402722373603 * t110 + 0.94581724170063467902 * t112 - 0.879473751206489071391 * t114 + 0.789140509396393599219 * t116 - 0.677281571625741074762 * t118 + 0.546948158122426874712 * t120 - 0.401695424652969457517 * t122 + 0.245485487140799148922 * t124 - 0.0825793454723323246003 * t126;
+  const T t213 = t1 - 0.986361303402722373603 * t111 + 0.94581724170063467902 * t113 - 0.879473751206489071391 * t115 + 0.789140509396393599219 * t117 - 0.677281571625741074762 * t119 + 0.546948158122426874712 * t121 - 0.401695424652969457517 * t123 + 0.245485487140799148922 * t125 - 0.0825793454723323246003 * t127;
+  const T t214 = 0.164594590280733894144 * t129 - 0.324699469204683487408 * t131 + 0.475947393037073544431 * t133 - 0.614212712689667817444 * t135 + 0.735723910673131624774 * t137 - 0.837166478262528574806 * t139 + 0.915773326655057439919 * t141 - 0.969400265939330416736 * t143 + 0.996584493006669849819 * t145;
+  const T t215 = 0.164594590280733894144 * t128 - 0.324699469204683487408 * t130 + 0.475947393037073544431 * t132 - 0.614212712689667817444 * t134 + 0.735723910673131624774 * t136 - 0.837166478262528574806 * t138 + 0.915773326655057439919 * t140 - 0.969400265939330416736 * t142 + 0.996584493006669849819 * t144;
+  const T t216 = t212 + t214;
+  const T t217 = t213 - t215;
+  p.StC(re + 9 * s, im + 9 * s, t216, t217);
+  const T t218 = t212 - t214;
+  const T t219 = t213 + t215;
+  p.StC(re + 10 * s, im + 10 * s, t218, t219);
+}
+
+template <class P>
+FFTK_BODY void RealDft19(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + is);
+  const T t18 = p.Ld(x + 18 * is);
+  const T t19 = t1 + t18;
+  const T t2 = p.Ld(x + 2 * is);
+  const T t17 = p.Ld(x + 17 * is);
+  const T t20 = t2 + t17;
+  const T t3 = p.Ld(x + 3 * is);
+  const T t16 = p.Ld(x + 16 * is);
+  const T t21 = t3 + t16;
+  const T t4 = p.Ld(x + 4 * is);
+  const T t15 = p.Ld(x + 15 * is);
+  const T t22 = t4 + t15;
+  const T t5 = p.Ld(x + 5 * is);
+  const T t14 = p.Ld(x + 14 * is);
+  const T t23 = t5 + t14;
+  const T t6 = p.Ld(x + 6 * is);
+  const T t13 = p.Ld(x + 13 * is);
+  const T t24 = t6 + t13;
+  const T t7 = p.Ld(x + 7 * is);
+  const T t12 = p.Ld(x + 12 * is);
+  const T t25 = t7 + t12;
+  const T t8 = p.Ld(x + 8 * is);
+  const T t11 = p.Ld(x + 11 * is);
+  const T t26 = t8 + t11;
+  const T t9 = p.Ld(x + 9 * is);
+  const T t10 = p.Ld(x + 10 * is);
+  const T t27 = t9 + t10;
+  const T t28 = t1 - t18;
+  const T t29 = t2 - t17;
+  const T t30 = t3 - t16;
+  const T t31 = t4 - t15;
+  const T t32 = t5 - t14;
+  const T t33 = t6 - t13;
+  const T t34 = t7 - t12;
+  const T t35 = t8 - t11;
+  const T t36 = t9 - t10;
+  const T t0 = p.Ld(x);
+  const T t37 = t0 + t19 + t20 + t21 + t22 + t23 + t24 + t25 + t26 + t27;
+  p.St(y, t37);
+  const T t38 = t0 + 0.94581724170063467902 * t19 + 0.789140509396393599219 * t20 + 0.546948158122426874712 * t21 + 0.245485487140799148922 * t22 - 0.0825793454723323246003 * t23 - 0.401695424652969457517 * t24 - 0.677281571625741074762 * t25 - 0.879473751206489071391 * t26 - 0.986361303402722373603 * t27;
+  p.St(y + os, t38);
+  const T t39 = 0.324699469204683487408 * t28 + 0.614212712689667817444 * t29 + 0.837166478262528574806 * t30 + 0.969400265939330416736 * t31 + 0.996584493006669849819 * t32 + 0.915773326655057439919 * t33 + 0.735723910673131624774 * t34 + 0.475947393037073544431 * t35 + 0.164594590280733894144 * t36;
+  p.St(y + 18 * os, -t39);
+  const T t40 = t0 + 0.789140509396393599219 * t19 + 0.245485487140799148922 * t20 - 0.401695424652969457517 * t21 - 0.879473751206489071391 * t22 - 0.986361303402722373603 * t23 - 0.677281571625741074762 * t24 - 0.0825793454723323246003 * t25 + 0.546948158122426874712 * t26 + 0.94581724170063467902 * t27;
+  p.St(y + 2 * os, t40);
+  const T t41 = 0.614212712689667817444 * t28 + 0.969400265939330416736 * t29 + 0.915773326655057439919 * t30 + 0.475947393037073544431 * t31 - 0.164594590280733894144 * t32 - 0.735723910673131624774 * t33 - 0.996584493006669849819 * t34 - 0.837166478262528574806 * t35 - 0.324699469204683487408 * t36;
+  p.St(y + 17 * os, -t41);
+  const T t42 = t0 + 0.546948158122426874712 * t19 - 0.401695424652969457517 * t20 - 0.986361303402722373603 * t21 - 0.677281571625741074762 * t22 + 0.245485487140799148922 * t23 + 0.94581724170063467902 * t24 + 0.789140509396393599219 * t25 - 0.0825793454723323246003 * t26 - 0.879473751206489071391 * t27;
+  p.St(y + 3 * os, t42);
+  const T t43 = 0.837166478262528574806 * t28 + 0.915773326655057439919 * t29 + 0.164594590280733894144 * t30 - 0.735723910673131624774 * t31 - 0.969400265939330416736 * t32 - 0.324699469204683487408 * t33 + 0.614212712689667817444 * t34 + 0.996584493006669849819 * t35 + 0.475947393037073544431 * t36;
+  p.St(y + 16 * os, -t43);
+  const T t44 = t0 + 0.245485487140799148922 * t19 - 0.879473751206489071391 * t20 - 0.677281571625741074762 * t21 + 0.546948158122426874712 * t22 + 0.94581724170063467902 * t23 - 0.0825793454723323246003 * t24 - 0.986361303402722373603 * t25 - 0.401695424652969457517 * t26 + 0.789140509396393599219 * t27;
+  p.St(y + 4 * os, t44);
+  const T t45 = 0.969400265939330416736 * t28 + 0.475947393037073544431 * t29 - 0.735723910673131624774 * t30 - 0.837166478262528574806 * t31 + 0.324699469204683487408 * t32 + 0.996584493006669849819 * t33 + 0.164594590280733894144 * t34 - 0.915773326655057439919 * t35 - 0.614212712689667817444 * t36;
+  p.St(y + 15 * os, -t45);
+  const T t46 = t0 - 0.0825793454723323246003 * t19 - 0.986361303402722373603 * t20 + 0.245485487140799148922 * t21 + 0.94581724170063467902 * t22 - 0.401695424652969457517 * t23 - 0.879473751206489071391 * t24 + 0.546948158122426874712 * t25 + 0.789140509396393599219 * t26 - 0.677281571625741074762 * t27;
+  p.St(y + 5 * os, t46);
+  const T t47 = 0.996584493006669849819 * t28 - 0.164594590280733894144 * t29 - 0.969400265939330416736 * t30 + 0.324699469204683487408 * t31 + 0.915773326655057439919 * t32 - 0.475947393037073544431 * t33 - 0.837166478262528574806 * t34 + 0.614212712689667817444 * t35 + 0.735723910673131624774 * t36;
+  p.St(y + 14 * os, -t47);
+  const T t48 = t0 - 0.401695424652969457517 * t19 - 0.677281571625741074762 * t20 + 0.94581724170063467902 * t21 - 0.0825793454723323246003 * t22 - 0.879473751206489071391 * t23 + 0.789140509396393599219 * t24 + 0.245485487140799148922 * t25 - 0.986361303402722373603 * t26 + 0.546948158122426874712 * t27;
+  p.St(y + 6 * os, t48);
+  const T t49 = 0.915773326655057439919 * t28 - 0.735723910673131624774 * t29 - 0.324699469204683487408 * t30 + 0.996584493006669849819 * t31 - 0.475947393037073544431 * t32 - 0.614212712689667817444 * t33 + 0.969400265939330416736 * t34 - 0.164594590280733894144 * t35 - 0.837166478262528574806 * t36;
+  p.St(y + 13 * os, -t49);
+  const T t50 = t0 - 0.677281571625741074762 * t19 - 0.0825793454723323246003 * t20 + 0.789140509396393599219 * t21 - 0.986361303402722373603 * t22 + 0.546948158122426874712 * t23 + 0.245485487140799148922 * t24 - 0.879473751206489071391 * t25 + 0.94581724170063467902 * t26 - 0.401695424652969457517 * t27;
+  p.St(y + 7 * os, t50);
+  const T t51 = 0.735723910673131624774 * t28 - 0.996584493006669849819 * t29 + 0.614212712689667817444 * t30 + 0.164594590280733894144 * t31 - 0.837166478262528574806 * t32 + 0.969400265939330416736 * t33 - 0.475947393037073544431 * t34 - 0.324699469204683487408 * t35 + 0.915773326655057439919 * t36;
+  p.St(y + 12 * os, -t51);
+  const T t52 = t0 - 0.879473751206489071391 * t19 + 0.546948158122426874712 * t20 - 0.0825793454723323246003 * t21 - 0.401695424652969457517 * t22 + 0.789140509396393599219 * t23 - 0.986361303402722373603 * t24 + 0.94581724170063467902 * t25 - 0.677281571625741074762 * t26 + 0.245485487140799148922 * t27;
+  p.St(y + 8 * os, t52);
+  const T t53 = 0.475947393037073544431 * t28 - 0.837166478262528574806 * t29 + 0.996584493006669849819 * t30 - 0.915773326655057439919 * t31 + 0.614212712689667817444 * t32 - 0.164594590280733894144 * t33 - 0.324699469204683487408 * t34 + 0.735723910673131624774 * t35 - 0.969400265939330416736 * t36;
+  p.St(y + 11 * os, -t53);
+  const T t54 = t0 - 0.986361303402722373603 * t19 + 0.94581724170063467902 * t20 - 0.879473751206489071391 * t21 + 0.789140509396393599219 * t22 - 0.677281571625741074762 * t23 + 0.546948158122426874712 * t24 - 0.401695424652969457517 * t25 + 0.245485487140799148922 * t26 - 0.0825793454723323246003 * t27;
+  p.St(y + 9 * os, t54);
+  const T t55 = 0.164594590280733894144 * t28 - 0.324699469204683487408 * t29 + 0.475947393037073544431 * t30 - 0.614212712689667817444 * t31 + 0.735723910673131624774 * t32 - 0.837166478262528574806 * t33 + 0.915773326655057439919 * t34 - 0.969400265939330416736 * t35 + 0.996584493006669849819 * t36;
+  p.St(y + 10 * os, -t55);
+}
+
+template <class P>
+FFTK_BODY void RealTw19(const P& p, double* a, double* b, ptrdiff_t s, const double* wc,
+            const double* ws) {
+  using T = typename P::T;
+  const T t2 = p.Ld(a + s);
+  const T t3 = p.LdB(b + s);
+  const T t4 = p.LdW(wc + 0);
+  const T t5 = p.LdW(ws + 0);
+  const T t6 = p.Tw0(t2, t2 * t4 - t3 * t5);
+  const T t7 = p.Tw0(t3, t3 * t4 + t2 * t5);
+  const T t8 = p.Ld(a + 2 * s);
+  const T t9 = p.LdB(b + 2 * s);
+  const T t10 = p.LdW(wc + 1);
+  const T t11 = p.LdW(ws + 1);
+  const T t12 = p.Tw0(t8, t8 * t10 - t9 * t11);
+  const T t13 = p.Tw0(t9, t9 * t10 + t8 * t11);
+  const T t14 = p.Ld(a + 3 * s);
+  const T t15 = p.LdB(b + 3 * s);
+  const T t16 = p.LdW(wc + 2);
+  const T t17 = p.LdW(ws + 2);
+  const T t18 = p.Tw0(t14, t14 * t16 - t15 * t17);
+  const T t19 = p.Tw0(t15, t15 * t16 + t14 * t17);
+  const T t20 = p.Ld(a + 4 * s);
+  const T t21 = p.LdB(b + 4 * s);
+  const T t22 = p.LdW(wc + 3);
+  const T t23 = p.LdW(ws + 3);
+  const T t24 = p.Tw0(t20, t20 * t22 - t21 * t23);
+  const T t25 = p.Tw0(t21, t21 * t22 + t20 * t23);
+  const T t26 = p.Ld(a + 5 * s);
+  const T t27 = p.LdB(b + 5 * s);
+  const T t28 = p.LdW(wc + 4);
+  const T t29 = p.LdW(ws + 4);
+  const T t30 = p.Tw0(t26, t26 * t28 - t27 * t29);
+  const T t31 = p.Tw0(t27, t27 * t28 + t26 * t29);
+  const T t32 = p.Ld(a + 6 * s);
+  const T t33 = p.LdB(b + 6 * s);
+  const T t34 = p.LdW(wc + 5);
+  const T t35 = p.LdW(ws + 5);
+  const T t36 = p.Tw0(t32, t32 * t34 - t33 * t35);
+  const T t37 = p.Tw0(t33, t33 * t34 + t32 * t35);
+  const T t38 = p.Ld(a + 7 * s);
+  const T t39 = p.LdB(b + 7 * s);
+  const T t40 = p.LdW(wc + 6);
+  const T t41 = p.LdW(ws + 6);
+  const T t42 = p.Tw0(t38, t38 * t40 - t39 * t41);
+  const T t43 = p.Tw0(t39, t39 * t40 + t38 * t41);
+  const T t44 = p.Ld(a + 8 * s);
+  const T t45 = p.LdB(b + 8 * s);
+  const T t46 = p.LdW(wc + 7);
+  const T t47 = p.LdW(ws + 7);
+  const T t48 = p.Tw0(t44, t44 * t46 - t45 * t47);
+  const T t49 = p.Tw0(t45, t45 * t46 + t44 * t47);
+  const T t50 = p.Ld(a + 9 * s);
+  const T t51 = p.LdB(b + 9 * s);
+  const T t52 = p.LdW(wc + 8);
+  const T t53 = p.LdW(ws + 8);
+  const T t54 = p.Tw0(t50, t50 * t52 - t51 * t53);
+  const T t55 = p.Tw0(t51, t51 * t52 + t50 * t53);
+  const T t56 = p.Ld(a + 10 * s);
+  const T t57 = p.LdB(b + 10 * s);
+  const T t58 = p.LdW(wc + 9);
+  const T t59 = p.LdW(ws + 9);
+  const T t60 = p.Tw0(t56, t56 * t58 - t57 * t59);
+  const T t61 = p.Tw0(t57, t57 * t58 + t56 * t59);
+  const T t62 = p.Ld(a + 11 * s);
+  const T t63 = p.LdB(b + 11 * s);
+  const T t64 = p.LdW(wc + 10);
+  const T t65 = p.LdW(ws + 10);
+  const T t66 = p.Tw0(t62, t62 * t64 - t63 * t65);
+  const T t67 = p.Tw0(t63, t63 * t64 + t62 * t65);
+  const T t68 = p.Ld(a + 12 * s);
+  const T t69 = p.LdB(b + 12 * s);
+  const T t70 = p.LdW(wc + 11);
+  const T t71 = p.LdW(ws + 11);
+  const T t72 = p.Tw0(t68, t68 * t70 - t69 * t71);
+  const T t73 = p.Tw0(t69, t69 * t70 + t68 * t71);
+  const T t74 = p.Ld(a + 13 * s);
+  const T t75 = p.LdB(b + 13 * s);
+  const T t76 = p.LdW(wc + 12);
+  const T t77 = p.LdW(ws + 12);
+  const T t78 = p.Tw0(t74, t74 * t76 - t75 * t77);
+  const T t79 = p.Tw0(t75, t75 * t76 + t74 * t77);
+  const T t80 = p.Ld(a + 14 * s);
+  const T t81 = p.LdB(b + 14 * s);
+  const T t82 = p.LdW(wc + 13);
+  const T t83 = p.LdW(ws + 13);
+  const T t84 = p.Tw0(t80, t80 * t82 - t81 * t83);
+  const T t85 = p.Tw0(t81, t81 * t82 + t80 * t83);
+  const T t86 = p.Ld(a + 15 * s);
+  const T t87 = p.LdB(b + 15 * s);
+  const T t88 = p.LdW(wc + 14);
+  const T t89 = p.LdW(ws + 14);
+  const T t90 = p.Tw0(t86, t86 * t88 - t87 * t89);
+  const T t91 = p.Tw0(t87, t87 * t88 + t86 * t89);
+  const T t92 = p.Ld(a + 16 * s);
+  const T t93 = p.LdB(b + 16 * s);
+  const T t94 = p.LdW(wc + 15);
+  const T t95 = p.LdW(ws + 15);
+  const T t96 = p.Tw0(t92, t92 * t94 - t93 * t95);
+  const T t97 = p.Tw0(t93, t93 * t94 + t92 * t95);
+  const T t98 = p.Ld(a + 17 * s);
+  const T t99 = p.LdB(b + 17 * s);
+  const T t100 = p.LdW(wc + 16);
+  const T t101 = p.LdW(ws + 16);
+  const T t102 = p.Tw0(t98, t98 * t100 - t99 * t101);
+  const T t103 = p.Tw0(t99, t99 * t100 + t98 * t101);
+  const T t104 = p.Ld(a + 18 * s);
+  const T t105 = p.LdB(b + 18 * s);
+  const T t106 = p.LdW(wc + 17);
+  const T t107 = p.LdW(ws + 17);
+  const T t108 = p.Tw0(t104, t104 * t106 - t105 * t107);
+  const T t109 = p.Tw0(t105, t105 * t106 + t104 * t107);
+  const T t110 = t6 + t108;
+  const T t111 = t7 + t109;
+  const T t112 = t12 + t102;
+  const T t113 = t13 + t103;
+  const T t114 = t18 + t96;
+  const T t115 = t19 + t97;
+  const T t116 = t24 + t90;
+  const T t117 = t25 + t91;
+  const T t118 = t30 + t84;
+  const T t119 = t31 + t85;
+  const T t120 = t36 + t78;
+  const T t121 = t37 + t79;
+  const T t122 = t42 + t72;
+  const T t123 = t43 + t73;
+  const T t124 = t48 + t66;
+  const T t125 = t49 + t67;
+  const T t126 = t54 + t60;
+  const T t127 = t55 + t61;
+  const T t128 = t6 - t108;
+  const T t129 = t7 - t109;
+  const T t130 = t12 - t102;
+  const T t131 = t13 - t103;
+  const T t132 = t18 - t96;
+  const T t133 = t19 - t97;
+  const T t134 = t24 - t90;
+  const T t135 = t25 - t91;
+  const T t136 = t30 - t84;
+  const T t137 = t31 - t85;
+  const T t138 = t36 - t78;
+  const T t139 = t37 - t79;
+  const T t140 = t42 - t72;
+  const T t141 = t43 - t73;
+  const T t142 = t48 - t66;
+  const T t143 = t49 - t67;
+  const T t144 = t54 - t60;
+  const T t145 = t55 - t61;
+  const T t0 = p.Ld(a);
+  const T t146 = t0 + t110 + t112 + t114 + t116 + t118 + t120 + t122 + t124 + t126;
+  const T t1 = p.LdB(b);
+  p.St(a, t146);
+  const T t147 = t1 + t111 + t113 + t115 + t117 + t119 + t121 + t123 + t125 + t127;
+  p.StB(b + 18 * s, t147);
+  const T t148 = t0 + 0.94581724170063467902 * t110 + 0.789140509396393599219 * t112 + 0.546948158122426874712 * t114 + 0.245485487140799148922 * t116 - 0.0825793454723323246003 * t118 - 0.401695424652969457517 * t120 - 0.677281571625741074762 * t122 - 0.879473751206489071391 * t124 - 0.986361303402722373603 * t126;
+  const T t149 = t1 + 0.94581724170063467902 * t111 + 0.789140509396393599219 * t113 + 0.546948158122426874712 * t115 + 0.245485487140799148922 * t117 - 0.0825793454723323246003 * t119 - 0.401695424652969457517 * t121 - 0.677281571625741074762 * t123 - 0.879473751206489071391 * t125 - 0.986361303402722373603 * t127;
+  const T t150 = 0.324699469204683487408 * t129 + 0.614212712689667817444 * t131 + 0.837166478262528574806 * t133 + 0.969400265939330416736 * t135 + 0.996584493006669849819 * t137 + 0.915773326655057439919 * t139 + 0.735723910673131624774 * t141 + 0.475947393037073544431 * t143 + 0.164594590280733894144 * t145;
+  const T t151 = 0.324699469204683487408 * t128 + 0.614212712689667817444 * t130 + 0.837166478262528574806 * t132 + 0.969400265939330416736 * t134 + 0.996584493006669849819 * t136 + 0.915773326655057439919 * t138 + 0.735723910673131624774 * t140 + 0.475947393037073544431 * t142 + 0.164594590280733894144 * t144;
+  const T t152 = t148 + t150;
+  p.St(a + s, t152);
+  const T t153 = t149 - t151;
+  p.StB(b + 17 * s, t153);
+  const T t154 = t148 - t150;
+  p.StB(b, t154);
+  const T t155 = t149 + t151;
+  p.St(a + 18 * s, -t155);
+  const T t156 = t0 + 0.789140509396393599219 * t110 + 0.245485487140799148922 * t112 - 0.401695424652969457517 * t114 - 0.879473751206489071391 * t116 - 0.986361303402722373603 * t118 - 0.677281571625741074762 * t120 - 0.0825793454723323246003 * t122 + 0.546948158122426874712 * t124 + 0.94581724170063467902 * t126;
+  const T t157 = t1 + 0.789140509396393599219 * t111 + 0.245485487140799148922 * t113 - 0.401695424652969457517 * t115 - 0.879473751206489071391 * t117 - 0.986361303402722373603 * t119 - 0.677281571625741074762 * t121 - 0.0825793454723323246003 * t123 + 0.546948158122426874712 * t125 + 0.94581724170063467902 * t127;
+  const T t158 = 0.614212712689667817444 * t129 + 0.969400265939330416736 * t131 + 0.915773326655057439919 * t133 + 0.475947393037073544431 * t135 - 0.164594590280733894144 * t137 - 0.735723910673131624774 * t139 - 0.996584493006669849819 * t141 - 0.837166478262528574806 * t143 - 0.324699469204683487408 * t145;
+  const T t159 = 0.614212712689667817444 * t128 + 0.969400265939330416736 * t130 + 0.915773326655057439919 * t132 + 0.475947393037073544431 * t134 - 0.164594590280733894144 * t136 - 0.735723910673131624774 * t138 - 0.996584493006669849819 * t140 - 0.837166478262528574806 * t142 - 0.324699469204683487408 * t144;
+  const T t160 = t156 + t158;
+  p.St(a + 2 * s, t160);
+  const T t161 = t157 - t159;
+  p.StB(b + 16 * s, t161);
+  const T t162 = t156 - t158;
+  p.StB(b + s, t162);
+  const T t163 = t157 + t159;
+  p.St(a + 17 * s, -t163);
+  const T t164 = t0 + 0.546948158122426874712 * t110 - 0.401695424652969457517 * t112 - 0.986361303402722373603 * t114 - 0.677281571625741074762 * t116 + 0.245485487140799148922 * t118 + 0.94581724170063467902 * t120 + 0.789140509396393599219 * t122 - 0.0825793454723323246003 * t124 - 0.879473751206489071391 * t126;
+  const T t165 = t1 + 0.546948158122426874712 * t111 - 0.401695424652969457517 * t113 - 0.986361303402722373603 * t115 - 0.677281571625741074762 * t117 + 0.245485487140799148922 * t119 + 0.94581724170063467902 * t121 + 0.789140509396393599219 * t123 - 0.0825793454723323246003 * t125 - 0.879473751206489071391 * t127;
+  const T t166 = 0.837166478262528574806 * t129 + 0.915773326655057439919 * t131 + 0.164594590280733894144 * t133 - 0.735723910673131624774 * t135 - 0.969400265939330416736 * t137 - 0.324699469204683487408 * t139 + 0.614212712689667817444 * t141 + 0.996584493006669849819 * t143 + 0.475947393037073544431 * t145;
+  const T t167 = 0.837166478262528574806 * t128 + 0.915773326655057439919 * t130 + 0.164594590280733894144 * t132 - 0.735723910673131624774 * t134 - 0.969400265939330416736 * t136 - 0.324699469204683487408 * t138 + 0.614212712689667817444 * t140 + 0.996584493006669849819 * t142 + 0.475947393037073544431 * t144;
+  const T t168 = t164 + t166;
+  p.St(a + 3 * s, t168);
+  const T t169 = t165 - t167;
+  p.StB(b + 15 * s, t169);
+  const T t170 = t164 - t166;
+  p.StB(b + 2 * s, t170);
+  const T t171 = t165 + t167;
+  p.St(a + 16 * s, -t171);
+  const T t172 = t0 + 0.245485487140799148922 * t110 - 0.879473751206489071391 * t112 - 0.677281571625741074762 * t114 + 0.546948158122426874712 * t116 + 0.94581724170063467902 * t118 - 0.0825793454723323246003 * t120 - 0.986361303402722373603 * t122 - 0.401695424652969457517 * t124 + 0.789140509396393599219 * t126;
+  const T t173 = t1 + 0.245485487140799148922 * t111 - 0.879473751206489071391 * t113 - 0.677281571625741074762 * t115 + 0.546948158122426874712 * t117 + 0.94581724170063467902 * t119 - 0.0825793454723323246003 * t121 - 0.986361303402722373603 * t123 - 0.401695424652969457517 * t125 + 0.789140509396393599219 * t127;
+  const T t174 = 0.969400265939330416736 * t129 + 0.475947393037073544431 * t131 - 0.735723910673131624774 * t133 - 0.837166478262528574806 * t135 + 0.324699469204683487408 * t137 + 0.996584493006669849819 * t139 + 0.164594590280733894144 * t141 - 0.915773326655057439919 * t143 - 0.614212712689667817444 * t145;
+  const T t175 = 0.969400265939330416736 * t128 + 0.475947393037073544431 * t130 - 0.735723910673131624774 * t132 - 0.837166478262528574806 * t134 + 0.324699469204683487408 * t136 + 0.996584493006669849819 * t138 + 0.164594590280733894144 * t140 - 0.915773326655057439919 * t142 - 0.614212712689667817444 * t144;
+  const T t176 = t172 + t174;
+  p.St(a + 4 * s, t176);
+  const T t177 = t173 - t175;
+  p.StB(b + 14 * s, t177);
+  const T t178 = t172 - t174;
+  p.StB(b + 3 * s, t178);
+  const T t179 = t173 + t175;
+  p.St(a + 15 * s, -t179);
+  const T t180 = t0 - 0.0825793454723323246003 * t110 - 0.986361303402722373603 * t112 + 0.245485487140799148922 * t114 + 0.94581724170063467902 * t116 - 0.401695424652969457517 * t118 - 0.879473751206489071391 * t120 + 0.546948158122426874712 * t122 + 0.789140509396393599219 * t124 - 0.677281571625741074762 * t126;
+  const T t181 = t1 - 0.0825793454723323246003 * t111 - 0.986361303402722373603 * t113 + 0.245485487140799148922 * t115 + 0.94581724170063467902 * t117 - 0.401695424652969457517 * t119 - 0.879473751206489071391 * t121 + 0.546948158122426874712 * t123 + 0.789140509396393599219 * t125 - 0.677281571625741074762 * t127;
+  const T t182 = 0.996584493006669849819 * t129 - 0.164594590280733894144 * t131 - 0.969400265939330416736 * t133 + 0.324699469204683487408 * t135 + 0.915773326655057439919 * t137 - 0.475947393037073544431 * t139 - 0.837166478262528574806 * t141 + 0.614212712689667817444 * t143 + 0.735723910673131624774 * t145;
+  const T t183 = 0.996584493006669849819 * t128 - 0.164594590280733894144 * t130 - 0.969400265939330416736 * t132 + 0.324699469204683487408 * t134 + 0.915773326655057439919 * t136 - 0.475947393037073544431 * t138 - 0.837166478262528574806 * t140 + 0.614212712689667817444 * t142 + 0.735723910673131624774 * t144;
+  const T t184 = t180 + t182;
+  p.St(a + 5 * s, t184);
+  const T t185 = t181 - t183;
+  p.StB(b + 13 * s, t185);
+  const T t186 = t180 - t182;
+  p.StB(b + 4 * s, t186);
+  const T t187 = t181 + t183;
+  p.St(a + 14 * s, -t187);
+  const T t188 = t0 - 0.401695424652969457517 * t110 - 0.677281571625741074762 * t112 + 0.94581724170063467902 * t114 - 0.0825793454723323246003 * t116 - 0.879473751206489071391 * t118 + 0.789140509396393599219 * t120 + 0.245485487140799148922 * t122 - 0.986361303402722373603 * t124 + 0.546948158122426874712 * t126;
+  const T t189 = t1 - 0.401695424652969457517 * t111 - 0.677281571625741074762 * t113 + 0.94581724170063467902 * t115 - 0.0825793454723323246003 * t117 - 0.879473751206489071391 * t119 + 0.789140509396393599219 * t121 + 0.245485487140799148922 * t123 - 0.986361303402722373603 * t125 + 0.546948158122426874712 * t127;
+  const T t190 = 0.915773326655057439919 * t129 - 0.735723910673131624774 * t131 - 0.324699469204683487408 * t133 + 0.996584493006669849819 * t135 - 0.475947393037073544431 * t137 - 0.614212712689667817444 * t139 + 0.969400265939330416736 * t141 - 0.164594590280733894144 * t143 - 0.837166478262528574806 * t145;
+  const T t191 = 0.915773326655057439919 * t128 - 0.735723910673131624774 * t130 - 0.324699469204683487408 * t132 + 0.996584493006669849819 * t134 - 0.475947393037073544431 * t136 - 0.614212712689667817444 * t138 + 0.969400265939330416736 * t140 - 0.164594590280733894144 * t142 - 0.837166478262528574806 * t144;
+  const T t192 = t188 + t190;
+  p.St(a + 6 * s, t192);
+  const T t193 = t189 - t191;
+  p.StB(b + 12 * s, t193);
+  const T t194 = t188 - t190;
+  p.StB(b + 5 * s, t194);
+  const T t195 = t189 + t191;
+  p.St(a + 13 * s, -t195);
+  const T t196 = t0 - 0.677281571625741074762 * t110 - 0.0825793454723323246003 * t112 + 0.789140509396393599219 * t114 - 0.986361303402722373603 * t116 + 0.546948158122426874712 * t118 + 0.245485487140799148922 * t120 - 0.879473751206489071391 * t122 + 0.94581724170063467902 * t124 - 0.401695424652969457517 * t126;
+  const T t197 = t1 - 0.677281571625741074762 * t111 - 0.0825793454723323246003 * t113 + 0.789140509396393599219 * t115 - 0.986361303402722373603 * t117 + 0.546948158122426874712 * t119 + 0.245485487140799148922 * t121 - 0.879473751206489071391 * t123 + 0.94581724170063467902 * t125 - 0.401695424652969457517 * t127;
+  const T t198 = 0.735723910673131624774 * t129 - 0.996584493006669849819 * t131 + 0.614212712689667817444 * t133 + 0.164594590280733894144 * t135 - 0.837166478262528574806 * t137 + 0.969400265939330416736 * t139 - 0.475947393037073544431 * t141 - 0.324699469204683487408 * t143 + 0.915773326655057439919 * t145;
+  const T t199 = 0.735723910673131624774 * t128 - 0.996584493006669849819 * t130 + 0.614212712689667817444 * t132 + 0.164594590280733894144 * t134 - 0.837166478262528574806 * t136 + 0.969400265939330416736 * t138 - 0.475947393037073544431 * t140 - 0.324699469204683487408 * t142 + 0.915773326655057439919 * t144;
+  const T t200 = t196 + t198;
+  p.St(a + 7 * s, t200);
+  const T t201 = t197 - t199;
+  p.StB(b + 11 * s, t201);
+  const T t202 = t196 - t198;
+  p.StB(b + 6 * s, t202);
+  const T t203 = t197 + t199;
+  p.St(a + 12 * s, -t203);
+  const T t204 = t0 - 0.879473751206489071391 * t110 + 0.546948158122426874712 * t112 - 0.0825793454723323246003 * t114 - 0.401695424652969457517 * t116 + 0.789140509396393599219 * t118 - 0.986361303402722373603 * t120 + 0.94581724170063467902 * t122 - 0.677281571625741074762 * t124 + 0.245485487140799148922 * t126;
+  const T t205 = t1 - 0.879473751206489071391 * t111 + 0.546948158122426874712 * t113 - 0.0825793454723323246003 * t115 - 0.401695424652969457517 * t117 + 0.789140509396393599219 * t119 - 0.986361303402722373603 * t121 + 0.94581724170063467902 * t123 - 0.677281571625741074762 * t125 + 0.245485487140799148922 * t127;
+  const T t206 = 0.475947393037073544431 * t129 - 0.837166478262528574806 * t131 + 0.996584493006669849819 * t133 - 0.915773326655057439919 * t135 + 0.614212712689667817444 * t137 - 0.164594590280733894144 * t139 - 0.324699469204683487408 * t141 + 0.735723910673131624774 * t143 - 0.969400265939330416736 * t145;
+  const T t207 = 0.475947393037073544431 * t128 - 0.837166478262528574806 * t130 + 0.996584493006669849819 * t132 - 0.915773326655057439919 * t134 + 0.614212712689667817444 * t136 - 0.164594590280733894144 * t138 - 0.324699469204683487408 * t140 + 0.735723910673131624774 * t142 - 0.969400265939330416736 * t144;
+  const T t208 = t204 + t206;
+  p.St(a + 8 * s, t208);
+  const T t209 = t205 - t207;
+  p.StB(b + 10 * s, t209);
+  const T t210 = t204 - t206;
+  p.StB(b + 7 * s, t210);
+  const T t211 = t205 + t207;
+  p.St(a + 11 * s, -t211);
+  const T t212 = t0 - 0.986361303402722373603 * t110 + 0.94581724170063467902 * t112 - 0.879473751206489071391 * t114 + 0.789140509396393599219 * t116 - 0.677281571625741074762 * t118 + 0.546948158122426874712 * t120 - 0.401695424652969457517 * t122 + 0.245485487140799148922 * t124 - 0.0825793454723323246003 * t126;
+  const T t213 = t1 - 0.986361303402722373603 * t111 + 0.94581724170063467902 * t113 - 0.879473751206489071391 * t115 + 0.789140509396393599219 * t117 - 0.677281571625741074762 * t119 + 0.546948158122426874712 * t121 - 0.401695424652969457517 * t123 + 0.245485487140799148922 * t125 - 0.0825793454723323246003 * t127;
+  const T t214 = 0.164594590280733894144 * t129 - 0.324699469204683487408 * t131 + 0.475947393037073544431 * t133 - 0.614212712689667817444 * t135 + 0.735723910673131624774 * t137 - 0.837166478262528574806 * t139 + 0.915773326655057439919 * t141 - 0.969400265939330416736 * t143 + 0.996584493006669849819 * t145;
+  const T t215 = 0.164594590280733894144 * t128 - 0.324699469204683487408 * t130 + 0.475947393037073544431 * t132 - 0.614212712689667817444 * t134 + 0.735723910673131624774 * t136 - 0.837166478262528574806 * t138 + 0.915773326655057439919 * t140 - 0.969400265939330416736 * t142 + 0.996584493006669849819 * t144;
+  const T t216 = t212 + t214;
+  p.St(a + 9 * s, t216);
+  const T t217 = t213 - t215;
+  p.StB(b + 9 * s, t217);
+  const T t218 = t212 - t214;
+  p.StB(b + 8 * s, t218);
+  const T t219 = t213 + t215;
+  p.St(a + 10 * s, -t219);
+}
+
+template <class P>
+FFTK_BODY void RealHalf19(const P& p, double* x, ptrdiff_t s) {
+  using T = typename P::T;
+  const T t1 = p.Ld(x + s);
+  const T t2 = 0.986361303402722373603 * t1;
+  const T t3 = 0.164594590280733894144 * t1;
+  const T t4 = p.Ld(x + 2 * s);
+  const T t5 = 0.94581724170063467902 * t4;
+  const T t6 = 0.324699469204683487408 * t4;
+  const T t7 = p.Ld(x + 3 * s);
+  const T t8 = 0.879473751206489071391 * t7;
+  const T t9 = 0.475947393037073544431 * t7;
+  const T t10 = p.Ld(x + 4 * s);
+  const T t11 = 0.789140509396393599219 * t10;
+  const T t12 = 0.614212712689667817444 * t10;
+  const T t13 = p.Ld(x + 5 * s);
+  const T t14 = 0.677281571625741074762 * t13;
+  const T t15 = 0.735723910673131624774 * t13;
+  const T t16 = p.Ld(x + 6 * s);
+  const T t17 = 0.546948158122426874712 * t16;
+  const T t18 = 0.837166478262528574806 * t16;
+  const T t19 = p.Ld(x + 7 * s);
+  const T t20 = 0.401695424652969457517 * t19;
+  const T t21 = 0.915773326655057439919 * t19;
+  const T t22 = p.Ld(x + 8 * s);
+  const T t23 = 0.245485487140799148922 * t22;
+  const T t24 = 0.969400265939330416736 * t22;
+  const T t25 = p.Ld(x + 9 * s);
+  const T t26 = 0.0825793454723323246003 * t25;
+  const T t27 = 0.996584493006669849819 * t25;
+  const T t28 = p.Ld(x + 10 * s);
+  const T t29 = 0.0825793454723323246003 * t28;
+  const T t30 = 0.996584493006669849819 * t28;
+  const T t31 = p.Ld(x + 11 * s);
+  const T t32 = 0.245485487140799148922 * t31;
+  const T t33 = 0.969400265939330416736 * t31;
+  const T t34 = p.Ld(x + 12 * s);
+  const T t35 = 0.401695424652969457517 * t34;
+  const T t36 = 0.915773326655057439919 * t34;
+  const T t37 = p.Ld(x + 13 * s);
+  const T t38 = 0.546948158122426874712 * t37;
+  const T t39 = 0.837166478262528574806 * t37;
+  const T t40 = p.Ld(x + 14 * s);
+  const T t41 = 0.677281571625741074762 * t40;
+  const T t42 = 0.735723910673131624774 * t40;
+  const T t43 = p.Ld(x + 15 * s);
+  const T t44 = 0.789140509396393599219 * t43;
+  const T t45 = 0.614212712689667817444 * t43;
+  const T t46 = p.Ld(x + 16 * s);
+  const T t47 = 0.879473751206489071391 * t46;
+  const T t48 = 0.475947393037073544431 * t46;
+  const T t49 = p.Ld(x + 17 * s);
+  const T t50 = 0.94581724170063467902 * t49;
+  const T t51 = 0.324699469204683487408 * t49;
+  const T t52 = p.Ld(x + 18 * s);
+  const T t53 = 0.986361303402722373603 * t52;
+  const T t54 = 0.164594590280733894144 * t52;
+  const T t55 = t2 - t53;
+  const T t56 = t3 + t54;
+  const T t57 = t5 - t50;
+  const T t58 = t6 + t51;
+  const T t59 = t8 - t47;
+  const T t60 = t9 + t48;
+  const T t61 = t11 - t44;
+  const T t62 = t12 + t45;
+  const T t63 = t14 - t41;
+  const T t64 = t15 + t42;
+  const T t65 = t17 - t38;
+  const T t66 = t18 + t39;
+  const T t67 = t20 - t35;
+  const T t68 = t21 + t36;
+  const T t69 = t23 - t32;
+  const T t70 = t24 + t33;
+  const T t71 = t26 - t29;
+  const T t72 = t27 + t30;
+  const T t73 = t2 + t53;
+  const T t74 = t54 - t3;
+  const T t75 = t5 + t50;
+  const T t76 = t51 - t6;
+  const T t77 = t8 + t47;
+  const T t78 = t48 - t9;
+  const T t79 = t11 + t44;
+  const T t80 = t45 - t12;
+  const T t81 = t14 + t41;
+  const T t82 = t42 - t15;
+  const T t83 = t17 + t38;
+  const T t84 = t39 - t18;
+  const T t85 = t20 + t35;
+  const T t86 = t36 - t21;
+  const T t87 = t23 + t32;
+  const T t88 = t33 - t24;
+  const T t89 = t26 + t29;
+  const T t90 = t30 - t27;
+  const T t0 = p.Ld(x);
+  const T t91 = t0 + t55 + t57 + t59 + t61 + t63 + t65 + t67 + t69 + t71;
+  p.St(x, t91);
+  const T t92 = t56 + t58 + t60 + t62 + t64 + t66 + t68 + t70 + t72;
+  p.St(x + 18 * s, -t92);
+  const T t93 = t0 + 0.94581724170063467902 * t55 + 0.789140509396393599219 * t57 + 0.546948158122426874712 * t59 + 0.245485487140799148922 * t61 - 0.0825793454723323246003 * t63 - 0.401695424652969457517 * t65 - 0.677281571625741074762 * t67 - 0.879473751206489071391 * t69 - 0.986361303402722373603 * t71;
+  const T t94 = 0.94581724170063467902 * t56 + 0.789140509396393599219 * t58 + 0.546948158122426874712 * t60 + 0.245485487140799148922 * t62 - 0.0825793454723323246003 * t64 - 0.401695424652969457517 * t66 - 0.677281571625741074762 * t68 - 0.879473751206489071391 * t70 - 0.986361303402722373603 * t72;
+  const T t95 = 0.324699469204683487408 * t74 + 0.614212712689667817444 * t76 + 0.837166478262528574806 * t78 + 0.969400265939330416736 * t80 + 0.996584493006669849819 * t82 + 0.915773326655057439919 * t84 + 0.735723910673131624774 * t86 + 0.475947393037073544431 * t88 + 0.164594590280733894144 * t90;
+  const T t96 = 0.324699469204683487408 * t73 + 0.614212712689667817444 * t75 + 0.837166478262528574806 * t77 + 0.969400265939330416736 * t79 + 0.996584493006669849819 * t81 + 0.915773326655057439919 * t83 + 0.735723910673131624774 * t85 + 0.475947393037073544431 * t87 + 0.164594590280733894144 * t89;
+  const T t97 = t93 + t95;
+  p.St(x + s, t97);
+  const T t98 = t94 + t96;
+  p.St(x + 17 * s, -t98);
+  const T t101 = t0 + 0.789140509396393599219 * t55 + 0.245485487140799148922 * t57 - 0.401695424652969457517 * t59 - 0.879473751206489071391 * t61 - 0.986361303402722373603 * t63 - 0.677281571625741074762 * t65 - 0.0825793454723323246003 * t67 + 0.546948158122426874712 * t69 + 0.94581724170063467902 * t71;
+  const T t102 = 0.789140509396393599219 * t56 + 0.245485487140799148922 * t58 - 0.401695424652969457517 * t60 - 0.879473751206489071391 * t62 - 0.986361303402722373603 * t64 - 0.677281571625741074762 * t66 - 0.0825793454723323246003 * t68 + 0.546948158122426874712 * t70 + 0.94581724170063467902 * t72;
+  const T t103 = 0.614212712689667817444 * t74 + 0.969400265939330416736 * t76 + 0.915773326655057439919 * t78 + 0.475947393037073544431 * t80 - 0.164594590280733894144 * t82 - 0.735723910673131624774 * t84 - 0.996584493006669849819 * t86 - 0.837166478262528574806 * t88 - 0.324699469204683487408 * t90;
+  const T t104 = 0.614212712689667817444 * t73 + 0.969400265939330416736 * t75 + 0.915773326655057439919 * t77 + 0.475947393037073544431 * t79 - 0.164594590280733894144 * t81 - 0.735723910673131624774 * t83 - 0.996584493006669849819 * t85 - 0.837166478262528574806 * t87 - 0.324699469204683487408 * t89;
+  const T t105 = t101 + t103;
+  p.St(x + 2 * s, t105);
+  const T t106 = t102 + t104;
+  p.St(x + 16 * s, -t106);
+  const T t109 = t0 + 0.546948158122426874712 * t55 - 0.401695424652969457517 * t57 - 0.986361303402722373603 * t59 - 0.677281571625741074762 * t61 + 0.245485487140799148922 * t63 + 0.94581724170063467902 * t65 + 0.789140509396393599219 * t67 - 0.0825793454723323246003 * t69 - 0.879473751206489071391 * t71;
+  const T t110 = 0.401695424652969457517 * t58 - 0.546948158122426874712 * t56 + 0.986361303402722373603 * t60 + 0.677281571625741074762 * t62 - 0.245485487140799148922 * t64 - 0.94581724170063467902 * t66 - 0.789140509396393599219 * t68 + 0.0825793454723323246003 * t70 + 0.879473751206489071391 * t72;
+  const T t111 = 0.837166478262528574806 * t74 + 0.915773326655057439919 * t76 + 0.164594590280733894144 * t78 - 0.735723910673131624774 * t80 - 0.969400265939330416736 * t82 - 0.324699469204683487408 * t84 + 0.614212712689667817444 * t86 + 0.996584493006669849819 * t88 + 0.475947393037073544431 * t90;
+  const T t112 = 0.837166478262528574806 * t73 + 0.915773326655057439919 * t75 + 0.164594590280733894144 * t77 - 0.735723910673131624774 * t79 - 0.969400265939330416736 * t81 - 0.324699469204683487408 * t83 + 0.614212712689667817444 * t85 + 0.996584493006669849819 * t87 + 0.475947393037073544431 * t89;
+  const T t113 = t109 + t111;
+  p.St(x + 3 * s, t113);
+  const T t114 = t110 - t112;
+  p.St(x + 15 * s, t114);
+  const T t117 = t0 + 0.245485487140799148922 * t55 - 0.879473751206489071391 * t57 - 0.677281571625741074762 * t59 + 0.546948158122426874712 * t61 + 0.94581724170063467902 * t63 - 0.0825793454723323246003 * t65 - 0.986361303402722373603 * t67 - 0.401695424652969457517 * t69 + 0.789140509396393599219 * t71;
+  const T t118 = 0.879473751206489071391 * t58 - 0.245485487140799148922 * t56 + 0.677281571625741074762 * t60 - 0.546948158122426874712 * t62 - 0.94581724170063467902 * t64 + 0.0825793454723323246003 * t66 + 0.986361303402722373603 * t68 + 0.401695424652969457517 * t70 - 0.789140509396393599219 * t72;
+  const T t119 = 0.969400265939330416736 * t74 + 0.475947393037073544431 * t76 - 0.735723910673131624774 * t78 - 0.837166478262528574806 * t80 + 0.324699469204683487408 * t82 + 0.996584493006669849819 * t84 + 0.164594590280733894144 * t86 - 0.915773326655057439919 * t88 - 0.614212712689667817444 * t90;
+  const T t120 = 0.969400265939330416736 * t73 + 0.475947393037073544431 * t75 - 0.735723910673131624774 * t77 - 0.837166478262528574806 * t79 + 0.324699469204683487408 * t81 + 0.996584493006669849819 * t83 + 0.164594590280733894144 * t85 - 0.915773326655057439919 * t87 - 0.614212712689667817444 * t89;
+  const T t121 = t117 + t119;
+  p.St(x + 4 * s, t121);
+  const T t122 = t118 - t120;
+  p.St(x + 14 * s, t122);
+  const T t125 = t0 - 0.0825793454723323246003 * t55 - 0.986361303402722373603 * t57 + 0.245485487140799148922 * t59 + 0.94581724170063467902 * t61 - 0.401695424652969457517 * t63 - 0.879473751206489071391 * t65 + 0.546948158122426874712 * t67 + 0.789140509396393599219 * t69 - 0.677281571625741074762 * t71;
+  const T t126 = 0.0825793454723323246003 * t56 + 0.986361303402722373603 * t58 - 0.245485487140799148922 * t60 - 0.94581724170063467902 * t62 + 0.401695424652969457517 * t64 + 0.879473751206489071391 * t66 - 0.546948158122426874712 * t68 - 0.789140509396393599219 * t70 + 0.677281571625741074762 * t72;
+  const T t127 = 0.996584493006669849819 * t74 - 0.164594590280733894144 * t76 - 0.969400265939330416736 * t78 + 0.324699469204683487408 * t80 + 0.915773326655057439919 * t82 - 0.475947393037073544431 * t84 - 0.837166478262528574806 * t86 + 0.614212712689667817444 * t88 + 0.735723910673131624774 * t90;
+  const T t128 = 0.996584493006669849819 * t73 - 0.164594590280733894144 * t75 - 0.969400265939330416736 * t77 + 0.324699469204683487408 * t79 + 0.915773326655057439919 * t81 - 0.475947393037073544431 * t83 - 0.837166478262528574806 * t85 + 0.614212712689667817444 * t87 + 0.735723910673131624774 * t89;
+  const T t129 = t125 + t127;
+  p.St(x + 5 * s, t129);
+  const T t130 = t126 - t128;
+  p.St(x + 13 * s, t130);
+  const T t133 = t0 - 0.401695424652969457517 * t55 - 0.677281571625741074762 * t57 + 0.94581724170063467902 * t59 - 0.0825793454723323246003 * t61 - 0.879473751206489071391 * t63 + 0.789140509396393599219 * t65 + 0.245485487140799148922 * t67 - 0.986361303402722373603 * t69 + 0.546948158122426874712 * t71;
+  const T t134 = 0.401695424652969457517 * t56 + 0.677281571625741074762 * t58 - 0.94581724170063467902 * t60 + 0.0825793454723323246003 * t62 + 0.879473751206489071391 * t64 - 0.789140509396393599219 * t66 - 0.245485487140799148922 * t68 + 0.986361303402722373603 * t70 - 0.546948158122426874712 * t72;
+  const T t135 = 0.915773326655057439919 * t74 - 0.735723910673131624774 * t76 - 0.324699469204683487408 * t78 + 0.996584493006669849819 * t80 - 0.475947393037073544431 * t82 - 0.614212712689667817444 * t84 + 0.969400265939330416736 * t86 - 0.164594590280733894144 * t88 - 0.837166478262528574806 * t90;
+  const T t136 = 0.915773326655057439919 * t73 - 0.735723910673131624774 * t75 - 0.324699469204683487408 * t77 + 0.996584493006669849819 * t79 - 0.475947393037073544431 * t81 - 0.614212712689667817444 * t83 + 0.969400265939330416736 * t85 - 0.164594590280733894144 * t87 - 0.837166478262528574806 * t89;
+  const T t137 = t133 + t135;
+  p.St(x + 6 * s, t137);
+  const T t138 = t134 - t136;
+  p.St(x + 12 * s, t138);
+  const T t141 = t0 - 0.677281571625741074762 * t55 - 0.0825793454723323246003 * t57 + 0.789140509396393599219 * t59 - 0.986361303402722373603 * t61 + 0.546948158122426874712 * t63 + 0.245485487140799148922 * t65 - 0.879473751206489071391 * t67 + 0.94581724170063467902 * t69 - 0.401695424652969457517 * t71;
+  const T t142 = 0.677281571625741074762 * t56 + 0.0825793454723323246003 * t58 - 0.789140509396393599219 * t60 + 0.986361303402722373603 * t62 - 0.546948158122426874712 * t64 - 0.245485487140799148922 * t66 + 0.879473751206489071391 * t68 - 0.94581724170063467902 * t70 + 0.401695424652969457517 * t72;
+  const T t143 = 0.735723910673131624774 * t74 - 0.996584493006669849819 * t76 + 0.614212712689667817444 * t78 + 0.164594590280733894144 * t80 - 0.837166478262528574806 * t82 + 0.969400265939330416736 * t84 - 0.475947393037073544431 * t86 - 0.324699469204683487408 * t88 + 0.915773326655057439919 * t90;
+  const T t144 = 0.735723910673131624774 * t73 - 0.996584493006669849819 * t75 + 0.614212712689667817444 * t77 + 0.164594590280733894144 * t79 - 0.837166478262528574806 * t81 + 0.969400265939330416736 * t83 - 0.475947393037073544431 * t85 - 0.324699469204683487408 * t87 + 0.915773326655057439919 * t89;
+  const T t145 = t141 + t143;
+  p.St(x + 7 * s, t145);
+  const T t146 = t142 - t144;
+  p.St(x + 11 * s, t146);
+  const T t149 = t0 - 0.879473751206489071391 * t55 + 0.546948158122426874712 * t57 - 0.0825793454723323246003 * t59 - 0.401695424652969457517 * t61 + 0.789140509396393599219 * t63 - 0.986361303402722373603 * t65 + 0.94581724170063467902 * t67 - 0.677281571625741074762 * t69 + 0.245485487140799148922 * t71;
+  const T t150 = 0.879473751206489071391 * t56 - 0.546948158122426874712 * t58 + 0.0825793454723323246003 * t60 + 0.401695424652969457517 * t62 - 0.789140509396393599219 * t64 + 0.986361303402722373603 * t66 - 0.94581724170063467902 * t68 + 0.677281571625741074762 * t70 - 0.245485487140799148922 * t72;
+  const T t151 = 0.475947393037073544431 * t74 - 0.837166478262528574806 * t76 + 0.996584493006669849819 * t78 - 0.915773326655057439919 * t80 + 0.614212712689667817444 * t82 - 0.164594590280733894144 * t84 - 0.324699469204683487408 * t86 + 0.735723910673131624774 * t88 - 0.969400265939330416736 * t90;
+  const T t152 = 0.475947393037073544431 * t73 - 0.837166478262528574806 * t75 + 0.996584493006669849819 * t77 - 0.915773326655057439919 * t79 + 0.614212712689667817444 * t81 - 0.164594590280733894144 * t83 - 0.324699469204683487408 * t85 + 0.735723910673131624774 * t87 - 0.969400265939330416736 * t89;
+  const T t153 = t149 + t151;
+  p.St(x + 8 * s, t153);
+  const T t154 = t150 - t152;
+  p.St(x + 10 * s, t154);
+  const T t157 = t0 - 0.986361303402722373603 * t55 + 0.94581724170063467902 * t57 - 0.879473751206489071391 * t59 + 0.789140509396393599219 * t61 - 0.677281571625741074762 * t63 + 0.546948158122426874712 * t65 - 0.401695424652969457517 * t67 + 0.245485487140799148922 * t69 - 0.0825793454723323246003 * t71;
+  const T t159 = 0.164594590280733894144 * t74 - 0.324699469204683487408 * t76 + 0.475947393037073544431 * t78 - 0.614212712689667817444 * t80 + 0.735723910673131624774 * t82 - 0.837166478262528574806 * t84 + 0.915773326655057439919 * t86 - 0.969400265939330416736 * t88 + 0.996584493006669849819 * t90;
+  const T t161 = t157 + t159;
+  p.St(x + 9 * s, t161);
+}
+
+// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
+    const Interleaved4Access p{is, 19 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft19(p, inRe + t * is, inIm + t * is, ls, outRe + t * 19 * os, outIm + t * 19 * os, os);
+  } else {
+    const Lane4Access p{is, 19 * os, 0, 0};
+    for (; t + 3 < c; t += 4) Dft19(p, inRe + t * is, inIm + t * is, ls, outRe + t * 19 * os, outIm + t * 19 * os, os);
+  }
+  return t;
+}
+
+// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  ptrdiff_t k = 4;
+  if (im == re + 1) {
+    DftTw19(Interleaved4FirstAccess{os, os, 0, 18}, re, im, s, twCos, twSin);
+    const Interleaved4Access p{os, os, 0, 18};
+    for (; k + 3 < m; k += 4) DftTw19(p, re + k * os, im + k * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
+  } else {
+    DftTw19(Lane4FirstAccess{os, os, 0, 18}, re, im, s, twCos, twSin);
+    const Lane4Access p{os, os, 0, 18};
+    for (; k + 3 < m; k += 4) DftTw19(p, re + k * os, im + k * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
+  }
+  return k;
+}
+
+ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  const Lane4Access p{is, 19 * os, 0, 0};
+  ptrdiff_t t = 0;
+  for (; t + 3 < c; t += 4) RealDft19(p, in + t * is, ls, out + t * 19 * os, os);
+  return t;
+}
+
+// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
+  const ptrdiff_t s = m * os;
+  const Lane4Access p{os, os, -os, 18};
+  ptrdiff_t k = 1;
+  for (; 2 * (k + 3) < m; k += 4) RealTw19(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
+  return k;
+}
+
+}  // namespace wide
+}  // namespace
+#pragma GCC pop_options
+#endif
+
+FFTK_CLONES
+void FftComplexLeaf19(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
+  const ptrdiff_t ls = c * is;
+  ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+#endif
+  if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 19 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft19(p, inRe + t * is, inIm + t * is, ls, outRe + t * 19 * os, outIm + t * 19 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft19(p, inRe + t * is, inIm + t * is, ls, outRe + t * 19 * os, outIm + t * 19 * os, os);
   } else {
     const LaneAccess p{is, 19 * os, 0, 0};
-    for (; t + 1 < c; t += 2) {
-      Dft19(p, inRe + t * is, inIm + t * is, ls, outRe + t * 19 * os, outIm + t * 19 * os, os);
-    }
+    for (; t + 1 < c; t += 2) Dft19(p, inRe + t * is, inIm + t * is, ls, outRe + t * 19 * os, outIm + t * 19 * os, os);
   }
-  for (; t < c; ++t) {
-    Dft19(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 19 * os,
-          outIm + t * 19 * os, os);
-  }
+  for (; t < c; ++t) Dft19(ScalarAccess{}, inRe + t * is, inIm + t * is, ls, outRe + t * 19 * os, outIm + t * 19 * os, os);
 }
 
 FFTK_CLONES
-void FftComplexTwiddle19(double* re, double* im, const double* twCos, const double* twSin,
-                         ptrdiff_t os, ptrdiff_t m) {
+void FftComplexTwiddle19(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
-  Dft19(ScalarAccess{}, re, im, s, re, im, s);
-  ptrdiff_t k = 1;
+  ptrdiff_t k = 0;
+#if FFTK_WIDE
+  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);
+#endif
+  if (k == 0) {
+    Dft19(ScalarAccess{}, re, im, s, re, im, s);
+    k = 1;
+  }
   if (im == re + 1) {
     const InterleavedAccess p{os, os, 0, 18};
-    for (; k + 1 < m; k += 2) {
-      DftTw19(p, re + k * os, im + k * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
-    }
+    for (; k + 1 < m; k += 2) DftTw19(p, re + k * os, im + k * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
   } else {
     const LaneAccess p{os, os, 0, 18};
-    for (; k + 1 < m; k += 2) {
-      DftTw19(p, re + k * os, im + k * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
-    }
+    for (; k + 1 < m; k += 2) DftTw19(p, re + k * os, im + k * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
   }
-  for (; k < m; ++k) {
-    DftTw19(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 18,
-           twSin + (k - 1) * 18);
-  }
+  for (; k < m; ++k) DftTw19(ScalarAccess{}, re + k * os, im + k * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
 }
 
 FFTK_CLONES
 void FftRealLeaf19(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
-  const LaneAccess p{is, 19 * os, 0, 0};
   ptrdiff_t t = 0;
+#if FFTK_WIDE
+  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+#endif
+  const LaneAccess p{is, 19 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft19(p, in + t * is, ls, out + t * 19 * os, os);
   for (; t < c; ++t) RealDft19(ScalarAccess{}, in + t * is, ls, out + t * 19 * os, os);
 }
 
 FFTK_CLONES
-void FftRealTwiddle19(double* data, const double* twCos, const double* twSin, ptrdiff_t os,
-                      ptrdiff_t m) {
+void FftRealTwiddle19(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   RealDft19(ScalarAccess{}, data, s, data, s);
-  const LaneAccess p{os, os, -os, 18};
   ptrdiff_t k = 1;
-  for (; 2 * (k + 1) < m; k += 2) {
-    RealTw19(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 18,
-            twSin + (k - 1) * 18);
-  }
-  for (; 2 * k < m; ++k) {
-    RealTw19(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 18,
-            twSin + (k - 1) * 18);
-  }
+#if FFTK_WIDE
+  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+#endif
+  const LaneAccess p{os, os, -os, 18};
+  for (; 2 * (k + 1) < m; k += 2) RealTw19(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
+  for (; 2 * k < m; ++k) RealTw19(ScalarAccess{}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 18, twSin + (k - 1) * 18);
   if (m % 2 == 0) RealHalf19(ScalarAccess{}, data + (m / 2) * os, s);
 }
 // clang-format on

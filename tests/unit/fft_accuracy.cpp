@@ -10,10 +10,12 @@
 #include <cfloat>
 #include <cmath>
 #include <cstdio>
+#include <cstring>
 #include <random>
 #include <vector>
 
 #include "fft/fft.h"
+#include "fft/wide_lanes.h"
 #include "support/direct_dft.h"
 
 namespace {
@@ -173,6 +175,53 @@ TEST(FftAccuracy, Lengths1000To1100) { CheckLengths(Range(1000, 1100), "n = 1000
 TEST(FftAccuracy, LargeLengths) {
   CheckLengths({2438, 1763, 1849, 2021, 2491, 3127, 4096, 1009, 4999, 10007, 30030, 65536},
                "large lengths");
+}
+
+// All outputs of both drivers in interleaved, split and odd-stride layouts,
+// so that the four-lane, two-lane and single forms of every kernel all run.
+std::vector<double> AllOutputs(int32_t n) {
+  const size_t un = static_cast<size_t>(n);
+  const std::vector<double> x = testing_dft::RandomVector(6 * un, 0x5eed0000u + un);
+  std::vector<double> all;
+  FftPlan* plan = FftPlanAcquire(n);
+  EXPECT_NE(plan, nullptr);
+  if (plan == nullptr) return all;
+  std::vector<double> y(6 * un), z(6 * un);
+  EXPECT_EQ(FftComplex(plan, x.data(), x.data() + 1, y.data(), y.data() + 1, 2, 2, n), 0);
+  all.insert(all.end(), y.begin(), y.begin() + 2 * n);
+  EXPECT_EQ(FftComplex(plan, x.data(), x.data() + 3 * un, y.data(), z.data(), 3, 1, n), 0);
+  all.insert(all.end(), y.begin(), y.begin() + n);
+  all.insert(all.end(), z.begin(), z.begin() + n);
+  EXPECT_EQ(FftReal(plan, x.data(), y.data(), 1, 1, n), 0);
+  all.insert(all.end(), y.begin(), y.begin() + n);
+  EXPECT_EQ(FftReal(plan, x.data(), y.data(), 2, 3, n), 0);
+  for (int32_t k = 0; k < n; ++k) all.push_back(y[3 * static_cast<size_t>(k)]);
+  FftPlanRelease(plan);
+  return all;
+}
+
+// The wide (AVX) and SSE2 variants of the kernels run the same operations in
+// the same order, so they must agree bit for bit; the accuracy tests above
+// cover whichever variant this machine runs by default.
+TEST(FftAccuracy, WideAndNarrowKernelsAgreeBitForBit) {
+  fftk::SetWideLanes(true);
+  if (!fftk::WideLanes()) GTEST_SKIP() << "no wide variant on this machine";
+  std::vector<int32_t> lengths = Range(1, 1100);
+  for (int32_t n : {1369, 1763, 1849, 2048, 4096, 10007}) lengths.push_back(n);
+  int mismatched = 0;
+  for (int32_t n : lengths) {
+    fftk::SetWideLanes(true);
+    const std::vector<double> wide = AllOutputs(n);
+    fftk::SetWideLanes(false);
+    const std::vector<double> narrow = AllOutputs(n);
+    ASSERT_EQ(wide.size(), narrow.size());
+    if (std::memcmp(wide.data(), narrow.data(), wide.size() * sizeof(double)) != 0 &&
+        ++mismatched <= 5) {
+      ADD_FAILURE() << "n = " << n << ": the two variants differ";
+    }
+  }
+  fftk::SetWideLanes(true);
+  EXPECT_EQ(mismatched, 0);
 }
 
 }  // namespace
