@@ -115,12 +115,16 @@ struct InterleavedAccess {
 struct Lane4Access {
   using T = V4;
   ptrdiff_t li, lo, lb, lw;
-  static T Gather(const double* p, ptrdiff_t d) { return T{p[0], p[d], p[2 * d], p[3 * d]}; }
-  static void Scatter(double* p, ptrdiff_t d, T v) {
+  // Lane 3 sits at l3 offsets: 3, or 2 to run three transforms (lanes 2 and 3
+  // then read the same legs and write the same values to the same places,
+  // which is harmless in place too, as every leg is read before any write).
+  ptrdiff_t l3 = 3;
+  T Gather(const double* p, ptrdiff_t d) const { return T{p[0], p[d], p[2 * d], p[l3 * d]}; }
+  void Scatter(double* p, ptrdiff_t d, T v) const {
     p[0] = v[0];
     p[d] = v[1];
     p[2 * d] = v[2];
-    p[3 * d] = v[3];
+    p[l3 * d] = v[3];
   }
   T Ld(const double* p) const { return Gather(p, li); }
   T LdB(const double* p) const { return Gather(p, lb); }
@@ -141,9 +145,11 @@ struct Lane4Access {
 // Interleaved complex data, four (re, im) pairs per pair of vectors. The
 // in-lane unpacks leave the lanes in the order 0, 2, 1, 3, so the twiddles
 // are gathered in that order and the stores undo it with the same unpacks.
+// l3 as in Lane4Access.
 struct Interleaved4Access {
   using T = V4;
   ptrdiff_t li, lo, lb, lw;
+  ptrdiff_t l3 = 3;
   static V4 Join(const double* a, const double* b) {
     V2 x, y;
     std::memcpy(&x, a, sizeof x);
@@ -156,21 +162,21 @@ struct Interleaved4Access {
     std::memcpy(a, &x, sizeof x);
     std::memcpy(b, &y, sizeof y);
   }
-  T LdW(const double* p) const { return T{p[0], p[2 * lw], p[lw], p[3 * lw]}; }
+  T LdW(const double* p) const { return T{p[0], p[2 * lw], p[lw], p[l3 * lw]}; }
   static T Tw0(T, T v) { return v; }
   void LdC(const double* re, const double*, T& r, T& i) const {
     const V4 a = Join(re, re + li);
-    const V4 b = Join(re + 2 * li, re + 3 * li);
+    const V4 b = Join(re + 2 * li, re + l3 * li);
     r = __builtin_shuffle(a, b, V4i{0, 4, 2, 6});
     i = __builtin_shuffle(a, b, V4i{1, 5, 3, 7});
   }
   void StC(double* re, double*, T r, T i) const {
     Split(re, re + lo, __builtin_shuffle(r, i, V4i{0, 4, 2, 6}));
-    Split(re + 2 * lo, re + 3 * lo, __builtin_shuffle(r, i, V4i{1, 5, 3, 7}));
+    Split(re + 2 * lo, re + l3 * lo, __builtin_shuffle(r, i, V4i{1, 5, 3, 7}));
   }
 };
 
-// The first group of a combining pass: butterflies 0..3, where butterfly 0
+// The first group of a combining pass (l3 = 3): butterflies 0..3, where butterfly 0
 // takes no twiddle. Its lane keeps the untwiddled value (so the result is
 // exactly that of the plain DFT), and the twiddle pointer is that of
 // butterfly 1, whose entry also fills lane 0 (never used).

@@ -480,21 +480,25 @@ def radix_file(r):
     ]
     wide += core_templates(rr, cores)
     wide += [
-        "// Transforms 0, 1, ... four at a time while four remain; returns how many ran.",
+        "// Transforms 0, 1, ... four at a time, three left run as four with one repeated;",
+        "// returns how many ran.",
         "ptrdiff_t ComplexLeafGroups(%s) {" % leaf_args,
         "  const ptrdiff_t ls = c * is;",
         "  ptrdiff_t t = 0;",
         "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
         "    const Interleaved4Access p{is, %d * os, 0, 0};" % r,
         "    for (; t + 3 < c; t += 4) " + leaf_call % "p",
+        "    if (c - t == 3) " + leaf_call % "Interleaved4Access{is, %d * os, 0, 0, 2}" % r,
         "  } else {",
         "    const Lane4Access p{is, %d * os, 0, 0};" % r,
         "    for (; t + 3 < c; t += 4) " + leaf_call % "p",
+        "    if (c - t == 3) " + leaf_call % "Lane4Access{is, %d * os, 0, 0, 2}" % r,
         "  }",
-        "  return t;",
+        "  return c - t == 3 ? c : t;",
         "}",
         "",
-        "// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.",
+        "// Butterflies 0..3 (0 untwiddled), then four at a time (three left as in the leaf);",
+        "// m >= 4. Returns the next one.",
         "ptrdiff_t ComplexTwiddleGroups(%s) {" % tw_args,
         "  const ptrdiff_t s = m * os;",
         "  ptrdiff_t k = 4;",
@@ -502,12 +506,14 @@ def radix_file(r):
         "    DftTw%s(Interleaved4FirstAccess{os, os, 0, %d}, re, im, s, twCos, twSin);" % (rr, tw),
         "    const Interleaved4Access p{os, os, 0, %d};" % tw,
         "    for (; k + 3 < m; k += 4) " + tw_call % "p",
+        "    if (m - k == 3) " + tw_call % ("Interleaved4Access{os, os, 0, %d, 2}" % tw),
         "  } else {",
         "    DftTw%s(Lane4FirstAccess{os, os, 0, %d}, re, im, s, twCos, twSin);" % (rr, tw),
         "    const Lane4Access p{os, os, 0, %d};" % tw,
         "    for (; k + 3 < m; k += 4) " + tw_call % "p",
+        "    if (m - k == 3) " + tw_call % ("Lane4Access{os, os, 0, %d, 2}" % tw),
         "  }",
-        "  return k;",
+        "  return m - k == 3 ? m : k;",
         "}",
         "",
         "ptrdiff_t RealLeafGroups(%s) {" % rleaf_args,
@@ -515,16 +521,21 @@ def radix_file(r):
         "  const Lane4Access p{is, %d * os, 0, 0};" % r,
         "  ptrdiff_t t = 0;",
         "  for (; t + 3 < c; t += 4) " + rleaf_call % "p",
-        "  return t;",
+        "  if (c - t != 3) return t;",
+        "  " + rleaf_call % ("Lane4Access{is, %d * os, 0, 0, 2}" % r),
+        "  return c;",
         "}",
         "",
-        "// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.",
+        "// Groups k = 1, 2, ... (and their mirrors m - k) below the middle, four at a time",
+        "// (three left as in the leaf).",
         "ptrdiff_t RealTwiddleGroups(%s) {" % rtw_args,
         "  const ptrdiff_t s = m * os;",
         "  const Lane4Access p{os, os, -os, %d};" % tw,
         "  ptrdiff_t k = 1;",
         "  for (; 2 * (k + 3) < m; k += 4) " + rtw_call % "p",
-        "  return k;",
+        "  if (2 * (k + 2) >= m || 2 * (k + 3) < m) return k;  // not three groups left",
+        "  " + rtw_call % ("Lane4Access{os, os, -os, %d, 2}" % tw),
+        "  return k + 3;",
         "}",
         "",
         "}  // namespace wide",
@@ -535,7 +546,7 @@ def radix_file(r):
     ]
     dispatch_complexleaf = [
         "#if FFTK_WIDE",
-        "  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);",
+        "  if (c >= 3 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);",
         "#endif",
     ]
     dispatch_complextwiddle = [
@@ -545,12 +556,12 @@ def radix_file(r):
     ]
     dispatch_realleaf = [
         "#if FFTK_WIDE",
-        "  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);",
+        "  if (c >= 3 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);",
         "#endif",
     ]
     dispatch_realtwiddle = [
         "#if FFTK_WIDE",
-        "  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);",
+        "  if (m >= 7 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);",
         "#endif",
     ]
     # Radix 2 has too little arithmetic per butterfly to pay for the lane

@@ -518,21 +518,25 @@ inline void RealHalf05(const P& p, double* x, ptrdiff_t s) {
   p.St(x + 2 * s, t35);
 }
 
-// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+// Transforms 0, 1, ... four at a time, three left run as four with one repeated;
+// returns how many ran.
 ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const Interleaved4Access p{is, 5 * os, 0, 0};
     for (; t + 3 < c; t += 4) Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
+    if (c - t == 3) Dft05(Interleaved4Access{is, 5 * os, 0, 0, 2}, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
   } else {
     const Lane4Access p{is, 5 * os, 0, 0};
     for (; t + 3 < c; t += 4) Dft05(p, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
+    if (c - t == 3) Dft05(Lane4Access{is, 5 * os, 0, 0, 2}, inRe + t * is, inIm + t * is, ls, outRe + t * 5 * os, outIm + t * 5 * os, os);
   }
-  return t;
+  return c - t == 3 ? c : t;
 }
 
-// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+// Butterflies 0..3 (0 untwiddled), then four at a time (three left as in the leaf);
+// m >= 4. Returns the next one.
 ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   ptrdiff_t k = 4;
@@ -540,12 +544,14 @@ ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, cons
     DftTw05(Interleaved4FirstAccess{os, os, 0, 4}, re, im, s, twCos, twSin);
     const Interleaved4Access p{os, os, 0, 4};
     for (; k + 3 < m; k += 4) DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+    if (m - k == 3) DftTw05(Interleaved4Access{os, os, 0, 4, 2}, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
   } else {
     DftTw05(Lane4FirstAccess{os, os, 0, 4}, re, im, s, twCos, twSin);
     const Lane4Access p{os, os, 0, 4};
     for (; k + 3 < m; k += 4) DftTw05(p, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+    if (m - k == 3) DftTw05(Lane4Access{os, os, 0, 4, 2}, re + k * os, im + k * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
   }
-  return k;
+  return m - k == 3 ? m : k;
 }
 
 ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
@@ -553,16 +559,21 @@ ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t 
   const Lane4Access p{is, 5 * os, 0, 0};
   ptrdiff_t t = 0;
   for (; t + 3 < c; t += 4) RealDft05(p, in + t * is, ls, out + t * 5 * os, os);
-  return t;
+  if (c - t != 3) return t;
+  RealDft05(Lane4Access{is, 5 * os, 0, 0, 2}, in + t * is, ls, out + t * 5 * os, os);
+  return c;
 }
 
-// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+// Groups k = 1, 2, ... (and their mirrors m - k) below the middle, four at a time
+// (three left as in the leaf).
 ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   const Lane4Access p{os, os, -os, 4};
   ptrdiff_t k = 1;
   for (; 2 * (k + 3) < m; k += 4) RealTw05(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
-  return k;
+  if (2 * (k + 2) >= m || 2 * (k + 3) < m) return k;  // not three groups left
+  RealTw05(Lane4Access{os, os, -os, 4, 2}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);
+  return k + 3;
 }
 
 }  // namespace wide
@@ -575,7 +586,7 @@ void FftComplexLeaf05(const double* inRe, const double* inIm, double* outRe, dou
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
 #if FFTK_WIDE
-  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+  if (c >= 3 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
 #endif
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 5 * os, 0, 0};
@@ -613,7 +624,7 @@ void FftRealLeaf05(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
 #if FFTK_WIDE
-  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+  if (c >= 3 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
 #endif
   const LaneAccess p{is, 5 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft05(p, in + t * is, ls, out + t * 5 * os, os);
@@ -626,7 +637,7 @@ void FftRealTwiddle05(double* data, const double* twCos, const double* twSin, pt
   RealDft05(ScalarAccess{}, data, s, data, s);
   ptrdiff_t k = 1;
 #if FFTK_WIDE
-  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+  if (m >= 7 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
 #endif
   const LaneAccess p{os, os, -os, 4};
   for (; 2 * (k + 1) < m; k += 2) RealTw05(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 4, twSin + (k - 1) * 4);

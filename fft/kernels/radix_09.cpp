@@ -1196,21 +1196,25 @@ FFTK_BODY void RealHalf09(const P& p, double* x, ptrdiff_t s) {
   p.St(x + 6 * s, t97);
 }
 
-// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+// Transforms 0, 1, ... four at a time, three left run as four with one repeated;
+// returns how many ran.
 ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const Interleaved4Access p{is, 9 * os, 0, 0};
     for (; t + 3 < c; t += 4) Dft09(p, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
+    if (c - t == 3) Dft09(Interleaved4Access{is, 9 * os, 0, 0, 2}, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
   } else {
     const Lane4Access p{is, 9 * os, 0, 0};
     for (; t + 3 < c; t += 4) Dft09(p, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
+    if (c - t == 3) Dft09(Lane4Access{is, 9 * os, 0, 0, 2}, inRe + t * is, inIm + t * is, ls, outRe + t * 9 * os, outIm + t * 9 * os, os);
   }
-  return t;
+  return c - t == 3 ? c : t;
 }
 
-// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+// Butterflies 0..3 (0 untwiddled), then four at a time (three left as in the leaf);
+// m >= 4. Returns the next one.
 ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   ptrdiff_t k = 4;
@@ -1218,12 +1222,14 @@ ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, cons
     DftTw09(Interleaved4FirstAccess{os, os, 0, 8}, re, im, s, twCos, twSin);
     const Interleaved4Access p{os, os, 0, 8};
     for (; k + 3 < m; k += 4) DftTw09(p, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
+    if (m - k == 3) DftTw09(Interleaved4Access{os, os, 0, 8, 2}, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
   } else {
     DftTw09(Lane4FirstAccess{os, os, 0, 8}, re, im, s, twCos, twSin);
     const Lane4Access p{os, os, 0, 8};
     for (; k + 3 < m; k += 4) DftTw09(p, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
+    if (m - k == 3) DftTw09(Lane4Access{os, os, 0, 8, 2}, re + k * os, im + k * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
   }
-  return k;
+  return m - k == 3 ? m : k;
 }
 
 ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
@@ -1231,16 +1237,21 @@ ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t 
   const Lane4Access p{is, 9 * os, 0, 0};
   ptrdiff_t t = 0;
   for (; t + 3 < c; t += 4) RealDft09(p, in + t * is, ls, out + t * 9 * os, os);
-  return t;
+  if (c - t != 3) return t;
+  RealDft09(Lane4Access{is, 9 * os, 0, 0, 2}, in + t * is, ls, out + t * 9 * os, os);
+  return c;
 }
 
-// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+// Groups k = 1, 2, ... (and their mirrors m - k) below the middle, four at a time
+// (three left as in the leaf).
 ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   const Lane4Access p{os, os, -os, 8};
   ptrdiff_t k = 1;
   for (; 2 * (k + 3) < m; k += 4) RealTw09(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
-  return k;
+  if (2 * (k + 2) >= m || 2 * (k + 3) < m) return k;  // not three groups left
+  RealTw09(Lane4Access{os, os, -os, 8, 2}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);
+  return k + 3;
 }
 
 }  // namespace wide
@@ -1253,7 +1264,7 @@ void FftComplexLeaf09(const double* inRe, const double* inIm, double* outRe, dou
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
 #if FFTK_WIDE
-  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+  if (c >= 3 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
 #endif
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 9 * os, 0, 0};
@@ -1291,7 +1302,7 @@ void FftRealLeaf09(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
 #if FFTK_WIDE
-  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+  if (c >= 3 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
 #endif
   const LaneAccess p{is, 9 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft09(p, in + t * is, ls, out + t * 9 * os, os);
@@ -1304,7 +1315,7 @@ void FftRealTwiddle09(double* data, const double* twCos, const double* twSin, pt
   RealDft09(ScalarAccess{}, data, s, data, s);
   ptrdiff_t k = 1;
 #if FFTK_WIDE
-  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+  if (m >= 7 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
 #endif
   const LaneAccess p{os, os, -os, 8};
   for (; 2 * (k + 1) < m; k += 2) RealTw09(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 8, twSin + (k - 1) * 8);

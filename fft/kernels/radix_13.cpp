@@ -1302,21 +1302,25 @@ FFTK_BODY void RealHalf13(const P& p, double* x, ptrdiff_t s) {
   p.St(x + 6 * s, t107);
 }
 
-// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+// Transforms 0, 1, ... four at a time, three left run as four with one repeated;
+// returns how many ran.
 ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const Interleaved4Access p{is, 13 * os, 0, 0};
     for (; t + 3 < c; t += 4) Dft13(p, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
+    if (c - t == 3) Dft13(Interleaved4Access{is, 13 * os, 0, 0, 2}, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
   } else {
     const Lane4Access p{is, 13 * os, 0, 0};
     for (; t + 3 < c; t += 4) Dft13(p, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
+    if (c - t == 3) Dft13(Lane4Access{is, 13 * os, 0, 0, 2}, inRe + t * is, inIm + t * is, ls, outRe + t * 13 * os, outIm + t * 13 * os, os);
   }
-  return t;
+  return c - t == 3 ? c : t;
 }
 
-// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+// Butterflies 0..3 (0 untwiddled), then four at a time (three left as in the leaf);
+// m >= 4. Returns the next one.
 ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   ptrdiff_t k = 4;
@@ -1324,12 +1328,14 @@ ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, cons
     DftTw13(Interleaved4FirstAccess{os, os, 0, 12}, re, im, s, twCos, twSin);
     const Interleaved4Access p{os, os, 0, 12};
     for (; k + 3 < m; k += 4) DftTw13(p, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
+    if (m - k == 3) DftTw13(Interleaved4Access{os, os, 0, 12, 2}, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
   } else {
     DftTw13(Lane4FirstAccess{os, os, 0, 12}, re, im, s, twCos, twSin);
     const Lane4Access p{os, os, 0, 12};
     for (; k + 3 < m; k += 4) DftTw13(p, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
+    if (m - k == 3) DftTw13(Lane4Access{os, os, 0, 12, 2}, re + k * os, im + k * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
   }
-  return k;
+  return m - k == 3 ? m : k;
 }
 
 ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
@@ -1337,16 +1343,21 @@ ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t 
   const Lane4Access p{is, 13 * os, 0, 0};
   ptrdiff_t t = 0;
   for (; t + 3 < c; t += 4) RealDft13(p, in + t * is, ls, out + t * 13 * os, os);
-  return t;
+  if (c - t != 3) return t;
+  RealDft13(Lane4Access{is, 13 * os, 0, 0, 2}, in + t * is, ls, out + t * 13 * os, os);
+  return c;
 }
 
-// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+// Groups k = 1, 2, ... (and their mirrors m - k) below the middle, four at a time
+// (three left as in the leaf).
 ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   const Lane4Access p{os, os, -os, 12};
   ptrdiff_t k = 1;
   for (; 2 * (k + 3) < m; k += 4) RealTw13(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
-  return k;
+  if (2 * (k + 2) >= m || 2 * (k + 3) < m) return k;  // not three groups left
+  RealTw13(Lane4Access{os, os, -os, 12, 2}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);
+  return k + 3;
 }
 
 }  // namespace wide
@@ -1359,7 +1370,7 @@ void FftComplexLeaf13(const double* inRe, const double* inIm, double* outRe, dou
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
 #if FFTK_WIDE
-  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+  if (c >= 3 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
 #endif
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 13 * os, 0, 0};
@@ -1397,7 +1408,7 @@ void FftRealLeaf13(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
 #if FFTK_WIDE
-  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+  if (c >= 3 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
 #endif
   const LaneAccess p{is, 13 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft13(p, in + t * is, ls, out + t * 13 * os, os);
@@ -1410,7 +1421,7 @@ void FftRealTwiddle13(double* data, const double* twCos, const double* twSin, pt
   RealDft13(ScalarAccess{}, data, s, data, s);
   ptrdiff_t k = 1;
 #if FFTK_WIDE
-  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+  if (m >= 7 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
 #endif
   const LaneAccess p{os, os, -os, 12};
   for (; 2 * (k + 1) < m; k += 2) RealTw13(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 12, twSin + (k - 1) * 12);

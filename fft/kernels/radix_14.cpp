@@ -1754,21 +1754,25 @@ FFTK_BODY void RealHalf14(const P& p, double* x, ptrdiff_t s) {
   p.St(x + 8 * s, t139);
 }
 
-// Transforms 0, 1, ... four at a time while four remain; returns how many ran.
+// Transforms 0, 1, ... four at a time, three left run as four with one repeated;
+// returns how many ran.
 ptrdiff_t ComplexLeafGroups(const double* inRe, const double* inIm, double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const Interleaved4Access p{is, 14 * os, 0, 0};
     for (; t + 3 < c; t += 4) Dft14(p, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
+    if (c - t == 3) Dft14(Interleaved4Access{is, 14 * os, 0, 0, 2}, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
   } else {
     const Lane4Access p{is, 14 * os, 0, 0};
     for (; t + 3 < c; t += 4) Dft14(p, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
+    if (c - t == 3) Dft14(Lane4Access{is, 14 * os, 0, 0, 2}, inRe + t * is, inIm + t * is, ls, outRe + t * 14 * os, outIm + t * 14 * os, os);
   }
-  return t;
+  return c - t == 3 ? c : t;
 }
 
-// Butterflies 0..3 (0 untwiddled), then four at a time; m >= 4. Returns the next one.
+// Butterflies 0..3 (0 untwiddled), then four at a time (three left as in the leaf);
+// m >= 4. Returns the next one.
 ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   ptrdiff_t k = 4;
@@ -1776,12 +1780,14 @@ ptrdiff_t ComplexTwiddleGroups(double* re, double* im, const double* twCos, cons
     DftTw14(Interleaved4FirstAccess{os, os, 0, 13}, re, im, s, twCos, twSin);
     const Interleaved4Access p{os, os, 0, 13};
     for (; k + 3 < m; k += 4) DftTw14(p, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
+    if (m - k == 3) DftTw14(Interleaved4Access{os, os, 0, 13, 2}, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
   } else {
     DftTw14(Lane4FirstAccess{os, os, 0, 13}, re, im, s, twCos, twSin);
     const Lane4Access p{os, os, 0, 13};
     for (; k + 3 < m; k += 4) DftTw14(p, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
+    if (m - k == 3) DftTw14(Lane4Access{os, os, 0, 13, 2}, re + k * os, im + k * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
   }
-  return k;
+  return m - k == 3 ? m : k;
 }
 
 ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
@@ -1789,16 +1795,21 @@ ptrdiff_t RealLeafGroups(const double* in, double* out, ptrdiff_t is, ptrdiff_t 
   const Lane4Access p{is, 14 * os, 0, 0};
   ptrdiff_t t = 0;
   for (; t + 3 < c; t += 4) RealDft14(p, in + t * is, ls, out + t * 14 * os, os);
-  return t;
+  if (c - t != 3) return t;
+  RealDft14(Lane4Access{is, 14 * os, 0, 0, 2}, in + t * is, ls, out + t * 14 * os, os);
+  return c;
 }
 
-// Groups k = 1, 2, ... (and their mirrors m - k) four at a time below the middle.
+// Groups k = 1, 2, ... (and their mirrors m - k) below the middle, four at a time
+// (three left as in the leaf).
 ptrdiff_t RealTwiddleGroups(double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m) {
   const ptrdiff_t s = m * os;
   const Lane4Access p{os, os, -os, 13};
   ptrdiff_t k = 1;
   for (; 2 * (k + 3) < m; k += 4) RealTw14(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
-  return k;
+  if (2 * (k + 2) >= m || 2 * (k + 3) < m) return k;  // not three groups left
+  RealTw14(Lane4Access{os, os, -os, 13, 2}, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
+  return k + 3;
 }
 
 }  // namespace wide
@@ -1811,7 +1822,7 @@ void FftComplexLeaf14(const double* inRe, const double* inIm, double* outRe, dou
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
 #if FFTK_WIDE
-  if (c >= 4 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
+  if (c >= 3 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);
 #endif
   if (inIm == inRe + 1 && outIm == outRe + 1) {
     const InterleavedAccess p{is, 14 * os, 0, 0};
@@ -1849,7 +1860,7 @@ void FftRealLeaf14(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, pt
   const ptrdiff_t ls = c * is;
   ptrdiff_t t = 0;
 #if FFTK_WIDE
-  if (c >= 4 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
+  if (c >= 3 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);
 #endif
   const LaneAccess p{is, 14 * os, 0, 0};
   for (; t + 1 < c; t += 2) RealDft14(p, in + t * is, ls, out + t * 14 * os, os);
@@ -1862,7 +1873,7 @@ void FftRealTwiddle14(double* data, const double* twCos, const double* twSin, pt
   RealDft14(ScalarAccess{}, data, s, data, s);
   ptrdiff_t k = 1;
 #if FFTK_WIDE
-  if (m >= 8 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
+  if (m >= 7 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);
 #endif
   const LaneAccess p{os, os, -os, 13};
   for (; 2 * (k + 1) < m; k += 2) RealTw14(p, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * 13, twSin + (k - 1) * 13);
