@@ -24,6 +24,10 @@ import sys
 # from this list.
 RADICES = [2, 3, 4, 5, 7, 8, 9, 10, 11, 13, 14, 16, 17, 18, 19, 29, 31, 32, 37, 41, 43]
 MAX_RADIX = 43
+# Primes whose complex DFTs are written out by Rader's method: fewer operations
+# there than the symmetric-pair form, whose count grows as the square. DFTs of
+# real values keep the symmetric form, which halves its work for them.
+RADER_PRIMES = [17, 29, 31, 37, 41, 43]
 # The radices with a wide (four-lane AVX) variant.
 WIDE_RADICES = [r for r in RADICES if r != 2]
 
@@ -244,6 +248,53 @@ def is_prime(n):
     return n > 1 and all(n % d for d in range(2, int(n ** 0.5) + 1))
 
 
+def balanced_split(n):
+    """(n1, n2) with n1 the largest divisor of n not above its square root."""
+    n1 = max(d for d in range(2, int(n ** 0.5) + 1) if n % d == 0)
+    return n1, n // n1
+
+
+def primitive_root(n):
+    """The smallest generator of the multiplicative group modulo the prime n."""
+    return next(g for g in range(2, n)
+                if all(pow(g, (n - 1) // f, n) != 1 for f in range(2, n) if (n - 1) % f == 0 and is_prime(f)))
+
+
+def rader_dft(b, xs):
+    """Forward DFT of prime length n as a cyclic convolution of length n-1
+    (Rader): with b_q = x[g^q], X[g^-p] = x0 + sum_q b_q w^(g^(q-p)). The
+    convolution is conj(DFT(conj(DFT(b) . H))) with H the DFT of
+    h_t = w^(g^-t) scaled by 1/(n-1): two straight-line DFTs of the smooth
+    length n-1 instead of the (n-1)^2/... products of the symmetric form."""
+    n = len(xs)
+    m = n - 1
+    g = primitive_root(n)
+    ginv = pow(g, n - 2, n)
+    bseq = [xs[pow(g, q, n)] for q in range(m)]
+    big = dft(b, bseq)
+    scale = CTX.divide(D(1), D(m))
+    conj_c = []
+    for k in range(m):
+        # H_k = (1/m) sum_t exp(-2 pi i (g^-t / n + t k / m)), angles over n*m.
+        hr, hi = D(0), D(0)
+        for t in range(m):
+            a = pow(ginv, t, n) * m + t * k * n
+            hr = CTX.add(hr, cos2pi(a, n * m))
+            hi = CTX.subtract(hi, sin2pi(a, n * m))
+        hr, hi = CTX.multiply(hr, scale), CTX.multiply(hi, scale)
+        br, bi = big[k]
+        # conj(B_k H_k) = (Br hr - Bi hi, -(Br hi + Bi hr))
+        conj_c.append((b.lin([(hr, br), (-hi, bi)]), b.lin([(-hi, br), (-hr, bi)])))
+    conv = dft(b, conj_c)  # conj of the convolution
+    x0r, x0i = xs[0]
+    out = [None] * n
+    out[0] = (b.lin([(1, x0r), (1, big[0][0])]), b.lin([(1, x0i), (1, big[0][1])]))
+    for p in range(m):
+        cr, ci = conv[p]
+        out[pow(ginv, p, n)] = (b.lin([(1, x0r), (1, cr)]), b.lin([(1, x0i), (-1, ci)]))
+    return out
+
+
 def dft(b, xs):
     """Forward DFT of the complex values xs (list of (re, im))."""
     n = len(xs)
@@ -264,6 +315,8 @@ def dft(b, xs):
         return [(X0r, X0i),
                 (b.lin([(1, tr), (c, di)]), b.lin([(1, ti), (-c, dr)])),
                 (b.lin([(1, tr), (-c, di)]), b.lin([(1, ti), (c, dr)]))]
+    if n in RADER_PRIMES and any(v[1] is not None for v in xs):
+        return rader_dft(b, xs)
     if is_prime(n):
         # Symmetric pairs: s_j = x_j + x_(n-j), d_j = x_j - x_(n-j).
         h = (n - 1) // 2
@@ -285,7 +338,7 @@ def dft(b, xs):
             out[q] = (add(b, ar, br), sub(b, ai, bi))
             out[n - q] = (sub(b, ar, br), add(b, ai, bi))
         return out
-    n1, n2 = SPLITS[n]
+    n1, n2 = SPLITS[n] if n in SPLITS else balanced_split(n)
     inner = [dft(b, [xs[n2 * j1 + j2] for j1 in range(n1)]) for j2 in range(n2)]
     out = [None] * n
     for k1 in range(n1):
