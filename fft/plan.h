@@ -63,8 +63,9 @@ struct FftPlan {
   FftPlan* next;
 };
 
-// Generated radix-indexed kernel tables (fft/kernels/kernel_table.cpp); null
-// entries for radices without a specialised kernel.
+// Generated radix-indexed kernel tables (kernel_table.cpp, written at build
+// time by tools/gen_fft_kernels.py); null entries for radices without a
+// specialised kernel.
 extern const FftComplexLeafFn kFftComplexLeaf[kFftMaxRadix + 1];
 extern const FftComplexTwiddleFn kFftComplexTwiddle[kFftMaxRadix + 1];
 extern const FftRealLeafFn kFftRealLeaf[kFftMaxRadix + 1];

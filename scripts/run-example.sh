@@ -9,7 +9,7 @@
 # Installs what is missing on a fresh Debian 12 machine (run as root).
 set -euo pipefail
 cd "$(dirname "$0")/.."
-scripts/deps.sh cmake make g++ liblapack-dev libblas-dev liblapacke-dev \
+scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
   libgtest-dev libgmock-dev gnuplot-nox
 
 cmake -S . -B build/release -DCMAKE_BUILD_TYPE=Release >/dev/null
