@@ -28,7 +28,8 @@ MAX_RADIX = 43
 # there than the symmetric-pair form, whose count grows as the square. DFTs of
 # real values keep the symmetric form, which halves its work for them.
 RADER_PRIMES = [17, 29, 31, 37, 41, 43]
-# The radices with a wide (four-lane AVX) variant.
+# The radices with a wide (four-lane AVX) variant: radix 2 has too little
+# arithmetic per butterfly to pay for its lane shuffles (measured slower).
 WIDE_RADICES = [r for r in RADICES if r != 2]
 
 # Composite radices as (n1, n2): n2 inner DFTs of size n1 over inputs n2*j1 + j2,
@@ -516,6 +517,14 @@ def radix_file(r):
     ]
     out += core_templates(rr, cores)
     out += ["}  // namespace", ""]
+    has_wide = r in WIDE_RADICES
+
+    def dispatch(cond, assign):
+        """An exported kernel's hand-over of whole four-lane groups to the wide variant."""
+        if not has_wide:
+            return []
+        return ["#if FFTK_WIDE", "  if (%s && fftk::WideLanes()) %s;" % (cond, assign), "#endif"]
+
     wide = []
     wide += [
         "#if FFTK_WIDE",
@@ -596,36 +605,14 @@ def radix_file(r):
         "#endif",
         "",
     ]
-    dispatch_complexleaf = [
-        "#if FFTK_WIDE",
-        "  if (c >= 3 && fftk::WideLanes()) t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c);",
-        "#endif",
-    ]
-    dispatch_complextwiddle = [
-        "#if FFTK_WIDE",
-        "  if (m >= 4 && fftk::WideLanes()) k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m);",
-        "#endif",
-    ]
-    dispatch_realleaf = [
-        "#if FFTK_WIDE",
-        "  if (c >= 3 && fftk::WideLanes()) t = wide::RealLeafGroups(in, out, is, os, c);",
-        "#endif",
-    ]
-    dispatch_realtwiddle = [
-        "#if FFTK_WIDE",
-        "  if (m >= 7 && fftk::WideLanes()) k = wide::RealTwiddleGroups(data, twCos, twSin, os, m);",
-        "#endif",
-    ]
-    # Radix 2 has too little arithmetic per butterfly to pay for the lane
-    # shuffles of the four-lane form (measured slower), so it has none.
-    if r in WIDE_RADICES:
+    if has_wide:
         out += wide
     out += [
         "FFTK_CLONES",
         "void FftComplexLeaf%s(%s) {" % (rr, leaf_args),
         "  const ptrdiff_t ls = c * is;",
         "  ptrdiff_t t = 0;",
-    ] + (dispatch_complexleaf if r in WIDE_RADICES else []) + [
+    ] + dispatch("c >= 3", "t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c)") + [
         "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
         "    const InterleavedAccess p{is, %d * os, 0, 0};" % r,
         "    for (; t + 1 < c; t += 2) " + leaf_call % "p",
@@ -639,12 +626,14 @@ def radix_file(r):
         "FFTK_CLONES",
         "void FftComplexTwiddle%s(%s) {" % (rr, tw_args),
         "  const ptrdiff_t s = m * os;",
-        "  ptrdiff_t k = 0;",
-    ] + (dispatch_complextwiddle if r in WIDE_RADICES else []) + [
-        "  if (k == 0) {",
-        "    Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
-        "    k = 1;",
-        "  }",
+    ] + (["  ptrdiff_t k = 0;"] +
+         dispatch("m >= 4", "k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m)") +
+         ["  if (k == 0) {",
+          "    Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
+          "    k = 1;",
+          "  }"] if has_wide else
+         ["  Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
+          "  ptrdiff_t k = 1;"]) + [
         "  if (im == re + 1) {",
         "    const InterleavedAccess p{os, os, 0, %d};" % tw,
         "    for (; k + 1 < m; k += 2) " + tw_call % "p",
@@ -659,7 +648,7 @@ def radix_file(r):
         "void FftRealLeaf%s(%s) {" % (rr, rleaf_args),
         "  const ptrdiff_t ls = c * is;",
         "  ptrdiff_t t = 0;",
-    ] + (dispatch_realleaf if r in WIDE_RADICES else []) + [
+    ] + dispatch("c >= 3", "t = wide::RealLeafGroups(in, out, is, os, c)") + [
         "  const LaneAccess p{is, %d * os, 0, 0};" % r,
         "  for (; t + 1 < c; t += 2) " + rleaf_call % "p",
         "  for (; t < c; ++t) " + rleaf_call % "ScalarAccess{}",
@@ -670,7 +659,7 @@ def radix_file(r):
         "  const ptrdiff_t s = m * os;",
         "  RealDft%s(ScalarAccess{}, data, s, data, s);" % rr,
         "  ptrdiff_t k = 1;",
-    ] + (dispatch_realtwiddle if r in WIDE_RADICES else []) + [
+    ] + dispatch("m >= 7", "k = wide::RealTwiddleGroups(data, twCos, twSin, os, m)") + [
         "  const LaneAccess p{os, os, -os, %d};" % tw,
         "  for (; 2 * (k + 1) < m; k += 2) " + rtw_call % "p",
         "  for (; 2 * k < m; ++k) " + rtw_call % "ScalarAccess{}",
