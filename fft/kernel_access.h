@@ -1,5 +1,5 @@
 // Memory access policies of the generated kernels. A kernel body is written
-// once over a value type T and is instantiated three ways:
+// once over a value type T and is instantiated once per policy:
 //   ScalarAccess:      one transform (or butterfly) per call, T = double;
 //   LaneAccess:        two transforms at once in the two lanes of a 16-byte
 //                      vector, lane 1 a fixed number of doubles after lane 0;
@@ -7,8 +7,10 @@
 //                      loading each (re, im) pair with one 16-byte access;
 //   Lane4Access, Interleaved4Access: the same with four lanes (wide variant).
 // Lane offsets: li for loads, lo for stores, lb for the mirrored side of a
-// real combining group (loads and stores), lw for twiddle loads. The vector
-// type is GCC's generic one, so the code stays portable (SSE2 on x86-64).
+// real combining group (loads and stores), lw for twiddle loads. Tw0(x, v)
+// gives the twiddled leg v, except in the lane of a butterfly 0, which keeps
+// its untwiddled x. The vector types are GCC's generic ones, so the code stays
+// portable (SSE2 on x86-64).
 #pragma once
 
 #include <cstddef>
