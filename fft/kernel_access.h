@@ -113,6 +113,14 @@ struct InterleavedAccess {
   }
 };
 
+#if FFTK_WIDE
+// The four-lane policies pass 32-byte vectors by value, so they are compiled
+// for AVX like the wide kernels that use them: a call that is not inlined
+// (unoptimised or sanitizer builds) then follows the same calling convention
+// on both sides.
+#pragma GCC push_options
+#pragma GCC target("avx")
+
 // Four-lane forms for the wide variant; lane q is q offsets after lane 0.
 struct Lane4Access {
   using T = V4;
@@ -192,5 +200,8 @@ struct Interleaved4FirstAccess : Interleaved4Access {
   T LdW(const double* p) const { return T{p[0], p[lw], p[0], p[2 * lw]}; }
   static T Tw0(T x, T v) { return __builtin_shuffle(x, v, V4i{0, 5, 6, 7}); }
 };
+
+#pragma GCC pop_options
+#endif  // FFTK_WIDE
 
 }  // namespace fftk
