@@ -441,36 +441,21 @@ def banner(what):
 def core_templates(rr, cores):
     """The five per-radix DFT bodies as templates over the access policy;
     out of line from radix 8 up (see FFTK_BODY), left to the compiler below."""
-    c_lines, t_lines, r_lines, g_lines, h_lines = cores
     attr = "FFTK_BODY" if int(rr) >= 8 else "inline"
-    out = ["template <class P>",
-           "%s void Dft%s(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr," % (attr, rr),
-           "         double* yi, ptrdiff_t os) {",
-           "  using T = typename P::T;"]
-    out += c_lines
-    out += ["}", "",
-            "template <class P>",
-            "%s void DftTw%s(const P& p, double* re, double* im, ptrdiff_t s, const double* wc," % (attr, rr),
-            "           const double* ws) {",
-            "  using T = typename P::T;"]
-    out += t_lines
-    out += ["}", "",
-            "template <class P>",
-            "%s void RealDft%s(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os) {" % (attr, rr),
-            "  using T = typename P::T;"]
-    out += r_lines
-    out += ["}", "",
-            "template <class P>",
-            "%s void RealTw%s(const P& p, double* a, double* b, ptrdiff_t s, const double* wc," % (attr, rr),
-            "            const double* ws) {",
-            "  using T = typename P::T;"]
-    out += g_lines
-    out += ["}", "",
-            "template <class P>",
-            "%s void RealHalf%s(const P& p, double* x, ptrdiff_t s) {" % (attr, rr),
-            "  using T = typename P::T;"]
-    out += h_lines
-    out += ["}", ""]
+    signatures = [
+        "Dft%s(const P& p, const double* xr, const double* xi, ptrdiff_t is, double* yr, double* yi, ptrdiff_t os)",
+        "DftTw%s(const P& p, double* re, double* im, ptrdiff_t s, const double* wc, const double* ws)",
+        "RealDft%s(const P& p, const double* x, ptrdiff_t is, double* y, ptrdiff_t os)",
+        "RealTw%s(const P& p, double* a, double* b, ptrdiff_t s, const double* wc, const double* ws)",
+        "RealHalf%s(const P& p, double* x, ptrdiff_t s)",
+    ]
+    out = []
+    for signature, lines in zip(signatures, cores):
+        out += ["template <class P>",
+                "%s void %s {" % (attr, signature % rr),
+                "  using T = typename P::T;"]
+        out += lines
+        out += ["}", ""]
     return out
 
 
