@@ -1,12 +1,12 @@
 // Time-series model estimators, each in a real and a complex form. Inputs are
 // aligned element arrays (the entry points copy host data into aligned work
-// memory); every routine returns a StatusCode (numeric/types.h). Count outputs
+// memory); every routine returns a StatusCode (core/types.h). Count outputs
 // (int32_t* count) receive the number of reported modes.
 #pragma once
 
 #include <cstdint>
 
-#include "numeric/types.h"
+#include "core/types.h"
 
 // ---- linear-prediction building blocks -------------------------------------------
 // Forward block, q = n - p rows: A[i][j] = x[i+p-1-j], b[i] = x[i+p].

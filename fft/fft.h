@@ -4,7 +4,7 @@
 
 #include <cstdint>
 
-#include "numeric/types.h"
+#include "core/types.h"
 
 struct FftPlan;  // fft/plan.h
 

@@ -7,7 +7,7 @@
 #include <cmath>
 
 #include "fft/plan.h"
-#include "host/platform.h"
+#include "core/platform.h"
 #include "numeric/work.h"
 
 namespace {

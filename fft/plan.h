@@ -11,7 +11,7 @@
 #include <cstdint>
 
 #include "fft/fft.h"
-#include "numeric/types.h"
+#include "core/types.h"
 
 constexpr int kFftMaxFactors = 20;
 constexpr int kFftMaxRadix = 43;  // kernel tables are indexed 0..kFftMaxRadix

@@ -9,7 +9,7 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "host/platform.h"
+#include "core/platform.h"
 #include "qdm.h"
 
 namespace host {

@@ -28,7 +28,7 @@
 #include <span>
 
 #include "estimation/estimation.h"
-#include "numeric/types.h"
+#include "core/types.h"
 #include "qdm.h"
 
 namespace host {

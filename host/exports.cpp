@@ -5,7 +5,7 @@
 
 #include "estimation/estimation.h"
 #include "host/entry_frame.h"
-#include "numeric/types.h"
+#include "core/types.h"
 #include "qdm.h"
 
 using host::ArgCheck;

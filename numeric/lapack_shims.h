@@ -7,7 +7,7 @@
 #include <cstdint>
 
 #include "numeric/lapack_api.h"
-#include "numeric/types.h"
+#include "core/types.h"
 
 namespace lapack {
 

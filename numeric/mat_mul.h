@@ -5,7 +5,7 @@
 
 #include <cstdint>
 
-#include "numeric/types.h"
+#include "core/types.h"
 
 template <typename T>
 [[nodiscard]] StatusCode MatMul(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C,

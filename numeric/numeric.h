@@ -1,14 +1,14 @@
 // Numeric support: dense linear algebra over LAPACK/CBLAS, the polynomial root
 // finder, sorting and scalar helpers. Matrices are dense and row-major (element
 // (i, j) of an m-by-n matrix at i*n + j); complex values are Complex (two
-// doubles, real part first). Every routine returns a StatusCode (numeric/types.h).
+// doubles, real part first). Every routine returns a StatusCode (core/types.h).
 // Pointers are assumed aligned for their element type: host memory never
 // reaches this layer directly.
 #pragma once
 
 #include <cstdint>
 
-#include "numeric/types.h"
+#include "core/types.h"
 
 // ---- products and vector helpers ---------------------------------------------
 // C (m-by-n) = A (m-by-k) * B (k-by-n). C must not overlap A or B.

@@ -9,7 +9,7 @@
 #include <cstring>
 #include <memory>
 
-#include "numeric/types.h"
+#include "core/types.h"
 
 // Allocates `bytes` uninitialised bytes into *slot (null on failure).
 [[nodiscard]] StatusCode NumAlloc(void** slot, size_t bytes);

@@ -6,7 +6,7 @@
 
 #include <cstdint>
 
-#include "numeric/types.h"
+#include "core/types.h"
 #include "numeric/work.h"
 
 namespace qdm_test {

@@ -21,6 +21,11 @@
 
 using qdm_test::Cx;
 
+// Netlib's cblas.h names its integer CBLAS_INT, OpenBLAS's blasint.
+#ifndef CBLAS_INT
+#define CBLAS_INT blasint
+#endif
+
 namespace {
 int g_dgemm_calls = 0;
 int g_zgemm_calls = 0;

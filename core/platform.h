@@ -3,7 +3,7 @@
 // guards the FFT plan list. platform.cpp has a Windows and a POSIX branch.
 #pragma once
 
-#include "numeric/types.h"
+#include "core/types.h"
 
 namespace platform {
 
