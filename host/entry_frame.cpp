@@ -21,13 +21,6 @@ void* BlockElements(QdmArrayHandle handle) {
   return reinterpret_cast<unsigned char*>(*handle) + sizeof(int32_t);
 }
 
-StatusCode FirstFailedCheck(std::span<const ArgCheck> checks) {
-  for (const ArgCheck& check : checks) {
-    if (check.fails) return check.code;
-  }
-  return status::kOk;
-}
-
 namespace {
 
 size_t ElementBytes(int32_t typeCode) { return DoublesPerElement(typeCode) * sizeof(double); }
@@ -94,7 +87,7 @@ int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
   QdmArrayHandle handles[kMaxOutputs] = {};
   for (size_t i = 0; i < entry.outputs.size(); ++i) handles[i] = entry.outputs[i].handle;
 
-  StatusCode s = FirstFailedCheck(entry.checks);
+  StatusCode s = entry.check;
   for (size_t i = 0; s == status::kOk && i < entry.outputs.size(); ++i) {
     const OutputArray& out = entry.outputs[i];
     s = NumericArrayResize(out.typeCode, 1, &handles[i], static_cast<size_t>(out.length));
@@ -125,11 +118,9 @@ int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
 }
 
 int32_t RunMdlEntry(QdmArrayHandle data, int32_t inputType, int32_t n,
-                    std::span<const MdlCheck> checks, int32_t L, int32_t minOrder,
+                    StatusCode check, int32_t L, int32_t minOrder,
                     int32_t* order, MdlEstimator estimate) {
-  for (const MdlCheck& check : checks) {
-    if (check.fails) return check.hostCode;
-  }
+  if (check != status::kOk) return MapStatus(check);
   const size_t count = static_cast<size_t>(n);
   WorkArray<double> input = AllocWork<double>(count * DoublesPerElement(inputType));
   StatusCode s = status::kNoMemory;

@@ -2,7 +2,8 @@
 // contributes only tables (its argument checks, its outputs in resize order,
 // its out doubles) and the call of its estimator; RunEntry does the rest:
 //
-//   1. the checks, in table order; the first that fails is the status;
+//   1. the argument checks (estimation/entry_checks.h, shared with the plain
+//      face); the first that fails is the status;
 //   2. the resizes, in table order, through the host's NumericArrayResize;
 //   3. the counts the entry point knows;
 //   4. the estimator, on aligned copies (below);
@@ -51,14 +52,6 @@ constexpr size_t DoublesPerElement(int32_t typeCode) {
 
 // ---- tables an entry point supplies -------------------------------------------------
 
-// One argument check: `fails` is the test's outcome, `code` the status it sets.
-struct ArgCheck {
-  bool fails;
-  StatusCode code;
-};
-// Code of the first failing check in table order, 0 if all pass.
-StatusCode FirstFailedCheck(std::span<const ArgCheck> checks);
-
 // Who writes an output's count: the entry point (its length, before the
 // estimator runs) or the estimator (the number of modes it reports, written to
 // every such output after a successful call).
@@ -95,7 +88,7 @@ struct EntrySpec {
   QdmArrayHandle input;
   int32_t inputType;
   int32_t n;  // the input block's count
-  std::span<const ArgCheck> checks;
+  StatusCode check;  // the first failed argument check, 0 if all pass
   std::span<const OutputArray> outputs;  // in resize order, at most kMaxOutputs
   std::span<const OutDouble> outDoubles;  // at most kMaxOutDoubles
   ResizeFailure onResizeFailure = ResizeFailure::kEmptyOutputs;
@@ -138,17 +131,13 @@ int32_t RunEntry(const EntrySpec& entry, const Estimator& estimator) {
 }
 
 // ---- the MDL pair ------------------------------------------------------------------
-// Its checks return host codes directly and leave the result untouched; the
-// estimator gets the aligned input and an aligned order; a failed estimator
-// sets the result to 0.
-struct MdlCheck {
-  bool fails;
-  int32_t hostCode;
-};
+// A failed check returns its host code (-42401, -42414, -42415) and leaves the
+// result untouched; the estimator gets the aligned input and an aligned order;
+// a failed estimator sets the result to 0.
 using MdlEstimator = StatusCode (*)(const void* x, int32_t n, int32_t L, int32_t minOrder,
                                     int32_t* order);
 int32_t RunMdlEntry(QdmArrayHandle data, int32_t inputType, int32_t n,
-                    std::span<const MdlCheck> checks, int32_t L, int32_t minOrder,
+                    StatusCode check, int32_t L, int32_t minOrder,
                     int32_t* order, MdlEstimator estimate);
 
 }  // namespace host

@@ -3,12 +3,12 @@
 // sequence itself lives in entry_frame.cpp.
 #include <cstdint>
 
+#include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
 #include "host/entry_frame.h"
 #include "core/types.h"
 #include "qdm.h"
 
-using host::ArgCheck;
 using host::CountSource;
 using host::EntryCall;
 using host::EntrySpec;
@@ -22,9 +22,9 @@ namespace {
 constexpr int32_t kReal = QDM_TYPE_DOUBLE;
 constexpr int32_t kCx = QDM_TYPE_COMPLEX;
 
-// The sampling-rate test is the ordered comparison 0 >= rate, so a NaN rate
-// passes it and reaches the estimator.
-bool BadRate(double rate) { return 0.0 >= rate; }
+// Output lengths are computed only from arguments that passed their checks;
+// after a failed check nothing is resized, so the length does not matter.
+int32_t LengthIf(StatusCode check, int32_t length) { return check == status::kOk ? length : 0; }
 
 // Flags arrive as a pointer to one host byte; its value goes on zero-extended.
 int32_t FlagValue(const uint8_t* flag) { return static_cast<int32_t>(*flag); }
@@ -37,15 +37,12 @@ int32_t PronyEntry(QdmArrayHandle data, int32_t type, int32_t p, double rate,
                    QdmArrayHandle freq, ResizeFailure onResizeFailure,
                    const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
-  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
-                             {p <= 0, status::kBadCount},
-                             {p > MaxOrder(n), status::kBadCount},
-                             {BadRate(rate), status::kBadSampleRate}};
+  const StatusCode check = checks::Prony(n, p, rate);
   const OutputArray outputs[] = {{amp, kReal, p, CountSource::kModes},
                                  {phase, kReal, p, CountSource::kModes},
                                  {damp, kReal, p, CountSource::kModes},
                                  {freq, kReal, p, CountSource::kModes}};
-  return host::RunEntry(EntrySpec{data, type, n, checks, outputs, {}, onResizeFailure}, estimate);
+  return host::RunEntry(EntrySpec{data, type, n, check, outputs, {}, onResizeFailure}, estimate);
 }
 
 // ---- covariance AR and principal-component AR ----------------------------------------------
@@ -53,14 +50,13 @@ int32_t PronyEntry(QdmArrayHandle data, int32_t type, int32_t p, double rate,
 // coefficients.
 
 template <typename Estimate>
-int32_t ArEntry(QdmArrayHandle data, int32_t type, std::span<const ArgCheck> checks, int32_t p,
+int32_t ArEntry(QdmArrayHandle data, int32_t type, int32_t n, StatusCode check, int32_t p,
                 QdmArrayHandle coefficients, QdmArrayHandle second,
                 std::span<const OutDouble> outDoubles, const Estimate& estimate) {
-  const OutputArray outputs[] = {{second, kCx, p, CountSource::kLength},
-                                 {coefficients, type, p + 1, CountSource::kLength}};
-  return host::RunEntry(EntrySpec{data, type, host::BlockCount(data), checks, outputs,
-                                  outDoubles},
-                        estimate);
+  const OutputArray outputs[] = {{second, kCx, LengthIf(check, p), CountSource::kLength},
+                                 {coefficients, type, LengthIf(check, p + 1),
+                                  CountSource::kLength}};
+  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles}, estimate);
 }
 
 template <typename Estimate>
@@ -68,23 +64,17 @@ int32_t CovarianceEntry(QdmArrayHandle data, int32_t type, int32_t p,
                         QdmArrayHandle coefficients, QdmArrayHandle poles, double* variance,
                         const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
-  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
-                             {p <= 0, status::kBadCount},
-                             {p > MaxOrder(n), status::kBadCount}};
   const OutDouble outDoubles[] = {{variance, OutDoubleRole::kEstimator}};
-  return ArEntry(data, type, checks, p, coefficients, poles, outDoubles, estimate);
+  return ArEntry(data, type, n, checks::Covariance(n, p), p, coefficients, poles, outDoubles,
+                 estimate);
 }
 
 template <typename Estimate>
 int32_t PcarEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t components,
                   QdmArrayHandle coefficients, QdmArrayHandle roots, const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
-  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
-                             {p < 0, status::kBadOrder},
-                             {p > MaxOrder(n), status::kBadOrder},
-                             {components <= 0, status::kBadCount},
-                             {components > p, status::kCountAboveOrder}};
-  return ArEntry(data, type, checks, p, coefficients, roots, {}, estimate);
+  return ArEntry(data, type, n, checks::Pcar(n, p, components), p, coefficients, roots, {},
+                 estimate);
 }
 
 // ---- matrix pencil --------------------------------------------------------------------------
@@ -94,18 +84,13 @@ int32_t PencilEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t M, dou
                     QdmArrayHandle amp, QdmArrayHandle phase, QdmArrayHandle damp,
                     QdmArrayHandle freq, double* mse, const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
-  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
-                             {L < 0, status::kBadOrder},
-                             {L > MaxOrder(n), status::kBadOrder},
-                             {M <= 0, status::kBadCount},
-                             {M > L, status::kCountAboveOrder},
-                             {BadRate(rate), status::kBadSampleRate}};
+  const StatusCode check = checks::Pencil(n, L, M, rate);
   const OutputArray outputs[] = {{amp, kReal, M, CountSource::kModes},
                                  {phase, kReal, M, CountSource::kModes},
                                  {damp, kReal, M, CountSource::kModes},
                                  {freq, kReal, M, CountSource::kModes}};
   const OutDouble outDoubles[] = {{mse, OutDoubleRole::kEstimator}};
-  return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles}, estimate);
+  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles}, estimate);
 }
 
 // ---- MDL --------------------------------------------------------------------------------
@@ -113,33 +98,26 @@ int32_t PencilEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t M, dou
 int32_t MdlEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t minOrder,
                  int32_t* order, host::MdlEstimator estimate) {
   const int32_t n = host::BlockCount(data);
-  const host::MdlCheck checks[] = {{n < 1, -42401},
-                                   {minOrder < 1, -42414},
-                                   {L <= minOrder, -42415},
-                                   {L > MaxOrder(n), -42415}};
-  return host::RunMdlEntry(data, type, n, checks, L, minOrder, order, estimate);
+  return host::RunMdlEntry(data, type, n, checks::Mdl(n, L, minOrder), L, minOrder, order,
+                           estimate);
 }
 
 // ---- spectra ----------------------------------------------------------------------------
-// The spectrum has N = SpectrumLength(m) points. An m beyond 2^30 has no
-// 32-bit power of two above it and is reported like a spectrum size below 2.
+// The spectrum has N = SpectrumLength(m) points, computed once m has passed
+// its check.
 
 template <typename Estimate>
 int32_t CovSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t m, double rate,
                          double* f0, double* df, QdmArrayHandle spectrum, double* variance,
                          const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
-  const int32_t N = SpectrumLength(m);
-  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
-                             {p < 0, status::kBadCount},
-                             {p > MaxOrder(n), status::kBadCount},
-                             {m <= 1 || N == 0, status::kBadSpectrumSize},
-                             {BadRate(rate), status::kBadSampleRate}};
+  const StatusCode check = checks::CovSpectrum(n, p, m, rate);
+  const int32_t N = LengthIf(check, SpectrumLength(m));
   const OutputArray outputs[] = {{spectrum, kReal, N, CountSource::kLength}};
   const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
                                   {df, OutDoubleRole::kSpectrumDf},
                                   {variance, OutDoubleRole::kEstimator}};
-  return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles},
+  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles},
                         [&](EntryCall& c) {
                           c.spectrum.values = c.RealOutput(0);
                           return estimate(c, N);
@@ -153,14 +131,8 @@ int32_t PcarSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t 
                           double* fitError, ResizeFailure onResizeFailure,
                           const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
-  const int32_t N = SpectrumLength(m);
-  const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
-                             {p < 0, status::kBadOrder},
-                             {p > MaxOrder(n), status::kBadOrder},
-                             {k <= 0, status::kBadCount},
-                             {k > p, status::kCountAboveOrder},
-                             {m <= 1 || N == 0, status::kBadSpectrumSize},
-                             {BadRate(rate), status::kBadSampleRate}};
+  const StatusCode check = checks::PcarSpectrum(n, p, k, m, rate);
+  const int32_t N = LengthIf(check, SpectrumLength(m));
   const OutputArray outputs[] = {{amp, kReal, k, CountSource::kModes},
                                  {phase, kReal, k, CountSource::kModes},
                                  {freq, kReal, k, CountSource::kModes},
@@ -168,7 +140,7 @@ int32_t PcarSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t 
   const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
                                   {df, OutDoubleRole::kSpectrumDf},
                                   {fitError, OutDoubleRole::kPassThrough}};
-  return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles, onResizeFailure},
+  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles, onResizeFailure},
                         [&](EntryCall& c) {
                           c.spectrum.values = c.RealOutput(3);
                           return estimate(c, N);

@@ -14,7 +14,6 @@
 
 namespace {
 
-using host::ArgCheck;
 using host::CountSource;
 using host::EntryCall;
 using host::EntrySpec;
@@ -41,7 +40,7 @@ struct Fixture {
   QdmArrayHandle known = MakeReal({9, 9, 9, 9, 9});
   QdmArrayHandle modes = EmuMakeHandle(QDM_TYPE_COMPLEX, 1, nullptr);
   double estimated = 7.0, f0 = 7.0, passed = 7.0;
-  std::vector<ArgCheck> checks{{false, 1}, {false, 12}};
+  StatusCode check = status::kOk;
   ResizeFailure onResizeFailure = ResizeFailure::kEmptyOutputs;
 
   ~Fixture() {
@@ -58,7 +57,7 @@ struct Fixture {
                                  {&f0, OutDoubleRole::kSpectrumF0},
                                  {&passed, OutDoubleRole::kPassThrough}};
     return host::RunEntry(
-        EntrySpec{input, QDM_TYPE_DOUBLE, 3, checks, outputs, doubles, onResizeFailure},
+        EntrySpec{input, QDM_TYPE_DOUBLE, 3, check, outputs, doubles, onResizeFailure},
         estimate);
   }
 };
@@ -129,9 +128,9 @@ TEST(EntryFrame, EstimatorFailureEmptiesOutputsAndMapsTheStatus) {
   }
 }
 
-TEST(EntryFrame, FirstFailedCheckWinsAndTheEstimatorIsNotCalled) {
+TEST(EntryFrame, AFailedCheckIsMappedAndTheEstimatorIsNotCalled) {
   Fixture f;
-  f.checks = {{false, 1}, {true, 12}, {true, 13}};
+  f.check = 12;
   bool called = false;
   const int64_t mark = EmuResizeCalls();
   EXPECT_EQ(f.Run([&](EntryCall&) {
@@ -209,8 +208,8 @@ TEST(EntryFrame, ExhaustedWorkMemoryIsReportedAndNothingLeaks) {
 
 TEST(EntryFrame, MdlRunnerReturnsHostCodesAndZeroesTheOrderOnlyOnEstimatorFailure) {
   QdmArrayHandle x = MakeReal({1, 2, 3});
-  const host::MdlCheck failing[] = {{false, -42401}, {true, -42414}, {true, -42415}};
-  const host::MdlCheck passing[] = {{false, -42401}};
+  const StatusCode failing = 14;
+  const StatusCode passing = status::kOk;
   int32_t order = 77;
   auto fails = [](const void*, int32_t, int32_t, int32_t, int32_t* o) -> StatusCode {
     *o = 5;

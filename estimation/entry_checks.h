@@ -1,0 +1,24 @@
+// The argument checks of the fourteen fits, shared by every face of the
+// library: the host exports and the plain C API run exactly these, in this
+// order, before they size anything. Each returns the code of the first check
+// that fails (the estimators' argument codes of core/types.h), or 0. No size
+// is computed from an argument before it has passed its check.
+#pragma once
+
+#include <cstdint>
+
+#include "core/types.h"
+
+namespace checks {
+
+StatusCode Prony(int32_t n, int32_t p, double rate);
+StatusCode Covariance(int32_t n, int32_t p);
+StatusCode Pcar(int32_t n, int32_t p, int32_t components);
+StatusCode Pencil(int32_t n, int32_t L, int32_t M, double rate);
+// The MDL codes 1, 14 and 15 reach the host as -42401, -42414 and -42415.
+StatusCode Mdl(int32_t n, int32_t L, int32_t minOrder);
+// m above 2^30 has no 32-bit power of two above it and fails like m < 2.
+StatusCode CovSpectrum(int32_t n, int32_t p, int32_t m, double rate);
+StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate);
+
+}  // namespace checks

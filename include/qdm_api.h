@@ -1,0 +1,297 @@
+/** @file qdm_api.h
+ * @brief qdm's plain C API: every fit over ordinary arrays.
+ *
+ * Link with `-lqdm_api` (pkg-config `qdm`, CMake `qdm::qdm_api`). The host face,
+ * include/qdm.h and libqdm, serves the Graffel host and its array handles; this
+ * face serves everyone else. Both run the same estimators, argument checks and
+ * status codes, and give the same numbers.
+ *
+ * @par Conventions
+ * - Inputs are pointers and lengths; outputs are arrays the caller allocates,
+ *   with the sizes each function states. Outputs must not overlap the input.
+ * - Real samples are `double`. Complex values are ::qdm_complex, two doubles
+ *   with the real part first: the storage of C99 `double complex` and C++
+ *   `std::complex<double>`, which may be passed by casting the pointer.
+ * - Arrays need only the natural alignment of `double`.
+ * - Every fit returns a status from qdm_status.h: ::QDM_OK, the warning
+ *   ::QDM_WARN_RANK_DEFICIENT (results complete and valid), or a negative error.
+ *   qdm_status_text() gives its meaning. On an error every output array is
+ *   zero-filled, every mode count is 0 and every out double is 0.0.
+ * - Functions are safe to call from any number of threads at once. The only
+ *   state shared between calls is the list of FFT plans, under one lock.
+ *
+ * @par What this face adds to the host face's checks
+ * Each fit first makes the host face's argument checks, in the same order and
+ * with the same codes. Then, in this order:
+ * 1. a null pointer where the function needs one: ::QDM_ERR_NULL_POINTER;
+ * 2. a fit whose work memory would exceed #QDM_MAX_WORK_BYTES:
+ *    ::QDM_ERR_WORK_LIMIT (the bound keeps a request for a huge spectrum or
+ *    pencil from exhausting the machine);
+ * 3. a NaN or infinite sample or sampling rate: ::QDM_ERR_NON_FINITE.
+ *
+ * The host face deliberately goes on when a least-squares solve inside a fit
+ * fails (covariance AR, Prony, the amplitude fits) and reports success with
+ * whatever the solve left. This face never does: if any allocation, LAPACK call
+ * or least-squares solve fails during the call, the call returns that failure.
+ * A rank-deficient solve, which the host face does not report, comes back here
+ * as ::QDM_WARN_RANK_DEFICIENT with the complete minimum-norm results.
+ *
+ * @par Models and output conventions
+ * - AR coefficients: a[0..p], a[0] = 1, for the model
+ *   x[t] + a[1] x[t-1] + ... + a[p] x[t-p] = e[t].
+ * - Poles or roots: the p zeros of z^p + a[1] z^(p-1) + ... + a[p], complex for
+ *   real data too, in the order the root finder finds them: zero roots first,
+ *   then as found (not sorted, not paired).
+ * - Modes: four arrays, amplitude |A_i|, phase arg(A_i) in radians in
+ *   (-pi, pi], damping ln|z_i| per sample (negative for a decaying mode), and
+ *   frequency arg(z_i) fs / (2 pi) in Hz, for the model x[t] = sum A_i z_i^t.
+ *   With `real_signal` non-zero only poles with arg(z) in [0, pi) are reported
+ *   (one per conjugate pair, amplitude not doubled); otherwise every pole is.
+ * - Spectra: qdm_spectrum_length(points) values in dB, peak exactly 0 dB,
+ *   value j at frequency f0 + j df with f0 = -fs/2 and df = fs / length.
+ */
+#ifndef QDM_API_H
+#define QDM_API_H
+
+#include <stdint.h>
+
+#include "qdm_status.h"
+
+#if defined(_WIN32)
+#  if defined(QDM_BUILDING_API)
+#    define QDM_PLAIN_API __declspec(dllexport)
+#  else
+#    define QDM_PLAIN_API __declspec(dllimport)
+#  endif
+#else
+#  define QDM_PLAIN_API __attribute__((visibility("default")))
+#endif
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/** Library version. */
+#define QDM_VERSION_MAJOR 1
+#define QDM_VERSION_MINOR 0
+#define QDM_VERSION_PATCH 0
+
+/** Bound on the work memory of one fit, in bytes (8 GiB). A fit whose work
+ *  memory, as estimated from its sizes before any allocation, would exceed it
+ *  returns ::QDM_ERR_WORK_LIMIT. */
+#define QDM_MAX_WORK_BYTES (INT64_C(8) << 30)
+
+/** A complex value: real part, imaginary part. */
+typedef double qdm_complex[2];
+
+/** The library's version as "major.minor.patch". */
+QDM_PLAIN_API const char* qdm_version(void);
+
+/** The meaning of a status code, as a static string. Every code of qdm_status.h
+ *  has its text; a host resize error (-42400 - e) and unknown codes get a
+ *  general text. Never null. */
+QDM_PLAIN_API const char* qdm_status_text(int32_t status);
+
+/** Number of spectrum values for `points` requested points: the smallest power
+ *  of two not below `points`; 0 when points < 2 or points > 2^30 (the spectra
+ *  then return ::QDM_ERR_SPECTRUM_SIZE). */
+QDM_PLAIN_API int32_t qdm_spectrum_length(int32_t points);
+
+/* ---------------------------------------------------------------------------- */
+/** @name Covariance-method AR
+ * Forward linear prediction over the n - p samples that have p predecessors,
+ * solved in the least-squares sense (no windowing).
+ * @param x             n samples
+ * @param n             number of samples, >= 1
+ * @param order         model order p, 1 <= p <= floor(2n/3)
+ * @param coefficients  out: p + 1 AR coefficients, a[0] = 1
+ * @param poles         out: p complex poles
+ * @param noise_variance out: mean squared prediction error over the n - p equations
+ * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
+ *   ::QDM_ERR_COUNT (order out of range), ::QDM_ERR_NULL_POINTER,
+ *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY,
+ *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL,
+ *   ::QDM_ERR_ROOT_NAN.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_covariance_real(const double* x, int32_t n, int32_t order,
+                                          double* coefficients, qdm_complex* poles,
+                                          double* noise_variance);
+QDM_PLAIN_API int32_t qdm_covariance_complex(const qdm_complex* x, int32_t n, int32_t order,
+                                             qdm_complex* coefficients, qdm_complex* poles,
+                                             double* noise_variance);
+/** @} */
+
+/* ---------------------------------------------------------------------------- */
+/** @name Principal-component AR
+ * Forward-backward linear prediction (the backward equations conjugated for
+ * complex data), solved through the pseudo-inverse truncated to the
+ * `components` strongest singular components of the 2(n - p)-by-p data matrix.
+ * @param x             n samples
+ * @param n             number of samples, >= 1
+ * @param order         model order p, 0 <= p <= floor(2n/3)
+ * @param components    singular components kept k, 1 <= k <= p
+ * @param coefficients  out: p + 1 AR coefficients, a[0] = 1
+ * @param roots         out: p complex roots of the AR polynomial
+ * @return ::QDM_OK; ::QDM_ERR_EMPTY_INPUT, ::QDM_ERR_ORDER (order out of
+ *   range), ::QDM_ERR_COUNT (components < 1), ::QDM_ERR_COUNT_ABOVE_ORDER
+ *   (components > order), ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT,
+ *   ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE,
+ *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL, ::QDM_ERR_ROOT_NAN.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order,
+                                    int32_t components, double* coefficients,
+                                    qdm_complex* roots);
+QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t order,
+                                       int32_t components, qdm_complex* coefficients,
+                                       qdm_complex* roots);
+/** @} */
+
+/* ---------------------------------------------------------------------------- */
+/** @name Prony method
+ * p damped exponentials: poles from a covariance-method AR model of order p,
+ * amplitudes by a least-squares fit of the poles to the data. Modes are
+ * reported in the order of the poles.
+ * @param x             n samples
+ * @param n             number of samples, >= 1
+ * @param order         number of exponentials p, 1 <= p <= floor(2n/3)
+ * @param fs            sampling rate in Hz, > 0
+ * @param real_signal   (real data only) non-zero: one mode per conjugate pair
+ * @param amplitude,phase,damping,frequency  out: room for p values each
+ * @param modes         out: number of modes reported (p, or fewer with real_signal)
+ * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
+ *   ::QDM_ERR_COUNT, ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_NULL_POINTER,
+ *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY,
+ *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL,
+ *   ::QDM_ERR_ROOT_NAN.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_prony_real(const double* x, int32_t n, int32_t order, double fs,
+                                     int32_t real_signal, double* amplitude, double* phase,
+                                     double* damping, double* frequency, int32_t* modes);
+QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t order,
+                                        double fs, double* amplitude, double* phase,
+                                        double* damping, double* frequency, int32_t* modes);
+/** @} */
+
+/* ---------------------------------------------------------------------------- */
+/** @name Matrix pencil method
+ * Poles of M damped exponentials from the (n - L)-by-L data matrix and its
+ * one-sample shift, reduced to the M strongest singular components; amplitudes
+ * by least squares. When M exceeds min(n - L, L) the order drops to that value.
+ * @param x             n samples
+ * @param n             number of samples, >= 1
+ * @param pencil        pencil parameter L, 0 <= L <= floor(2n/3) (n/3 is a common choice)
+ * @param order         number of exponentials M, 1 <= M <= L
+ * @param fs            sampling rate in Hz, > 0
+ * @param real_signal   (real data only) non-zero: one mode per conjugate pair
+ * @param amplitude,phase,damping,frequency  out: room for M values each
+ * @param modes         out: number of modes reported
+ * @param mse           out: mean squared fitting error of the modes
+ * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
+ *   ::QDM_ERR_ORDER (L out of range), ::QDM_ERR_COUNT (M < 1),
+ *   ::QDM_ERR_COUNT_ABOVE_ORDER (M > L), ::QDM_ERR_SAMPLE_RATE,
+ *   ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE,
+ *   ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE (a degenerate record),
+ *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_ILLEGAL_ARGUMENT.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_matrix_pencil_real(const double* x, int32_t n, int32_t pencil,
+                                             int32_t order, double fs, int32_t real_signal,
+                                             double* amplitude, double* phase, double* damping,
+                                             double* frequency, int32_t* modes, double* mse);
+QDM_PLAIN_API int32_t qdm_matrix_pencil_complex(const qdm_complex* x, int32_t n, int32_t pencil,
+                                                int32_t order, double fs, double* amplitude,
+                                                double* phase, double* damping,
+                                                double* frequency, int32_t* modes, double* mse);
+/** @} */
+
+/* ---------------------------------------------------------------------------- */
+/** @name Minimum description length order
+ * Scores each order m from `min_order` to r = min(n - L', L') (L' = L - 1 when
+ * L = n/2, else L) by n ln(E) + 10 m ln(n), E the matrix-pencil fitting error,
+ * and keeps the lowest; a fit with E < 2.2e-16 ends the search at once.
+ * @param x             n samples
+ * @param n             number of samples, >= 1
+ * @param max_order     upper order L, min_order < L <= floor(2n/3)
+ * @param min_order     smallest order tried, >= 1
+ * @param order         in/out: the chosen order. Left as the caller set it when
+ *                      no order scores below 10000 (initialise it, e.g. to 0).
+ * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
+ *   ::QDM_ERR_MIN_ORDER, ::QDM_ERR_MDL_UPPER, ::QDM_ERR_NULL_POINTER,
+ *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY,
+ *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE,
+ *   ::QDM_ERR_ILLEGAL_ARGUMENT. On an error *order is 0.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_mdl_order_real(const double* x, int32_t n, int32_t max_order,
+                                         int32_t min_order, int32_t* order);
+QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int32_t max_order,
+                                            int32_t min_order, int32_t* order);
+/** @} */
+
+/* ---------------------------------------------------------------------------- */
+/** @name Covariance AR power spectrum
+ * 1/|A(f)|^2 of the covariance-method AR model, in dB with its peak at 0 dB
+ * (the noise variance does not enter the values).
+ * @param x             n samples
+ * @param n             number of samples, >= 1
+ * @param order         model order p, 0 <= p <= floor(2n/3) (0 gives a flat spectrum)
+ * @param points        requested points, 2 <= points <= 2^30
+ * @param fs            sampling rate in Hz, > 0
+ * @param spectrum      out: qdm_spectrum_length(points) values in dB
+ * @param f0            out: frequency of spectrum[0], -fs/2
+ * @param df            out: frequency step, fs / qdm_spectrum_length(points)
+ * @param noise_variance out: the AR model's prediction-error variance
+ * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
+ *   ::QDM_ERR_COUNT (order out of range), ::QDM_ERR_SPECTRUM_SIZE,
+ *   ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT,
+ *   ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE,
+ *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL, ::QDM_ERR_ROOT_NAN.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_covariance_psd_real(const double* x, int32_t n, int32_t order,
+                                              int32_t points, double fs, double* spectrum,
+                                              double* f0, double* df, double* noise_variance);
+QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n,
+                                                 int32_t order, int32_t points, double fs,
+                                                 double* spectrum, double* f0, double* df,
+                                                 double* noise_variance);
+/** @} */
+
+/* ---------------------------------------------------------------------------- */
+/** @name Principal-component AR power spectrum
+ * The spectrum of the principal-component AR model, and the k modes whose poles
+ * lie nearest the unit circle (in order of increasing distance from it), with
+ * their amplitudes fitted by least squares. Damping is not reported.
+ * @param x             n samples
+ * @param n             number of samples, >= 1
+ * @param order         model order p, 0 <= p <= floor(2n/3)
+ * @param points        requested points, 2 <= points <= 2^30
+ * @param components    modes k, 1 <= k <= p
+ * @param fs            sampling rate in Hz, > 0
+ * @param real_signal   (real data only) non-zero: one mode per conjugate pair
+ * @param amplitude,phase,frequency  out: room for k values each
+ * @param modes         out: number of modes reported
+ * @param spectrum      out: qdm_spectrum_length(points) values in dB
+ * @param f0,df         out: first frequency and step, as for the covariance spectrum
+ * @param fit_error     out: mean squared error of the amplitude fit
+ * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
+ *   ::QDM_ERR_ORDER, ::QDM_ERR_COUNT, ::QDM_ERR_COUNT_ABOVE_ORDER,
+ *   ::QDM_ERR_SPECTRUM_SIZE, ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_NULL_POINTER,
+ *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY,
+ *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL,
+ *   ::QDM_ERR_ROOT_NAN.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t order,
+                                        int32_t points, int32_t components, double fs,
+                                        int32_t real_signal, double* amplitude, double* phase,
+                                        double* frequency, int32_t* modes, double* spectrum,
+                                        double* f0, double* df, double* fit_error);
+QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int32_t order,
+                                           int32_t points, int32_t components, double fs,
+                                           double* amplitude, double* phase, double* frequency,
+                                           int32_t* modes, double* spectrum, double* f0,
+                                           double* df, double* fit_error);
+/** @} */
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif /* QDM_API_H */

@@ -1,0 +1,53 @@
+/* qdm status codes: the one table of every code either face of the library can
+ * return, with its name and its text. qdm_status_text() and the reference
+ * documentation are both made from it.
+ *
+ * 0 is success. 20001 is a warning (the plain face only: the results are
+ * complete and valid). Codes from -42401 down to -42421 are argument errors,
+ * -424xx in the host's numbering. The other negative codes are numeric and FFT
+ * failures. The host face also returns -42400 - e when the host's
+ * NumericArrayResize fails with its own error e. */
+#ifndef QDM_STATUS_H
+#define QDM_STATUS_H
+
+/* X(name, code, text), in the order the reference lists them. */
+#define QDM_STATUS_TABLE(X)                                                                    \
+  X(QDM_OK, 0, "success")                                                                      \
+  X(QDM_WARN_RANK_DEFICIENT, 20001,                                                            \
+    "success, but a least-squares system inside the fit was rank deficient (minimum-norm "     \
+    "solution used)")                                                                          \
+  X(QDM_ERR_EMPTY_INPUT, -42401, "input array has no elements (n < 1)")                        \
+  X(QDM_ERR_ORDER, -42411, "order or pencil parameter negative or above floor(2n/3)")          \
+  X(QDM_ERR_COUNT, -42412,                                                                     \
+    "order zero, negative or above floor(2n/3), or components, k or M zero or negative")       \
+  X(QDM_ERR_COUNT_ABOVE_ORDER, -42413, "components, k or M greater than the order or L")       \
+  X(QDM_ERR_MIN_ORDER, -42414, "MDL minimum order below 1")                                    \
+  X(QDM_ERR_MDL_UPPER, -42415, "MDL upper order not above the minimum order, or above floor(2n/3)") \
+  X(QDM_ERR_NO_MODES, -42416, "amplitude fit asked for no modes")                              \
+  X(QDM_ERR_SPECTRUM_SIZE, -42417, "spectrum size below 2, or above 2^30")                     \
+  X(QDM_ERR_SAMPLE_RATE, -42418, "sampling rate not positive")                                 \
+  X(QDM_ERR_NON_FINITE, -42419, "input samples or sampling rate hold NaN or an infinity")      \
+  X(QDM_ERR_WORK_LIMIT, -42420,                                                                \
+    "the fit would need more work memory than the library's bound (QDM_MAX_WORK_BYTES)")       \
+  X(QDM_ERR_NULL_POINTER, -42421, "a required pointer argument is null")                       \
+  X(QDM_ERR_NO_MEMORY, -20001, "working memory could not be allocated")                        \
+  X(QDM_ERR_BAD_SIZE, -20003, "a size argument is below 1")                                    \
+  X(QDM_ERR_NEGATIVE_DIM, -20004, "a matrix-product dimension is negative")                    \
+  X(QDM_ERR_OPTION, -20061, "an option argument is out of range")                              \
+  X(QDM_ERR_NO_CONVERGENCE, -20062,                                                            \
+    "an iteration did not converge (LAPACK, or the polynomial root finder)")                   \
+  X(QDM_ERR_POLYNOMIAL, -20063,                                                                \
+    "invalid polynomial: a NaN coefficient, or fewer than two coefficients left")              \
+  X(QDM_ERR_EXTREME_VALUE, -20068,                                                             \
+    "a matrix holds NaN, an infinity or a value at the extreme ends of the double range")      \
+  X(QDM_ERR_ROOT_NAN, -20116, "the root iteration produced NaN (overflow)")                    \
+  X(QDM_ERR_ILLEGAL_ARGUMENT, -20999,                                                          \
+    "LAPACK reported an illegal argument, or a real transform length mismatch")                \
+  X(QDM_ERR_FFT_LENGTH, -1, "complex transform length mismatch")
+
+#define QDM_STATUS_ENUM_ENTRY(name, code, text) name = code,
+
+/** Every status code a qdm function can return (see qdm_status_text()). */
+enum qdm_status { QDM_STATUS_TABLE(QDM_STATUS_ENUM_ENTRY) };
+
+#endif /* QDM_STATUS_H */
