@@ -15,8 +15,9 @@
  * - Arrays need only the natural alignment of `double`.
  * - Every fit returns a status from qdm_status.h: ::QDM_OK, the warning
  *   ::QDM_WARN_RANK_DEFICIENT (results complete and valid), or a negative error.
- *   qdm_status_text() gives its meaning. On an error every output array is
- *   zero-filled, every mode count is 0 and every out double is 0.0.
+ *   qdm_status_text() gives its meaning. After an argument error (a -424xx
+ *   code) nothing has been written. After any other error every output array
+ *   is zero-filled, every mode count is 0 and every out double is 0.0.
  * - Functions are safe to call from any number of threads at once. The only
  *   state shared between calls is the list of FFT plans, under one lock.
  *
@@ -56,6 +57,7 @@
 #include <stdint.h>
 
 #include "qdm_status.h"
+#include "qdm_version.h"
 
 #if defined(_WIN32)
 #  if defined(QDM_BUILDING_API)
@@ -70,11 +72,6 @@
 #ifdef __cplusplus
 extern "C" {
 #endif
-
-/** Library version. */
-#define QDM_VERSION_MAJOR 1
-#define QDM_VERSION_MINOR 0
-#define QDM_VERSION_PATCH 0
 
 /** Bound on the work memory of one fit, in bytes (8 GiB). A fit whose work
  *  memory, as estimated from its sizes before any allocation, would exceed it

@@ -8,6 +8,7 @@
 #include <cstring>
 #include <type_traits>
 
+#include "core/call_record.h"
 #include "numeric/lapack_shims.h"
 #include "numeric/mat_mul.h"
 #include "numeric/numeric.h"
@@ -199,8 +200,10 @@ StatusCode PseudoInverse(T* A, int32_t m, int32_t n, double tol, T* out) {
 
 // ---- DGELSD ------------------------------------------------------------------------
 
-StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
-                            double* X, double rcond) {
+namespace {
+
+StatusCode GelsdSolve(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
+                      double* X, double rcond) {
   if (m < 1 || n < 1 || nrhs < 1) return status::kBadSize;
   if (HasNonFiniteReal(A, int64_t{m} * n) != 0 || HasNonFiniteReal(B, int64_t{m} * nrhs) != 0) {
     return status::kNonFinite;
@@ -251,16 +254,29 @@ StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double*
   return st;
 }
 
+}  // namespace
+
+StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
+                            double* X, double rcond) {
+  const StatusCode st = GelsdSolve(A, m, n, B, nrhs, X, rcond);
+  call_record::Note(st);
+  return st;
+}
+
 // ---- pseudo-inverse solves and pseudo-inverses ------------------------------------------
 
 StatusCode LeastSquaresPinvReal(const double* A, int32_t m, int32_t n, const double* B,
                                 int32_t nrhs, double* X, double rcond) {
-  return PinvSolve<double>(A, m, n, B, nrhs, X, rcond);
+  const StatusCode st = PinvSolve<double>(A, m, n, B, nrhs, X, rcond);
+  call_record::Note(st);
+  return st;
 }
 
 StatusCode LeastSquaresComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
                                int32_t nrhs, Complex* X, double rcond) {
-  return PinvSolve<Complex>(A, m, n, B, nrhs, X, rcond);
+  const StatusCode st = PinvSolve<Complex>(A, m, n, B, nrhs, X, rcond);
+  call_record::Note(st);
+  return st;
 }
 
 StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol, double* out) {

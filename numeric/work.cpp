@@ -3,6 +3,8 @@
 #include <atomic>
 #include <cstdlib>
 
+#include "core/call_record.h"
+
 namespace {
 // Injection state. Counters are atomics so that the accounting stays exact when
 // several threads call into the library at once.
@@ -22,7 +24,10 @@ bool InjectFailure() {
 StatusCode NumAlloc(void** slot, size_t bytes) {
   void* p = InjectFailure() ? nullptr : std::malloc(bytes == 0 ? 1 : bytes);
   *slot = p;
-  if (p == nullptr) return status::kNoMemory;
+  if (p == nullptr) {
+    call_record::Note(status::kNoMemory);
+    return status::kNoMemory;
+  }
   g_outstanding.fetch_add(1, std::memory_order_relaxed);
   return status::kOk;
 }
@@ -41,6 +46,7 @@ StatusCode NumRealloc(void** slot, size_t bytes) {
   if (p == nullptr) {
     (void)NumFree(old);
     *slot = nullptr;
+    call_record::Note(status::kNoMemory);
     return status::kNoMemory;
   }
   if (old == nullptr) g_outstanding.fetch_add(1, std::memory_order_relaxed);
