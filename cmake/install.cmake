@@ -44,3 +44,15 @@ set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_PACKAGE_SECTION science)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
 include(CPack)
+
+# The reference: the header comments of both faces and the status page made
+# from the status table, rendered by Doxygen into docs/html of the build tree.
+find_package(Doxygen QUIET)
+if(DOXYGEN_FOUND)
+  configure_file(${CMAKE_SOURCE_DIR}/docs/Doxyfile.in ${CMAKE_BINARY_DIR}/docs/Doxyfile @ONLY)
+  add_custom_target(docs
+      COMMAND ${Python3_EXECUTABLE} ${CMAKE_SOURCE_DIR}/tools/status_table.py
+              ${CMAKE_SOURCE_DIR}/include/qdm_status.h > ${CMAKE_BINARY_DIR}/docs/status.md
+      COMMAND ${DOXYGEN_EXECUTABLE} ${CMAKE_BINARY_DIR}/docs/Doxyfile
+      COMMENT "Rendering the reference into ${CMAKE_BINARY_DIR}/docs/html" VERBATIM)
+endif()

@@ -1,0 +1,54 @@
+#!/usr/bin/env bash
+# Installs the built tree into a temporary prefix and uses it as a user would:
+# a CMake project with find_package(qdm) and a plain cc line with pkg-config
+# build the README's C example, which must reproduce the host face's
+# covariance coefficients (qdm_example) on the complex test record. Then, run
+# as root with QDM_TEST_DEB=1, the Debian package installs with apt-get and
+# its library loads. Arguments: source dir, build dir.
+set -euo pipefail
+src=$1 build=$2
+tmp=$(mktemp -d)
+trap 'rm -rf "$tmp"' EXIT
+record=$src/tests/data/marple64.csv
+
+# The README's C block is examples/plain_covariance.c, word for word.
+awk '/^```c$/{on=1; next} /^```$/{on=0} on' "$src/README.md" > "$tmp/readme.c"
+diff -u "$src/examples/plain_covariance.c" "$tmp/readme.c"
+
+cmake --install "$build" --prefix "$tmp/prefix" > /dev/null
+nm -D --defined-only "$tmp/prefix"/lib*/libqdm.so | awk '{print $3}' | sort > "$tmp/exports"
+[ "$(wc -l < "$tmp/exports")" -eq 15 ] || { cat "$tmp/exports"; exit 1; }
+
+cmake -S "$src/tests/install/consumer" -B "$tmp/consumer" -DCMAKE_PREFIX_PATH="$tmp/prefix" \
+  -DEXAMPLE_SOURCE="$src/examples/plain_covariance.c" > /dev/null
+cmake --build "$tmp/consumer" > /dev/null
+export PKG_CONFIG_PATH=$(dirname "$(find "$tmp/prefix" -name qdm.pc)")
+libdir=$(pkg-config --variable=libdir qdm)
+cc -std=c99 -Wall -Werror "$src/examples/plain_covariance.c" $(pkg-config --cflags --libs qdm) \
+  -Wl,-rpath,"$libdir" -o "$tmp/pkgconfig_covariance"
+
+"$build/examples/qdm_example" covariance "$record" --order 15 --json > "$tmp/host.json"
+for program in "$tmp/consumer/plain_covariance" "$tmp/pkgconfig_covariance"; do
+  "$program" "$record" 15 > "$tmp/plain.txt"
+  /usr/bin/python3 - "$tmp/host.json" "$tmp/plain.txt" <<'PY'
+import json, sys
+host = json.load(open(sys.argv[1]))["results"]
+lines = [l.split() for l in open(sys.argv[2])]
+assert float(lines[0][1]) == host["noise_variance"], (lines[0], host["noise_variance"])
+coeffs = [(float(l[1]), float(l[2])) for l in lines[1:]]
+assert coeffs == [(c["real"], c["imag"]) for c in host["coefficients"]], "coefficients differ"
+PY
+done
+echo "installed tree: find_package and pkg-config consumers match the host face"
+
+if [ "${QDM_TEST_DEB:-0}" = 1 ] && [ "$(id -u)" = 0 ]; then
+  (cd "$build" && cpack -G DEB > /dev/null)
+  deb=$(ls "$build"/qdm_*.deb)
+  dpkg-deb -f "$deb" Depends
+  DEBIAN_FRONTEND=noninteractive apt-get install -y -qq "$deb" > /dev/null
+  cc -std=c99 "$src/examples/plain_covariance.c" $(PKG_CONFIG_PATH= pkg-config --cflags --libs qdm) \
+    -o "$tmp/system_covariance"
+  "$tmp/system_covariance" "$record" 15 | head -1
+  DEBIAN_FRONTEND=noninteractive apt-get remove -y -qq qdm > /dev/null
+  echo "Debian package: installed, loaded, removed"
+fi
