@@ -1,0 +1,341 @@
+// The plain C API against the host face, on the same inputs: the same numbers
+// and the same codes across valid calls and argument walks, plus what the
+// plain face adds (non-finite input, null pointers, the work-memory bound) and
+// its rule that no failure inside a fit is reported as success, checked by
+// failing each work allocation in turn.
+//
+// The plain face runs in this process (linked from the same core objects, so
+// the allocation hook is reachable); the host face is the built libqdm,
+// loaded as the host loads it.
+#include <gtest/gtest.h>
+
+#include <climits>
+#include <cmath>
+#include <cstring>
+#include <functional>
+#include <limits>
+#include <map>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "numeric/work.h"
+#include "qdm_api.h"
+#include "support/export_table.h"
+
+namespace {
+
+using namespace qdmtest;
+
+// Plain-face results in the host face's shape: array outputs in the export
+// table's resize order (complex ones interleaved), out doubles in its order,
+// and the mode count (or the MDL order).
+struct PlainCall {
+  std::vector<double> out[4];
+  double d[3] = {kStale, kStale, kStale};
+  int32_t count = kStaleOrder;
+};
+
+// Doubles of the data the host block holds.
+std::vector<double> Samples(bool complexData, int32_t n) {
+  const HostArray h = Signal(complexData, n);
+  if (!complexData) return h.Reals();
+  std::vector<double> out;
+  for (auto z : h.Complexes()) out.insert(out.end(), {z.real(), z.imag()});
+  return out;
+}
+
+using PlainFn = std::function<int32_t(const double* x, const Scalars&, PlainCall&)>;
+
+// Sizes the outputs as the header documents them (nothing for failing
+// argument values, which never reach them) and calls the plain function.
+qdm_complex* Cx(std::vector<double>& v) { return reinterpret_cast<qdm_complex*>(v.data()); }
+const qdm_complex* Cx(const double* x) { return reinterpret_cast<const qdm_complex*>(x); }
+size_t Room(int32_t count, int doubles = 1) {
+  return count > 0 && count < (1 << 20) ? static_cast<size_t>(count) * doubles : 1;
+}
+int32_t Points(int32_t m) { return qdm_spectrum_length(m) > 0 ? qdm_spectrum_length(m) : 1; }
+
+const std::map<std::string, PlainFn>& PlainFunctions() {
+  static const std::map<std::string, PlainFn> table = {
+      {"QdmRePronyH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         for (auto& o : c.out) o.assign(Room(s.a), kStale);
+         return qdm_prony_real(x, s.n, s.a, s.fs, 1, c.out[0].data(), c.out[1].data(),
+                               c.out[2].data(), c.out[3].data(), &c.count);
+       }},
+      {"QdmCxPronyH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         for (auto& o : c.out) o.assign(Room(s.a), kStale);
+         return qdm_prony_complex(Cx(x), s.n, s.a, s.fs, c.out[0].data(), c.out[1].data(),
+                                  c.out[2].data(), c.out[3].data(), &c.count);
+       }},
+      {"QdmReCovarianceH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         c.out[0].assign(Room(s.a, 2), kStale);
+         c.out[1].assign(Room(s.a + 1), kStale);
+         return qdm_covariance_real(x, s.n, s.a, c.out[1].data(), Cx(c.out[0]), &c.d[0]);
+       }},
+      {"QdmCxCovarianceH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         c.out[0].assign(Room(s.a, 2), kStale);
+         c.out[1].assign(Room(s.a + 1, 2), kStale);
+         return qdm_covariance_complex(Cx(x), s.n, s.a, Cx(c.out[1]), Cx(c.out[0]), &c.d[0]);
+       }},
+      {"QdmRePCARH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         c.out[0].assign(Room(s.a, 2), kStale);
+         c.out[1].assign(Room(s.a + 1), kStale);
+         return qdm_pcar_real(x, s.n, s.a, s.b, c.out[1].data(), Cx(c.out[0]));
+       }},
+      {"QdmCxPCARH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         c.out[0].assign(Room(s.a, 2), kStale);
+         c.out[1].assign(Room(s.a + 1, 2), kStale);
+         return qdm_pcar_complex(Cx(x), s.n, s.a, s.b, Cx(c.out[1]), Cx(c.out[0]));
+       }},
+      {"QdmReMatrixPencilH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         for (auto& o : c.out) o.assign(Room(s.b), kStale);
+         return qdm_matrix_pencil_real(x, s.n, s.a, s.b, s.fs, 1, c.out[0].data(),
+                                       c.out[1].data(), c.out[2].data(), c.out[3].data(),
+                                       &c.count, &c.d[0]);
+       }},
+      {"QdmCxMatrixPencilH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         for (auto& o : c.out) o.assign(Room(s.b), kStale);
+         return qdm_matrix_pencil_complex(Cx(x), s.n, s.a, s.b, s.fs, c.out[0].data(),
+                                          c.out[1].data(), c.out[2].data(), c.out[3].data(),
+                                          &c.count, &c.d[0]);
+       }},
+      {"QdmReMinDescriptLenH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         return qdm_mdl_order_real(x, s.n, s.a, s.b, &c.count);
+       }},
+      {"QdmCxMinDescriptLenH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         return qdm_mdl_order_complex(Cx(x), s.n, s.a, s.b, &c.count);
+       }},
+      {"QdmReCovPowerSpectrH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         c.out[0].assign(static_cast<size_t>(Points(s.b)), kStale);
+         return qdm_covariance_psd_real(x, s.n, s.a, s.b, s.fs, c.out[0].data(), &c.d[0],
+                                        &c.d[1], &c.d[2]);
+       }},
+      {"QdmCxCovPowerSpectrH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         c.out[0].assign(static_cast<size_t>(Points(s.b)), kStale);
+         return qdm_covariance_psd_complex(Cx(x), s.n, s.a, s.b, s.fs, c.out[0].data(), &c.d[0],
+                                           &c.d[1], &c.d[2]);
+       }},
+      {"QdmRePCARPowerSpectrumH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         for (int i = 0; i < 3; ++i) c.out[i].assign(Room(s.c), kStale);
+         c.out[3].assign(static_cast<size_t>(Points(s.b)), kStale);
+         return qdm_pcar_psd_real(x, s.n, s.a, s.b, s.c, s.fs, 1, c.out[0].data(),
+                                  c.out[1].data(), c.out[2].data(), &c.count, c.out[3].data(),
+                                  &c.d[0], &c.d[1], &c.d[2]);
+       }},
+      {"QdmCxPCARPowerSpectrumH",
+       [](const double* x, const Scalars& s, PlainCall& c) {
+         for (int i = 0; i < 3; ++i) c.out[i].assign(Room(s.c), kStale);
+         c.out[3].assign(static_cast<size_t>(Points(s.b)), kStale);
+         return qdm_pcar_psd_complex(Cx(x), s.n, s.a, s.b, s.c, s.fs, c.out[0].data(),
+                                     c.out[1].data(), c.out[2].data(), &c.count,
+                                     c.out[3].data(), &c.d[0], &c.d[1], &c.d[2]);
+       }},
+  };
+  return table;
+}
+
+bool Modes(Family f) {
+  return f == Family::kProny || f == Family::kPencil || f == Family::kPcarSpectrum;
+}
+
+// A larger valid call per family, beside Valid(): n = 64.
+Scalars Larger(Family f) {
+  switch (f) {
+    case Family::kProny: return {64, 6, 0, 0, 1000.0};
+    case Family::kCovariance: return {64, 15, 0, 0, 1.0};
+    case Family::kPcar: return {64, 12, 4, 0, 1.0};
+    case Family::kPencil: return {64, 21, 4, 0, 250.0};
+    case Family::kMdl: return {64, 20, 1, 0, 1.0};
+    case Family::kCovSpectrum: return {64, 12, 100, 0, 2.0};
+    case Family::kPcarSpectrum: return {64, 12, 300, 4, 2.0};
+  }
+  return {};
+}
+
+// Host outputs and plain outputs agree bit for bit.
+void ExpectSameResults(const Export& x, const Call& host, const PlainCall& plain,
+                       const std::string& where) {
+  for (int i = 0; i < x.outputs; ++i) {
+    const bool complexOut = (x.family == Family::kCovariance || x.family == Family::kPcar) &&
+                            (i == 0 || x.complexData);
+    const int32_t count = host.out[i].Count();
+    std::vector<double> h = complexOut ? std::vector<double>() : host.out[i].Reals();
+    if (complexOut) {
+      for (auto z : host.out[i].Complexes()) h.insert(h.end(), {z.real(), z.imag()});
+    }
+    ASSERT_LE(h.size(), plain.out[i].size()) << where << " out" << i;
+    EXPECT_EQ(0, std::memcmp(h.data(), plain.out[i].data(), h.size() * sizeof(double)))
+        << where << " out" << i << " (" << count << " elements)";
+    if (Modes(x.family) && !(x.family == Family::kPcarSpectrum && i == 3)) {
+      EXPECT_EQ(count, plain.count) << where;
+    }
+  }
+  for (int j = 0; j < x.doubles; ++j) {
+    EXPECT_EQ(0, std::memcmp(&host.d[j], &plain.d[j], sizeof(double))) << where << " d" << j;
+  }
+  if (x.family == Family::kMdl) EXPECT_EQ(host.order, plain.count) << where;
+}
+
+// Argument values to walk through each integer slot of a family: zero, +-1,
+// the order bound and one past it, the extremes.
+std::vector<Scalars> ArgumentWalk(Family f) {
+  std::vector<Scalars> walk;
+  const Scalars v = Larger(f);
+  const int32_t bound = 2 * v.n / 3;
+  for (int slot = 0; slot < 3; ++slot) {
+    for (int32_t value : {0, 1, -1, 2, bound, bound + 1, INT_MAX, INT_MIN, (1 << 30) + 1}) {
+      Scalars s = v;
+      (slot == 0 ? s.a : slot == 1 ? s.b : s.c) = value;
+      walk.push_back(s);
+    }
+  }
+  for (double fs : {0.0, -1.0}) {
+    Scalars s = v;
+    s.fs = fs;
+    walk.push_back(s);
+  }
+  return walk;
+}
+
+TEST(PlainApi, SameNumbersAndCodesAsTheHostFace) {
+  int compared = 0;
+  for (const Export& x : Exports()) {
+    const PlainFn& plain = PlainFunctions().at(x.name);
+    std::vector<Scalars> cases = ArgumentWalk(x.family);
+    cases.push_back(Valid(x.family));
+    Scalars empty = Valid(x.family);
+    empty.n = 0;
+    cases.push_back(empty);
+    for (const Scalars& s : cases) {
+      const std::string where = std::string(x.name) + " a=" + std::to_string(s.a) +
+                                " b=" + std::to_string(s.b) + " c=" + std::to_string(s.c) +
+                                " n=" + std::to_string(s.n) + " fs=" + std::to_string(s.fs);
+      Call host = MakeCall(x, s);
+      const int32_t host_status = x.invoke(Qdm(), host, s);
+      const std::vector<double> data = Samples(x.complexData, s.n);
+      PlainCall p;
+      const int32_t plain_status = plain(s.n > 0 ? data.data() : &kStale, s, p);
+      if (host_status == 0) {
+        ASSERT_TRUE(plain_status == QDM_OK || plain_status == QDM_WARN_RANK_DEFICIENT)
+            << where << ": " << plain_status;
+        ExpectSameResults(x, host, p, where);
+        ++compared;
+      } else {
+        EXPECT_EQ(plain_status, host_status) << where;
+      }
+    }
+  }
+  RecordProperty("compared", compared);
+}
+
+TEST(PlainApi, RefusesWhatTheHostFaceLetsThrough) {
+  const double inf = std::numeric_limits<double>::infinity();
+  const double nan = std::numeric_limits<double>::quiet_NaN();
+  for (const Export& x : Exports()) {
+    const PlainFn& plain = PlainFunctions().at(x.name);
+    const Scalars s = Larger(x.family);
+    for (double bad : {nan, inf, -inf}) {
+      std::vector<double> data = Samples(x.complexData, s.n);
+      data[7] = bad;
+      PlainCall p;
+      EXPECT_EQ(plain(data.data(), s, p), QDM_ERR_NON_FINITE) << x.name << " sample " << bad;
+      if (x.family != Family::kCovariance && x.family != Family::kPcar &&
+          x.family != Family::kMdl) {
+        Scalars r = s;
+        r.fs = nan;  // passes the shared check, as on the host face
+        data[7] = 0.5;
+        EXPECT_EQ(plain(data.data(), r, p), QDM_ERR_NON_FINITE) << x.name << " rate";
+      }
+    }
+    PlainCall p;
+    EXPECT_EQ(plain(nullptr, s, p), QDM_ERR_NULL_POINTER) << x.name;
+  }
+  // Work memory past the bound is refused before anything is allocated.
+  std::vector<double> big(1 << 21, 0.25);
+  std::vector<double> spectrum(1);
+  double f0, df, var;
+  NumAllocFailAt(1, true);
+  EXPECT_EQ(qdm_covariance_psd_real(big.data(), 64, 4, 1 << 30, 1.0, spectrum.data(), &f0, &df,
+                                    &var),
+            QDM_ERR_WORK_LIMIT);
+  double m[4];
+  int32_t modes;
+  EXPECT_EQ(qdm_matrix_pencil_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0, m, m, m, m, &modes,
+                                   &var),
+            QDM_ERR_WORK_LIMIT);
+  NumAllocFailAt(0, false);
+}
+
+// Each work allocation failed in turn, once and from then on: every call ends
+// with the clean run's exact results or with an error and emptied outputs.
+// Never success with other numbers.
+TEST(PlainApi, NoFailureIsReportedAsSuccess) {
+  int64_t faulted = 0;
+  for (const Export& x : Exports()) {
+    const PlainFn& plain = PlainFunctions().at(x.name);
+    for (const Scalars& s : {Valid(x.family), Larger(x.family)}) {
+      const std::vector<double> data = Samples(x.complexData, s.n);
+      PlainCall clean;
+      const int32_t clean_status = plain(data.data(), s, clean);
+      ASSERT_GE(clean_status, 0) << x.name;
+      for (bool persistent : {false, true}) {
+        for (int64_t k = 1;; ++k) {
+          PlainCall p;
+          const int64_t before = NumAllocOutstanding();
+          NumAllocFailAt(k, persistent);
+          const int32_t st = plain(data.data(), s, p);
+          const bool reached = NumAllocAttempts() >= k;
+          NumAllocFailAt(0, false);
+          const std::string where = std::string(x.name) + " n=" + std::to_string(s.n) +
+                                    (persistent ? " from " : " at ") + std::to_string(k);
+          ASSERT_EQ(NumAllocOutstanding(), before) << where;
+          if (!reached) break;
+          ++faulted;
+          if (st >= 0) {
+            EXPECT_EQ(st, clean_status) << where;
+            for (int i = 0; i < 4; ++i) EXPECT_EQ(p.out[i], clean.out[i]) << where << " out" << i;
+            EXPECT_EQ(p.count, clean.count) << where;
+          } else {
+            EXPECT_EQ(st, QDM_ERR_NO_MEMORY) << where;
+            for (int i = 0; i < 4; ++i) {
+              for (double v : p.out[i]) ASSERT_EQ(v, 0.0) << where << " out" << i;
+            }
+            if (Modes(x.family) || x.family == Family::kMdl) EXPECT_EQ(p.count, 0) << where;
+            for (int j = 0; j < x.doubles; ++j) EXPECT_EQ(p.d[j], 0.0) << where << " d" << j;
+          }
+        }
+      }
+    }
+  }
+  RecordProperty("faulted_calls", static_cast<int>(faulted));
+}
+
+TEST(PlainApi, EveryStatusHasItsOwnText) {
+  std::set<std::string> texts;
+  int entries = 0;
+#define QDM_TEST_STATUS(name, code, text)             \
+  EXPECT_STREQ(qdm_status_text(code), text) << #name; \
+  texts.insert(text);                                 \
+  ++entries;
+  QDM_STATUS_TABLE(QDM_TEST_STATUS)
+#undef QDM_TEST_STATUS
+  EXPECT_EQ(texts.size(), static_cast<size_t>(entries));
+  EXPECT_STRNE(qdm_status_text(-42400 - 1000), qdm_status_text(12345));
+  EXPECT_STREQ(qdm_version(), QDM_VERSION_STRING);
+}
+
+}  // namespace

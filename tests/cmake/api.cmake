@@ -1,0 +1,17 @@
+# The plain C API against the host face. The plain face is linked in from the
+# same core objects (so the test reaches the allocation hook); the host face is
+# the built libqdm, loaded as the host loads it.
+if(TARGET qdm_api)
+  add_executable(api_plain_vs_host ${CMAKE_SOURCE_DIR}/tests/api/plain_vs_host.cpp
+                 $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})
+  target_include_directories(api_plain_vs_host PRIVATE ${CMAKE_SOURCE_DIR}
+                             ${CMAKE_CURRENT_SOURCE_DIR} ${CMAKE_SOURCE_DIR}/include
+                             ${QDM_GENERATED_INCLUDE} ${CMAKE_SOURCE_DIR}/emuhost)
+  target_compile_definitions(api_plain_vs_host PRIVATE QDM_BUILDING_API
+                             QDM_LIBRARY_PATH="$<TARGET_FILE:qdm>")
+  target_link_libraries(api_plain_vs_host PRIVATE gfrtemu ${QDM_LINALG_LIBS} GTest::gtest_main
+                        Threads::Threads ${CMAKE_DL_LIBS})
+  add_dependencies(api_plain_vs_host qdm)
+  gtest_discover_tests(api_plain_vs_host DISCOVERY_MODE PRE_TEST TEST_PREFIX "api."
+                       DISCOVERY_TIMEOUT 120)
+endif()
