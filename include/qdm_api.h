@@ -229,7 +229,9 @@ QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int
  * (the noise variance does not enter the values).
  * @param x             n samples
  * @param n             number of samples, >= 1
- * @param order         model order p, 0 <= p <= floor(2n/3) (0 gives a flat spectrum)
+ * @param order         model order p, 1 <= p <= floor(2n/3) (0 passes the argument
+ *                      check, as on the host face, and the covariance fit refuses it
+ *                      with ::QDM_ERR_COUNT)
  * @param points        requested points, 2 <= points <= 2^30
  * @param fs            sampling rate in Hz, > 0
  * @param spectrum      out: qdm_spectrum_length(points) values in dB
