@@ -47,6 +47,15 @@ inline StatusCode PseudoInverse(double* A, int32_t m, int32_t n, double tol) {
 inline StatusCode PseudoInverse(Complex* A, int32_t m, int32_t n, double tol) {
   return PseudoInverseComplex(A, m, n, tol, nullptr);
 }
+// X = pinv(A) B over the `keep` strongest singular components of A.
+inline StatusCode TruncatedSolve(const double* A, int32_t m, int32_t n, const double* B,
+                                 double* X, int32_t keep) {
+  return LeastSquaresTruncatedReal(A, m, n, B, 1, X, keep);
+}
+inline StatusCode TruncatedSolve(const Complex* A, int32_t m, int32_t n, const Complex* B,
+                                 Complex* X, int32_t keep) {
+  return LeastSquaresTruncatedComplex(A, m, n, B, 1, X, keep);
+}
 // Eigenvalues only of a general matrix; the matrix is left as it is.
 inline StatusCode EigenvaluesOf(double* A, int32_t n, Complex* eigenvalues) {
   return EigGeneralReal(A, n, 0, eigenvalues, nullptr);

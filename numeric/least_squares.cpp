@@ -1,14 +1,15 @@
 // Least-squares solves and pseudo-inverses. The real solve runs DGELSD except for
-// very wide systems, which go through the SVD pseudo-inverse; the pseudo-inverse
-// solves and the pseudo-inverses are built on the economy SVD A = U diag(S) V^H
-// as pinv(A) = V diag(1/S) U^H over the singular values above a threshold.
+// very wide systems, which go through the SVD pseudo-inverse solve. The
+// pseudo-inverse solves apply pinv(A) = V diag(1/S) U^H over the singular values
+// above a threshold without forming it, tall systems through a QR factorization
+// first; the pseudo-inverses are formed from the economy SVD A = U diag(S) V^H.
 
 #include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <type_traits>
 
-#include "numeric/lapack_shims.h"
+#include "numeric/lapack_boundary.h"
 #include "numeric/mat_mul.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
@@ -108,6 +109,104 @@ StatusCode FormPinv(Factors<T>& f, int32_t m, int32_t n, int32_t k, T* P) {
   return MatMul<T>(f.V, f.U, n, k, m, P, false);
 }
 
+template <typename T>
+int32_t HasNonFinite(const T* x, int64_t n) {
+  if constexpr (kIsComplex<T>) {
+    return HasNonFiniteComplex(x, n);
+  } else {
+    return HasNonFiniteReal(x, n);
+  }
+}
+
+// A system with at least this many rows per column is solved through a QR
+// factorization first: the SVD is then taken of the small n-by-n R only.
+bool IsTall(int32_t m, int32_t n) { return int64_t{m} >= 2 * int64_t{n}; }
+
+// Which singular values a solve keeps: those above max(m, n) S[0] e (relative),
+// or those above the midpoint threshold of TruncationThreshold for `keep`
+// components (absolute, no warning).
+struct Cut {
+  bool relative;
+  double e;
+  int32_t keep;
+};
+
+// X = V diag(1/S) U^H B over the kept singular values of A = U diag(S) V^H. A
+// tall A is first factored as A = QR (column-major copy of A, Householder QR,
+// Q^H applied to B) and the SVD taken of R = U_R diag(S) V_R^H, whose singular
+// values are those of A; then X = V_R diag(1/S) U_R^H (Q^H B)[0:n]. Neither U
+// of the tall matrix nor the pseudo-inverse itself is ever formed. *kept is the
+// number of singular values kept. nrhs < 1 (possible from the complex solve
+// only) factors A for its statuses and writes nothing.
+template <typename T>
+StatusCode SvdSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X, Cut cut,
+                    int32_t* kept) {
+  const int32_t k = std::min(m, n);
+  const bool tall = IsTall(m, n) && nrhs > 0;
+  const int32_t rows = tall ? n : m;  // rows of the matrix decomposed
+  const int64_t mn = int64_t{m} * n;
+
+  Factors<T> f;
+  if (!f.Allocate(rows, n, k)) return status::kNoMemory;
+  WorkArray<T> qr;
+  WorkArray<T> y;
+  const T* base = B;  // the right-hand sides U^H is applied to
+  StatusCode st = status::kOk;
+  if (tall) {
+    if (HasNonFinite(A, mn) != 0) return status::kNonFinite;
+    // One block: A column-major (lda = m), tau (n), Q^H B column-major
+    // (m-by-nrhs) and R (n-by-n); y, the first n rows of Q^H B (n-by-nrhs,
+    // row-major), on its own.
+    const int64_t mr = int64_t{m} * nrhs;
+    const int64_t nn = int64_t{n} * n;
+    qr = AllocWorkUninit<T>(static_cast<size_t>(mn + n + mr + nn));
+    y = AllocWorkUninit<T>(static_cast<size_t>(int64_t{n} * nrhs));
+    if (!qr || !y) return status::kNoMemory;
+    T* a_col = qr.get();
+    T* tau = a_col + mn;
+    T* c = tau + n;
+    T* r = c + mr;
+    TransposeTo(A, m, n, a_col, false);
+    st = lapack::Geqrf(m, n, a_col, m, tau);
+    if (st != status::kOk) return st;
+    TransposeTo(B, m, nrhs, c, false);
+    st = lapack::ApplyQAdjoint(m, nrhs, n, a_col, m, tau, c, m);
+    if (st != status::kOk) return st;
+    for (int32_t i = 0; i < n; ++i) {
+      for (int32_t j = 0; j < n; ++j) r[int64_t{i} * n + j] = j < i ? T(0.0) : a_col[int64_t{j} * m + i];
+      for (int32_t j = 0; j < nrhs; ++j) y[int64_t{i} * nrhs + j] = c[int64_t{j} * m + i];
+    }
+    st = SvdOf(r, n, n, f.U, f.S, f.V);
+    base = y.get();
+  } else {
+    st = SvdOf(A, m, n, f.U, f.S, f.V);
+  }
+  if (st != status::kOk) return st;
+
+  const double threshold = cut.relative ? std::max(m, n) * f.S[0] * cut.e
+                                        : TruncationThreshold(f.S, k, cut.keep);
+  int32_t count = 0;
+  for (int32_t i = 0; i < k; ++i) count += f.S[i] > threshold ? 1 : 0;
+  *kept = count;
+  if (nrhs < 1) return nrhs < 0 ? status::kNegativeDim : status::kOk;
+
+  // z = diag(1/S) U^H base (k-by-nrhs), rows of dropped values zero; then V z.
+  const int64_t kr = int64_t{k} * nrhs;
+  WorkArray<T> z = AllocWorkUninit<T>(static_cast<size_t>(kr + int64_t{n} * nrhs));
+  if (!z) return status::kNoMemory;
+  lapack::Gemm(k, nrhs, rows, f.U, base, z.get(), true);
+  for (int32_t i = 0; i < k; ++i) {
+    const bool keep = f.S[i] > threshold;
+    const double factor = keep ? 1.0 / f.S[i] : 0.0;
+    T* row = z.get() + int64_t{i} * nrhs;
+    for (int32_t j = 0; j < nrhs; ++j) row[j] = keep ? row[j] * factor : T(0.0);
+  }
+  T* solution = z.get() + kr;
+  lapack::Gemm(n, nrhs, k, f.V, z.get(), solution);
+  std::memcpy(static_cast<void*>(X), solution, static_cast<size_t>(int64_t{n} * nrhs) * sizeof(T));
+  return status::kOk;
+}
+
 // X = pinv(A) B, with singular values at or below max(m, n) S[0] e dropped,
 // e = rcond when positive, machine epsilon otherwise.
 template <typename T>
@@ -115,8 +214,8 @@ StatusCode PinvSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs,
                      double rcond) {
   if constexpr (kIsComplex<T>) {
     // Deliberately narrower than the real twin: nrhs is not checked (a negative
-    // count surfaces as the product's -20004), and only B is screened here;
-    // the SVD screens A.
+    // count gives -20004 once A is factored), and only B is screened here; A
+    // is screened by its factorization.
     if (m < 1 || n < 1) return status::kBadSize;
     if (HasNonFiniteComplex(B, int64_t{m} * nrhs) != 0) return status::kNonFinite;
   } else {
@@ -125,49 +224,22 @@ StatusCode PinvSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs,
       return status::kNonFinite;
     }
   }
-  const int32_t k = std::min(m, n);
-  const int64_t mn = int64_t{m} * n;
-
-  Factors<T> f;
-  if (!f.Allocate(m, n, k)) return status::kNoMemory;
-  StatusCode st = SvdOf(A, m, n, f.U, f.S, f.V);
+  int32_t kept = 0;
+  const StatusCode st =
+      SvdSolve(A, m, n, B, nrhs, X, Cut{true, rcond > 0.0 ? rcond : kEpsilon, 0}, &kept);
   if (st != status::kOk) return st;
+  return kept == std::min(m, n) ? status::kOk : status::kRankDeficient;
+}
 
-  const double e = rcond > 0.0 ? rcond : kEpsilon;
-  const double threshold = std::max(m, n) * f.S[0] * e;
-  const int32_t kept = InvertKeptColumns(f.V, n, k, f.S, threshold);
-
-  WorkArray<T> pinv = AllocWork<T>(static_cast<size_t>(mn));
-  if (!pinv) return status::kNoMemory;
-  st = FormPinv(f, m, n, k, pinv.get());
-  if (st != status::kOk) return st;
-
-  // B followed by X' = P B, m*nrhs + n*nrhs elements.
-  const int64_t b_count = std::max<int64_t>(int64_t{m} * nrhs, 0);
-  const int64_t x_count = std::max<int64_t>(int64_t{n} * nrhs, 0);
-  WorkArray<T> rhs_block;
-  T* rhs = nullptr;
-  if constexpr (kIsComplex<T>) {
-    // The factor block is free again; it is reused, grown when nrhs > k.
-    if (nrhs > k) {
-      void* raw = f.uv.release();
-      st = NumRealloc(&raw, static_cast<size_t>(b_count + x_count) * sizeof(T));
-      f.uv.reset(static_cast<T*>(raw));
-      if (st != status::kOk) return st;
-    }
-    rhs = f.uv.get();
-  } else {
-    rhs_block = AllocWork<T>(static_cast<size_t>(b_count + x_count));
-    if (!rhs_block) return status::kNoMemory;
-    rhs = rhs_block.get();
+template <typename T>
+StatusCode TruncatedSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X,
+                          int32_t keep) {
+  if (m < 1 || n < 1 || nrhs < 1) return status::kBadSize;
+  if (HasNonFinite(A, int64_t{m} * n) != 0 || HasNonFinite(B, int64_t{m} * nrhs) != 0) {
+    return status::kNonFinite;
   }
-  if (b_count > 0) std::memcpy(static_cast<void*>(rhs), B, static_cast<size_t>(b_count) * sizeof(T));
-  st = MatMul<T>(pinv.get(), rhs, n, m, nrhs, rhs + b_count, false);
-  if (st != status::kOk) return st;
-  if (x_count > 0) {
-    std::memcpy(static_cast<void*>(X), rhs + b_count, static_cast<size_t>(x_count) * sizeof(T));
-  }
-  return kept == k ? status::kOk : status::kRankDeficient;
+  int32_t kept = 0;
+  return SvdSolve(A, m, n, B, nrhs, X, Cut{false, 0.0, keep}, &kept);
 }
 
 // pinv(A) into out, or over A when out is null. tol < 0 selects
@@ -212,7 +284,7 @@ StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double*
 
   // Column-major right-hand sides; rows m..ldb-1 of each column are DGELSD's
   // room for the solution of a wide system.
-  WorkArray<double> rhs = AllocWork<double>(static_cast<size_t>(int64_t{ldb} * nrhs));
+  WorkArray<double> rhs = AllocWorkUninit<double>(static_cast<size_t>(int64_t{ldb} * nrhs));
   if (!rhs) return status::kNoMemory;
   for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(m, B + j, nrhs, rhs.get() + int64_t{j} * ldb, 1);
 
@@ -221,30 +293,16 @@ StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double*
   const double lapack_rcond = std::max(m, n) * r;
 
   // A^T row-major is A column-major with lda = m.
-  WorkArray<double> a_col = AllocWork<double>(static_cast<size_t>(int64_t{m} * n));
+  WorkArray<double> a_col = AllocWorkUninit<double>(static_cast<size_t>(int64_t{m} * n));
   if (!a_col) return status::kNoMemory;
-  StatusCode st = TransposeReal(const_cast<double*>(A), m, n, a_col.get());
-  if (st != status::kOk) return st;
-  WorkArray<double> sv = AllocWork<double>(static_cast<size_t>(k));
+  TransposeTo(A, m, n, a_col.get(), false);
+  WorkArray<double> sv = AllocWorkUninit<double>(static_cast<size_t>(k));
   if (!sv) return status::kNoMemory;
 
-  // Integer workspace (3 depth + 14) k, depth = floor(log2 k): enough for the
-  // divide-and-conquer tree of any block size.
-  const int64_t depth = static_cast<int64_t>(std::log(static_cast<double>(k)) / std::log(2.0));
-  WorkArray<lapack_int> iwork = AllocWork<lapack_int>(static_cast<size_t>((3 * depth + 14) * k));
-  if (!iwork) return status::kNoMemory;
-
-  double query = 0.0;
   lapack_int rank = 0;
-  lapack_int info = 0;
-  lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(), lapack_rcond, &rank, &query,
-                -1, iwork.get(), &info);
-  const int64_t lwork = lapack::QueriedWorkSize(query);
-  WorkArray<double> work = AllocWork<double>(static_cast<size_t>(std::max<int64_t>(lwork, 0)));
-  if (!work) return status::kNoMemory;
-  lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(), lapack_rcond, &rank,
-                work.get(), static_cast<lapack_int>(lwork), iwork.get(), &info);
-  if (info > 0) return status::kNoConvergence;
+  StatusCode st = lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(),
+                                lapack_rcond, &rank);
+  if (st != status::kOk) return st;
 
   st = rank < k ? status::kRankDeficient : status::kOk;
   for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(n, rhs.get() + int64_t{j} * ldb, 1, X + j, nrhs);
@@ -261,6 +319,22 @@ StatusCode LeastSquaresPinvReal(const double* A, int32_t m, int32_t n, const dou
 StatusCode LeastSquaresComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
                                int32_t nrhs, Complex* X, double rcond) {
   return PinvSolve<Complex>(A, m, n, B, nrhs, X, rcond);
+}
+
+StatusCode LeastSquaresTruncatedReal(const double* A, int32_t m, int32_t n, const double* B,
+                                     int32_t nrhs, double* X, int32_t keep) {
+  return TruncatedSolve<double>(A, m, n, B, nrhs, X, keep);
+}
+
+StatusCode LeastSquaresTruncatedComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
+                                        int32_t nrhs, Complex* X, int32_t keep) {
+  return TruncatedSolve<Complex>(A, m, n, B, nrhs, X, keep);
+}
+
+double TruncationThreshold(const double* S, int32_t count, int32_t keep) {
+  if (keep == count) return S[keep - 1] * 0.5;
+  if (keep >= 1 && keep < count) return (S[keep - 1] + S[keep]) * 0.5;
+  return 0.0;
 }
 
 StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol, double* out) {

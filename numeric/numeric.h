@@ -47,6 +47,19 @@ int32_t HasNonFiniteComplex(const Complex* x, int64_t n);
 [[nodiscard]] StatusCode LeastSquaresComplex(const Complex* A, int32_t m, int32_t n,
                                              const Complex* B, int32_t nrhs, Complex* X,
                                              double rcond);
+// X = pinv_tau(A) B, pinv_tau over the singular values of A above the absolute
+// threshold TruncationThreshold(S, min(m, n), keep); 0 whatever the rank.
+[[nodiscard]] StatusCode LeastSquaresTruncatedReal(const double* A, int32_t m, int32_t n,
+                                                   const double* B, int32_t nrhs, double* X,
+                                                   int32_t keep);
+[[nodiscard]] StatusCode LeastSquaresTruncatedComplex(const Complex* A, int32_t m, int32_t n,
+                                                      const Complex* B, int32_t nrhs, Complex* X,
+                                                      int32_t keep);
+// Halfway between the keep-th and (keep+1)-th of the `count` non-increasing
+// singular values S (half the keep-th when keep == count; 0 when keep is out
+// of range), so that exactly the keep strongest pass a strict "S > tau" test
+// unless values tie at the boundary.
+double TruncationThreshold(const double* S, int32_t count, int32_t keep);
 // pinv(A), n-by-m, into out or over A when out is null.
 [[nodiscard]] StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol,
                                            double* out);
