@@ -4,7 +4,10 @@
 // with the records, the outputs and the times. bench/estimators_bench.py runs
 // it, times numpy's equivalents on the same records and prints the table.
 //
-//   estimators_bench LIBQDM [--quick] [--records-only] [--threads T]
+//   estimators_bench LIBQDM [--quick] [--only EXPORT:RECORD] [--extra] [--threads T]
+//
+// --extra writes the outputs (no times) for records scaled by 1e150 and 1e-150
+// and for a noise-free record, to compare one build's answers with another's.
 //
 // Each time is the best over several batches of calls, per call, in seconds of
 // process CPU time (BLAS worker threads included, descheduled time left out).
@@ -326,6 +329,7 @@ int main(int argc, char** argv) {
   bool records_only = false;
   bool extra = false;
   int threads = 0;
+  std::string only;
   for (int i = 2; i < argc; ++i) {
     if (std::strcmp(argv[i], "--quick") == 0) {
       g_batch_seconds = 0.005;
@@ -334,6 +338,8 @@ int main(int argc, char** argv) {
       extra = true;
     } else if (std::strcmp(argv[i], "--records-only") == 0) {
       records_only = true;
+    } else if (std::strcmp(argv[i], "--only") == 0 && i + 1 < argc) {
+      only = argv[++i];
     } else if (std::strcmp(argv[i], "--threads") == 0 && i + 1 < argc) {
       threads = std::atoi(argv[++i]);
     }
@@ -389,6 +395,13 @@ int main(int argc, char** argv) {
   }
   for (size_t i = 0; i < sets.size(); ++i) {
     AddCases(q, cases, sets[i].rkey, sets[i].ckey, arrays[2 * i], arrays[2 * i + 1], sets[i].z);
+  }
+  if (!only.empty()) {  // --only EXPORT:RECORD, either part may be empty
+    const std::string name = only.substr(0, only.find(':'));
+    const std::string record = only.find(':') == std::string::npos ? "" : only.substr(only.find(':') + 1);
+    std::erase_if(cases, [&](const Case& c) {
+      return (!name.empty() && c.name != name) || (!record.empty() && c.record != record);
+    });
   }
   out += BlasDescription() + "\",\n\"records\":{";
   for (size_t i = 0; i < sets.size(); ++i) {

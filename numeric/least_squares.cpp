@@ -122,6 +122,63 @@ int32_t HasNonFinite(const T* x, int64_t n) {
 // factorization first: the SVD is then taken of the small n-by-n R only.
 bool IsTall(int32_t m, int32_t n) { return int64_t{m} >= 2 * int64_t{n}; }
 
+// Rows of A per QR step of a tall solve: about 512 KiB of W = [R; block], and
+// at least 2n rows so that R's own rows stay a small part of each step; the
+// whole of A when it is no taller than that.
+template <typename T>
+int32_t BlockRows(int32_t m, int32_t n) {
+  const int64_t fit = (int64_t{512} * 1024 / static_cast<int64_t>(sizeof(T))) / n - n;
+  const int64_t c = std::max<int64_t>(fit, 2 * int64_t{n});
+  return static_cast<int32_t>(std::min<int64_t>(c, m));
+}
+
+// The tall A (m-by-n, m >= 2n) and B (m-by-nrhs) folded into R (n-by-n, upper
+// triangular with zeros below) and y = (Q^H B)[0:n] (n-by-nrhs), both
+// column-major with leading dimension n, where A = QR. Row blocks of A are
+// folded in one at a time: W holds [R; next block] column-major (ld = n + c)
+// and is factored by Householder QR, and the same reflectors are applied to
+// [y; next block of B] in Wb; R and y are then the leading n rows of W and Wb.
+// A block of c rows keeps W in cache, where the level-2 panel steps of the QR
+// run at full speed, and no column-major copy of the whole of A is made.
+template <typename T>
+StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* y) {
+  const int32_t c = BlockRows<T>(m, n);
+  const int32_t ld = n + c;
+  const int64_t w_count = int64_t{ld} * n;
+  const int64_t wb_count = int64_t{ld} * nrhs;
+  WorkArray<T> block = AllocWorkUninit<T>(static_cast<size_t>(w_count + n + wb_count));
+  if (!block) return status::kNoMemory;
+  T* W = block.get();
+  T* tau = W + w_count;
+  T* Wb = tau + n;
+  for (int32_t r0 = 0; r0 < m; r0 += c) {
+    const int32_t top = r0 == 0 ? 0 : n;  // rows of R above the block
+    const int32_t h = top + std::min(c, m - r0);
+    // R is the upper triangle the last step left; clear the reflectors below it.
+    for (int32_t j = 0; j < top; ++j) {
+      for (int32_t i = j + 1; i < top; ++i) W[int64_t{j} * ld + i] = T(0.0);
+    }
+    for (int32_t i = top; i < h; ++i) {
+      const T* a_row = A + int64_t{r0 + i - top} * n;
+      for (int32_t j = 0; j < n; ++j) W[int64_t{j} * ld + i] = a_row[j];
+      const T* b_row = B + int64_t{r0 + i - top} * nrhs;
+      for (int32_t j = 0; j < nrhs; ++j) Wb[int64_t{j} * ld + i] = b_row[j];
+    }
+    StatusCode st = lapack::Geqrf(h, n, W, ld, tau);
+    if (st != status::kOk) return st;
+    st = lapack::ApplyQAdjoint(h, nrhs, n, W, ld, tau, Wb, ld);
+    if (st != status::kOk) return st;
+  }
+  for (int32_t j = 0; j < n; ++j) {
+    for (int32_t i = 0; i < n; ++i) R[int64_t{j} * n + i] = i > j ? T(0.0) : W[int64_t{j} * ld + i];
+  }
+  for (int32_t j = 0; j < nrhs; ++j) {
+    std::memcpy(static_cast<void*>(y + int64_t{j} * n), Wb + int64_t{j} * ld,
+                static_cast<size_t>(n) * sizeof(T));
+  }
+  return status::kOk;
+}
+
 // Which singular values a solve keeps: those above max(m, n) S[0] e (relative),
 // or those above the midpoint threshold of TruncationThreshold for `keep`
 // components (absolute, no warning).
@@ -132,9 +189,9 @@ struct Cut {
 };
 
 // X = V diag(1/S) U^H B over the kept singular values of A = U diag(S) V^H. A
-// tall A is first factored as A = QR (column-major copy of A, Householder QR,
-// Q^H applied to B) and the SVD taken of R = U_R diag(S) V_R^H, whose singular
-// values are those of A; then X = V_R diag(1/S) U_R^H (Q^H B)[0:n]. Neither U
+// tall A is first factored as A = QR (Householder QR over row blocks, Q^H
+// applied to B on the way) and the SVD taken of R = U_R diag(S) V_R^H, whose
+// singular values are those of A; then X = V_R diag(1/S) U_R^H (Q^H B)[0:n]. Neither U
 // of the tall matrix nor the pseudo-inverse itself is ever formed. *kept is the
 // number of singular values kept. nrhs < 1 (possible from the complex solve
 // only) factors A for its statuses and writes nothing.
@@ -154,28 +211,18 @@ StatusCode SvdSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, 
   StatusCode st = status::kOk;
   if (tall) {
     if (HasNonFinite(A, mn) != 0) return status::kNonFinite;
-    // One block: A column-major (lda = m), tau (n), Q^H B column-major
-    // (m-by-nrhs) and R (n-by-n); y, the first n rows of Q^H B (n-by-nrhs,
-    // row-major), on its own.
-    const int64_t mr = int64_t{m} * nrhs;
     const int64_t nn = int64_t{n} * n;
-    qr = AllocWorkUninit<T>(static_cast<size_t>(mn + n + mr + nn));
-    y = AllocWorkUninit<T>(static_cast<size_t>(int64_t{n} * nrhs));
+    const int64_t nr = int64_t{n} * nrhs;
+    qr = AllocWorkUninit<T>(static_cast<size_t>(2 * nn + nr));
+    y = AllocWorkUninit<T>(static_cast<size_t>(nr));
     if (!qr || !y) return status::kNoMemory;
-    T* a_col = qr.get();
-    T* tau = a_col + mn;
-    T* c = tau + n;
-    T* r = c + mr;
-    TransposeTo(A, m, n, a_col, false);
-    st = lapack::Geqrf(m, n, a_col, m, tau);
+    T* r_col = qr.get();
+    T* r = r_col + nn;
+    T* y_col = r + nn;
+    st = FoldQr(A, m, n, B, nrhs, r_col, y_col);
     if (st != status::kOk) return st;
-    TransposeTo(B, m, nrhs, c, false);
-    st = lapack::ApplyQAdjoint(m, nrhs, n, a_col, m, tau, c, m);
-    if (st != status::kOk) return st;
-    for (int32_t i = 0; i < n; ++i) {
-      for (int32_t j = 0; j < n; ++j) r[int64_t{i} * n + j] = j < i ? T(0.0) : a_col[int64_t{j} * m + i];
-      for (int32_t j = 0; j < nrhs; ++j) y[int64_t{i} * nrhs + j] = c[int64_t{j} * m + i];
-    }
+    TransposeTo(r_col, n, n, r, false);
+    TransposeTo(y_col, nrhs, n, y.get(), false);
     st = SvdOf(r, n, n, f.U, f.S, f.V);
     base = y.get();
   } else {
@@ -280,17 +327,34 @@ StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double*
   if (UsesPinvPath(m, n)) return LeastSquaresPinvReal(A, m, n, B, nrhs, X, rcond);
 
   const int32_t k = std::min(m, n);
-  const int32_t ldb = std::max(m, n);
+  // A negative or NaN rcond selects machine epsilon; zero stays zero.
+  const double r = rcond >= 0.0 ? rcond : kEpsilon;
+  const double lapack_rcond = std::max(m, n) * r;
+  lapack_int rank = 0;
 
+  if (IsTall(m, n)) {
+    // DGELSD on R and (Q^H B)[0:n] of A = QR: the same singular values, rank
+    // and minimum-norm solution as on A itself, RCOND unchanged.
+    const int64_t nn = int64_t{n} * n;
+    WorkArray<double> small = AllocWorkUninit<double>(static_cast<size_t>(nn + int64_t{n} * nrhs + n));
+    if (!small) return status::kNoMemory;
+    double* R = small.get();
+    double* y = R + nn;
+    double* sv = y + int64_t{n} * nrhs;
+    StatusCode st = FoldQr(A, m, n, B, nrhs, R, y);
+    if (st != status::kOk) return st;
+    st = lapack::Gelsd(n, n, nrhs, R, n, y, n, sv, lapack_rcond, &rank);
+    if (st != status::kOk) return st;
+    for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(n, y + int64_t{j} * n, 1, X + j, nrhs);
+    return rank < k ? status::kRankDeficient : status::kOk;
+  }
+
+  const int32_t ldb = std::max(m, n);
   // Column-major right-hand sides; rows m..ldb-1 of each column are DGELSD's
   // room for the solution of a wide system.
   WorkArray<double> rhs = AllocWorkUninit<double>(static_cast<size_t>(int64_t{ldb} * nrhs));
   if (!rhs) return status::kNoMemory;
   for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(m, B + j, nrhs, rhs.get() + int64_t{j} * ldb, 1);
-
-  // A negative or NaN rcond selects machine epsilon; zero stays zero.
-  const double r = rcond >= 0.0 ? rcond : kEpsilon;
-  const double lapack_rcond = std::max(m, n) * r;
 
   // A^T row-major is A column-major with lda = m.
   WorkArray<double> a_col = AllocWorkUninit<double>(static_cast<size_t>(int64_t{m} * n));
@@ -299,7 +363,6 @@ StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double*
   WorkArray<double> sv = AllocWorkUninit<double>(static_cast<size_t>(k));
   if (!sv) return status::kNoMemory;
 
-  lapack_int rank = 0;
   StatusCode st = lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(),
                                 lapack_rcond, &rank);
   if (st != status::kOk) return st;
