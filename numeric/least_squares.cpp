@@ -400,6 +400,30 @@ double TruncationThreshold(const double* S, int32_t count, int32_t keep) {
   return 0.0;
 }
 
+template <typename T>
+StatusCode QrReduce(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* Y) {
+  if (m < 1 || n < 1 || nrhs < 1 || m < n) return status::kBadSize;
+  const int64_t nn = int64_t{n} * n;
+  const int64_t nr = int64_t{n} * nrhs;
+  WorkArray<T> col = AllocWorkUninit<T>(static_cast<size_t>(nn + nr));
+  if (!col) return status::kNoMemory;
+  const StatusCode st = FoldQr(A, m, n, B, nrhs, col.get(), col.get() + nn);
+  if (st != status::kOk) return st;
+  TransposeTo(col.get(), n, n, R, false);
+  TransposeTo(col.get() + nn, nrhs, n, Y, false);
+  return status::kOk;
+}
+
+StatusCode QrReduceReal(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
+                        double* R, double* Y) {
+  return QrReduce<double>(A, m, n, B, nrhs, R, Y);
+}
+
+StatusCode QrReduceComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
+                           int32_t nrhs, Complex* R, Complex* Y) {
+  return QrReduce<Complex>(A, m, n, B, nrhs, R, Y);
+}
+
 StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol, double* out) {
   return PseudoInverse<double>(A, m, n, tol, out);
 }
