@@ -22,32 +22,30 @@ using namespace twin;
 
 // ---- reduced pencil ---------------------------------------------------------------------
 // Only the leading mr x mr block of K is ever used (mr = min(M, r)), and each of
-// its elements depends only on the first mr singular triplets, so only that
-// block is formed: K_M = diag(1/s_M) U_M^H Y2 V_M. A tall Y1 (q >= 2L) is first
-// reduced to Y1 = Q R with Y2 carried along as Q^H Y2; R (L x L) has Y1's
-// singular values and R = U_R diag(s) V^H with U = Q U_R, so
-// U_M^H Y2 = U_R,M^H (Q^H Y2)[0:L] and no q x L factor is formed.
+// its elements depends only on the first mr singular triplets, so only those
+// are computed and only that block is formed: K_M = diag(1/s_M) U_M^H Y2 V_M. A tall Y1 (q >= 2L) is first
+// reduced to Y1 = Q R first; R (L x L) has Y1's singular values and right
+// singular vectors, and U_M = Y1 V_M diag(1/s_M), so no q x L factor is formed.
 template <typename T>
 StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K) {
   const int32_t q = n - L;
   const int32_t r = q < L ? q : L;
   const int32_t mr = M < r ? M : r;
   const bool tall = int64_t{q} >= 2 * int64_t{L};
-  const int32_t rows = tall ? L : q;  // rows of U and of the right-hand block
   const size_t qL = static_cast<size_t>(q) * static_cast<size_t>(L);
   const size_t LL = static_cast<size_t>(L) * static_cast<size_t>(L);
   auto y1 = AllocWorkUninit<T>(qL);
   auto y2 = AllocWorkUninit<T>(qL);
   auto rhs = AllocWorkUninit<T>(static_cast<size_t>(q));
-  auto reduced = AllocWorkUninit<T>(tall ? 2 * LL : qL);  // R and Q^H Y2, or Y1 copied
-  auto U = AllocWorkUninit<T>(static_cast<size_t>(rows) * static_cast<size_t>(r));
-  auto s = AllocWorkUninit<double>(static_cast<size_t>(r));
-  auto V = AllocWorkUninit<T>(static_cast<size_t>(L) * static_cast<size_t>(r));
-  auto Uh = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(rows));
+  auto reduced = AllocWorkUninit<T>(tall ? LL + L + 1 : 0);  // R, Q^H b (unused)
+  auto U = AllocWorkUninit<T>(static_cast<size_t>(q) * static_cast<size_t>(mr));
+  auto s = AllocWorkUninit<double>(static_cast<size_t>(mr));
+  auto V = AllocWorkUninit<T>(static_cast<size_t>(L) * static_cast<size_t>(mr));
+  auto Uh = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(q));
+  auto Ur = AllocWorkUninit<T>(tall ? static_cast<size_t>(L) * static_cast<size_t>(mr) : 0);
   auto T1 = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(L));
-  auto Vm = AllocWorkUninit<T>(static_cast<size_t>(L) * static_cast<size_t>(mr));
   auto full = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(mr));
-  if (!y1 || !y2 || !rhs || !reduced || !U || !s || !V || !Uh || !T1 || !Vm || !full) {
+  if (!y1 || !y2 || !rhs || !reduced || !U || !s || !V || !Uh || !Ur || !T1 || !full) {
     return status::kNoMemory;
   }
 
@@ -59,47 +57,33 @@ StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K) {
     for (int32_t j = 0; j < L; ++j) row[j] = x[i + L - j];
   }
 
-  // Economy SVD with U rows x r and V L x r on every path. A wide Y1 (q < L) is
-  // decomposed as Y1^H = U' S V'^H, so that Y1 = V' S U'^H: the factors swap.
-  const T* right = y2.get();  // the block U^H is applied to
+  // The leading mr singular triplets: U q x mr, V L x mr.
   if (tall) {
+    // Y1 = Q R (Q not kept); R has Y1's singular values and right vectors,
+    // and the left ones follow from them: U_M = Y1 V_M diag(1/s_M).
     T* R = reduced.get();
-    T* QhY2 = R + LL;
-    st = QrReduce(y1.get(), q, L, y2.get(), L, R, QhY2);
+    st = QrReduce(y1.get(), q, L, rhs.get(), 1, R, R + LL);
     if (st != status::kOk) return st;
-    st = Svd(R, L, L, U.get(), s.get(), V.get());
-    right = QhY2;
-  } else if (q < L) {
-    st = AdjointInto(y1.get(), q, L, reduced.get());
+    st = SvdLeading(R, L, L, mr, Ur.get(), s.get(), V.get());
     if (st != status::kOk) return st;
-    st = Svd(reduced.get(), L, q, V.get(), s.get(), U.get());
+    st = MatMul(y1.get(), V.get(), q, L, mr, U.get());
+    if (st != status::kOk) return st;
+    st = AdjointInto(U.get(), q, mr, Uh.get());
+    if (st != status::kOk) return st;
+    st = ScaleRowsByInverse(Uh.get(), mr, q, s.get());
   } else {
-    st = Svd(y1.get(), q, L, U.get(), s.get(), V.get());
+    st = SvdLeading(y1.get(), q, L, mr, U.get(), s.get(), V.get());
+    if (st != status::kOk) return st;
+    st = AdjointInto(U.get(), q, mr, Uh.get());
   }
   if (st != status::kOk) return st;
 
-  // diag(1/s) U^H over the first mr components, unguarded: a zero singular
-  // value yields infinities.
-  for (int32_t i = 0; i < mr; ++i) {
-    T* row = Uh.get() + static_cast<size_t>(i) * static_cast<size_t>(rows);
-    for (int32_t t = 0; t < rows; ++t) {
-      const T u = U[static_cast<size_t>(t) * static_cast<size_t>(r) + i];
-      if constexpr (kIsComplex<T>) {
-        row[t] = std::conj(u);
-      } else {
-        row[t] = u;
-      }
-    }
-  }
-  for (int32_t t = 0; t < L; ++t) {
-    std::memcpy(static_cast<void*>(Vm.get() + static_cast<size_t>(t) * mr),
-                V.get() + static_cast<size_t>(t) * r, static_cast<size_t>(mr) * sizeof(T));
-  }
-  st = ScaleRowsByInverse(Uh.get(), mr, rows, s.get());
+  // diag(1/s) U^H, unguarded: a zero singular value yields infinities.
+  st = ScaleRowsByInverse(Uh.get(), mr, q, s.get());
   if (st != status::kOk) return st;
-  st = MatMul(Uh.get(), right, mr, rows, L, T1.get());
+  st = MatMul(Uh.get(), y2.get(), mr, q, L, T1.get());
   if (st != status::kOk) return st;
-  st = MatMul(T1.get(), Vm.get(), mr, L, mr, full.get());
+  st = MatMul(T1.get(), V.get(), mr, L, mr, full.get());
   if (st != status::kOk) return st;
 
   if (r >= M) {

@@ -40,6 +40,15 @@ inline StatusCode Svd(const Complex* A, int32_t m, int32_t n, Complex* U, double
                       Complex* V) {
   return SvdComplex(A, m, n, U, S, V, 0);
 }
+// The leading `count` singular triplets.
+inline StatusCode SvdLeading(const double* A, int32_t m, int32_t n, int32_t count, double* U,
+                             double* S, double* V) {
+  return SvdLeadingReal(A, m, n, count, U, S, V);
+}
+inline StatusCode SvdLeading(const Complex* A, int32_t m, int32_t n, int32_t count, Complex* U,
+                             double* S, Complex* V) {
+  return SvdLeadingComplex(A, m, n, count, U, S, V);
+}
 // Pseudo-inverse with tolerance tol, over A's own storage.
 inline StatusCode PseudoInverse(double* A, int32_t m, int32_t n, double tol) {
   return PseudoInverseReal(A, m, n, tol, nullptr);

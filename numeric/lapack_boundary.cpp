@@ -2,13 +2,13 @@
 // driver, in one place.
 //
 // What INFO means, per driver:
-//   gesdd          any INFO != 0 (negative or positive alike)  -> -20062
+//   gesdd, gesvdx  any INFO != 0 (negative or positive alike)  -> -20062
 //   gelsd          INFO > 0 -> -20062; INFO < 0 is not treated separately: the
 //                  caller goes on with the rank LAPACK left
 //   geqrf, unmqr   INFO < 0 -> -20999 (they report nothing else)
 //   geev, syevd,   INFO < 0 -> -20999, INFO > 0 -> -20062
 //   heevd
-// Workspace: gesdd, gelsd, geqrf and unmqr take the size their own query
+// Workspace: gesdd, gesvdx, gelsd, geqrf and unmqr take the size their own query
 // (LWORK = -1) reports; the eigenvalue drivers are sized by fixed formulas and
 // never queried.
 
@@ -23,7 +23,7 @@
 
 namespace {
 
-enum class Driver { kGesdd, kGelsd, kGeqrf, kUnmqr, kGeev, kSyevd };
+enum class Driver { kGesdd, kGesvdx, kGelsd, kGeqrf, kUnmqr, kGeev, kSyevd };
 
 // ---- injection ------------------------------------------------------------------------
 std::atomic<int64_t> g_fail_at{0};
@@ -45,6 +45,7 @@ bool Injected(lapack_int* info) {
 StatusCode Failed(Driver driver, lapack_int info) {
   switch (driver) {
     case Driver::kGesdd:
+    case Driver::kGesvdx:
       return status::kNoConvergence;
     case Driver::kGelsd:
       return info > 0 ? status::kNoConvergence : status::kOk;
@@ -136,6 +137,53 @@ StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, Complex* a, lapack_int l
   LAPACK_zgesdd(&jobz, &m, &n, a, &lda, s, u, &ldu, vt, &ldvt, work.get(), &lwork, rwork.get(),
                 iwork.get(), &info);
   return Done(Driver::kGesdd, info);
+}
+
+// ---- gesvdx ---------------------------------------------------------------------------
+// IWORK: 12 min(m, n); ZGESVDX's RWORK: min(m, n) (min(m, n) 2 + 15 min(m, n)).
+StatusCode Gesvdx(lapack_int m, lapack_int n, double* a, lapack_int lda, lapack_int count,
+                  double* s, double* u, lapack_int ldu, double* vt, lapack_int ldvt) {
+  lapack_int info = 0;
+  if (Injected(&info)) return Failed(Driver::kGesvdx, info);
+  const int64_t k = std::min(m, n);
+  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(12 * k));
+  if (!iwork) return status::kNoMemory;
+  const char job = 'V', range = 'I';
+  const double vl = 0.0, vu = 0.0;
+  const lapack_int il = 1;
+  lapack_int ns = 0;
+  double query = 0.0;
+  lapack_int lwork = -1;
+  LAPACK_dgesvdx(&job, &job, &range, &m, &n, a, &lda, &vl, &vu, &il, &count, &ns, s, u, &ldu, vt,
+                 &ldvt, &query, &lwork, iwork.get(), &info);
+  WorkArray<double> work = QueriedWork(query, &lwork);
+  if (!work) return status::kNoMemory;
+  LAPACK_dgesvdx(&job, &job, &range, &m, &n, a, &lda, &vl, &vu, &il, &count, &ns, s, u, &ldu, vt,
+                 &ldvt, work.get(), &lwork, iwork.get(), &info);
+  return Done(Driver::kGesvdx, info);
+}
+
+StatusCode Gesvdx(lapack_int m, lapack_int n, Complex* a, lapack_int lda, lapack_int count,
+                  double* s, Complex* u, lapack_int ldu, Complex* vt, lapack_int ldvt) {
+  lapack_int info = 0;
+  if (Injected(&info)) return Failed(Driver::kGesvdx, info);
+  const int64_t k = std::min(m, n);
+  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(12 * k));
+  WorkArray<double> rwork = AllocWorkUninit<double>(static_cast<size_t>(k * (k * 2 + 15 * k)));
+  if (!iwork || !rwork) return status::kNoMemory;
+  const char job = 'V', range = 'I';
+  const double vl = 0.0, vu = 0.0;
+  const lapack_int il = 1;
+  lapack_int ns = 0;
+  Complex query;
+  lapack_int lwork = -1;
+  LAPACK_zgesvdx(&job, &job, &range, &m, &n, a, &lda, &vl, &vu, &il, &count, &ns, s, u, &ldu, vt,
+                 &ldvt, &query, &lwork, rwork.get(), iwork.get(), &info);
+  WorkArray<Complex> work = QueriedWork(query, &lwork);
+  if (!work) return status::kNoMemory;
+  LAPACK_zgesvdx(&job, &job, &range, &m, &n, a, &lda, &vl, &vu, &il, &count, &ns, s, u, &ldu, vt,
+                 &ldvt, work.get(), &lwork, rwork.get(), iwork.get(), &info);
+  return Done(Driver::kGesvdx, info);
 }
 
 // ---- gelsd ----------------------------------------------------------------------------

@@ -37,6 +37,13 @@ int32_t HasNonFiniteComplex(const Complex* x, int64_t n);
 [[nodiscard]] StatusCode SvdComplex(const Complex* A, int32_t m, int32_t n, Complex* U, double* S,
                                     Complex* V, int32_t full);
 
+// The `count` largest singular values (non-increasing) with their vectors only:
+// U m-by-count, V n-by-count, A = U diag(S) V^H + the rest. A untouched.
+[[nodiscard]] StatusCode SvdLeadingReal(const double* A, int32_t m, int32_t n, int32_t count,
+                                        double* U, double* S, double* V);
+[[nodiscard]] StatusCode SvdLeadingComplex(const Complex* A, int32_t m, int32_t n, int32_t count,
+                                           Complex* U, double* S, Complex* V);
+
 // ---- least squares and pseudo-inverse ------------------------------------------
 // X (n-by-nrhs) minimising ||A X - B||, minimum norm; 20001 when rank deficient.
 [[nodiscard]] StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double* B,

@@ -72,7 +72,44 @@ StatusCode Svd(const T* A, int32_t m, int32_t n, T* U, double* S, T* V, int32_t 
   return status::kOk;
 }
 
+// The leading `count` singular triplets only, by the same reading of the
+// row-major array as A^T: U (m-by-count) is the right factor of A^T read
+// row-major, V (n-by-count) the conjugate of its left factor.
+template <typename T>
+StatusCode SvdLeading(const T* A, int32_t m, int32_t n, int32_t count, T* U, double* S, T* V) {
+  if (m < 1 || n < 1 || count < 1 || count > std::min(m, n)) return status::kBadSize;
+  const int64_t mn = int64_t{m} * n;
+  if (HasNonFinite(A, mn) != 0) return status::kNonFinite;
+  const int64_t right_count = int64_t{count} * m;
+  const int64_t left_count = int64_t{count} * n;
+  const int32_t k = std::min(m, n);  // the driver's S has room for all of them
+  WorkArray<T> block = AllocWorkUninit<T>(static_cast<size_t>(mn + right_count + left_count + k));
+  if (!block) return status::kNoMemory;
+  T* at = block.get();
+  T* right = at + mn;
+  T* left = right + right_count;
+  double* sv = reinterpret_cast<double*>(left + left_count);
+  std::memcpy(static_cast<void*>(at), A, static_cast<size_t>(mn) * sizeof(T));
+  StatusCode st = lapack::Gesvdx(n, m, at, n, count, sv, left, n, right, count);
+  if (st != status::kOk) return st;
+  std::memcpy(S, sv, static_cast<size_t>(count) * sizeof(double));
+  st = AdjointInto(left, count, n, V);
+  if (st != status::kOk) return st;
+  std::memcpy(static_cast<void*>(U), right, static_cast<size_t>(right_count) * sizeof(T));
+  return status::kOk;
+}
+
 }  // namespace
+
+StatusCode SvdLeadingReal(const double* A, int32_t m, int32_t n, int32_t count, double* U,
+                          double* S, double* V) {
+  return SvdLeading<double>(A, m, n, count, U, S, V);
+}
+
+StatusCode SvdLeadingComplex(const Complex* A, int32_t m, int32_t n, int32_t count, Complex* U,
+                             double* S, Complex* V) {
+  return SvdLeading<Complex>(A, m, n, count, U, S, V);
+}
 
 StatusCode SvdReal(const double* A, int32_t m, int32_t n, double* U, double* S, double* V,
                    int32_t full) {
