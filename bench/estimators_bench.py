@@ -212,23 +212,27 @@ def run(bench, lib, quick, json_out):
     print(f"libqdm BLAS: {doc['blas']}")
     print(f"numpy {np.__version__}, BLAS: {numpy_blas()}")
     print()
-    print("| export | n | qdm ms | numpy ms | numpy/qdm | check |")
-    print("|---|---:|---:|---:|---:|---:|")
+    print("| export | n | qdm ms | numpy ms | numpy/qdm | check | numpy lstsq alone ms |")
+    print("|---|---:|---:|---:|---:|---:|---:|")
     for case in doc["cases"]:
         x = records[case["record"]]
         n = len(x)
         qdm_ms = 1e3 * case["seconds"]
         eq = equivalent(case, x)
         if case["status"] != 0:
-            print(f"| {case['name']} | {n} | {qdm_ms:.3f} | | | status {case['status']} |")
+            print(f"| {case['name']} | {n} | {qdm_ms:.3f} | | | status {case['status']} | |")
             continue
         if eq is None:
-            print(f"| {case['name']} | {n} | {qdm_ms:.3f} | - | - | - |")
+            print(f"| {case['name']} | {n} | {qdm_ms:.3f} | - | - | - | |")
             continue
         fn, check = eq
         np_ms = 1e3 * best_time(fn, quick)
+        alone = ""
+        if case["name"].endswith("CovarianceH"):
+            A, b = forward(x, int(case["params"]["p"]))
+            alone = f"{1e3 * best_time(lambda: np.linalg.lstsq(A, b, rcond=None), quick):.3f}"
         print(f"| {case['name']} | {n} | {qdm_ms:.3f} | {np_ms:.3f} | {np_ms / qdm_ms:.2f} "
-              f"| {check():.1e} |")
+              f"| {check():.1e} | {alone} |")
 
 
 def numpy_blas():
