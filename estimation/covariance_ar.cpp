@@ -30,15 +30,15 @@ StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, doub
   const size_t cols = static_cast<size_t>(p);
   const size_t terms = cols + 1;
 
-  WorkArray<T> b = AllocWork<T>(rows);
+  WorkArray<T> b = AllocWorkUninit<T>(rows);
   if (!b) return status::kNoMemory;
-  WorkArray<T> A = AllocWork<T>(rows * cols);
+  WorkArray<T> A = AllocWorkUninit<T>(rows * cols);
   if (!A) return status::kNoMemory;
   WorkArray<T> w = AllocWork<T>(cols);
   if (!w) return status::kNoMemory;
-  WorkArray<T> Aw = AllocWork<T>(rows);
+  WorkArray<T> Aw = AllocWorkUninit<T>(rows);
   if (!Aw) return status::kNoMemory;
-  WorkArray<T> e = AllocWork<T>(rows);
+  WorkArray<T> e = AllocWorkUninit<T>(rows);
   if (!e) return status::kNoMemory;
   // Root-finder input: the real estimator reverses into a real vector and
   // widens it; the complex one reverses straight into the complex vector.

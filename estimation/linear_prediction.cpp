@@ -18,7 +18,7 @@ StatusCode BuildForwardMatrix(const T* x, int32_t n, int32_t p, T* b, T* A) {
   const ptrdiff_t rows = static_cast<ptrdiff_t>(n) - p;
   const ptrdiff_t cols = p;
   if (rows <= 0 || cols <= 0) return status::kOk;
-  std::memset(static_cast<void*>(A), 0, static_cast<size_t>(rows * cols) * sizeof(T));
+  // Every element is written below: no clearing pass first.
   for (ptrdiff_t i = 0; i < rows; ++i) {
     b[i] = x[i + cols];
     T* row = A + i * cols;
@@ -33,7 +33,7 @@ StatusCode BuildBackwardMatrix(const T* x, int32_t n, int32_t p, T* b, T* A) {
   const ptrdiff_t rows = static_cast<ptrdiff_t>(n) - p;
   const ptrdiff_t cols = p;
   if (rows <= 0 || cols <= 0) return status::kOk;
-  std::memset(static_cast<void*>(A), 0, static_cast<size_t>(rows * cols) * sizeof(T));
+  // Every element is written below: no clearing pass first.
   for (ptrdiff_t i = 0; i < rows; ++i) {
     b[i] = x[i];
     T* row = A + i * cols;

@@ -6,6 +6,7 @@
 // With Y1 = U diag(s) V^H (r = min(q, L) components), the reduced pencil is
 //   K = diag(1/s) U^H Y2 V   (r x r),
 // whose eigenvalues are the signal poles when Y1 has rank >= M.
+#include <complex>
 #include <cstddef>
 #include <cstring>
 #include <type_traits>
@@ -20,71 +21,79 @@ namespace {
 using namespace twin;
 
 // ---- reduced pencil ---------------------------------------------------------------------
+// Only the leading mr x mr block of K is ever used (mr = min(M, r)), and each of
+// its elements depends only on the first mr singular triplets, so only those
+// are computed and only that block is formed: K_M = diag(1/s_M) U_M^H Y2 V_M. A tall Y1 (q >= 2L) is first
+// reduced to Y1 = Q R first; R (L x L) has Y1's singular values and right
+// singular vectors, and U_M = Y1 V_M diag(1/s_M), so no q x L factor is formed.
 template <typename T>
 StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K) {
   const int32_t q = n - L;
   const int32_t r = q < L ? q : L;
+  const int32_t mr = M < r ? M : r;
+  const bool tall = int64_t{q} >= 2 * int64_t{L};
   const size_t qL = static_cast<size_t>(q) * static_cast<size_t>(L);
-  auto y1 = AllocWork<T>(qL);
-  auto y2 = AllocWork<T>(qL);
-  auto backward = AllocWork<T>(qL);
-  auto rhs = AllocWork<T>(static_cast<size_t>(q));
-  auto y1copy = AllocWork<T>(qL);
-  auto U = AllocWork<T>(static_cast<size_t>(q) * static_cast<size_t>(r));
-  auto s = AllocWork<double>(static_cast<size_t>(r));
-  auto V = AllocWork<T>(static_cast<size_t>(L) * static_cast<size_t>(r));
-  auto Uh = AllocWork<T>(static_cast<size_t>(r) * static_cast<size_t>(q));
-  auto T1 = AllocWork<T>(static_cast<size_t>(r) * static_cast<size_t>(L));
-  auto full = AllocWork<T>(static_cast<size_t>(r) * static_cast<size_t>(r));
-  if (!y1 || !y2 || !backward || !rhs || !y1copy || !U || !s || !V || !Uh || !T1 || !full) {
+  const size_t LL = static_cast<size_t>(L) * static_cast<size_t>(L);
+  auto y1 = AllocWorkUninit<T>(qL);
+  auto y2 = AllocWorkUninit<T>(qL);
+  auto rhs = AllocWorkUninit<T>(static_cast<size_t>(q));
+  auto reduced = AllocWorkUninit<T>(tall ? LL + L + 1 : 0);  // R, Q^H b (unused)
+  auto U = AllocWorkUninit<T>(static_cast<size_t>(q) * static_cast<size_t>(mr));
+  auto s = AllocWorkUninit<double>(static_cast<size_t>(mr));
+  auto V = AllocWorkUninit<T>(static_cast<size_t>(L) * static_cast<size_t>(mr));
+  auto Uh = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(q));
+  auto Ur = AllocWorkUninit<T>(tall ? static_cast<size_t>(L) * static_cast<size_t>(mr) : 0);
+  auto T1 = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(L));
+  auto full = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(mr));
+  if (!y1 || !y2 || !rhs || !reduced || !U || !s || !V || !Uh || !Ur || !T1 || !full) {
     return status::kNoMemory;
   }
 
-  // Y1 is the forward prediction block; Y2 the backward block with each row reversed.
+  // Y1 is the forward prediction block; Y2 is Y1 advanced by one sample.
   StatusCode st = BuildForward(x, n, L, rhs.get(), y1.get());
   if (st != status::kOk) return st;
-  st = BuildBackward(x, n, L, rhs.get(), backward.get());
-  if (st != status::kOk) return st;
   for (int32_t i = 0; i < q; ++i) {
-    const size_t row = static_cast<size_t>(i) * static_cast<size_t>(L);
-    st = Reverse(backward.get() + row, y2.get() + row, L);
-    if (st != status::kOk) return st;
+    T* row = y2.get() + static_cast<size_t>(i) * static_cast<size_t>(L);
+    for (int32_t j = 0; j < L; ++j) row[j] = x[i + L - j];
   }
 
-  // Economy SVD with U q x r and V L x r on both paths. A wide Y1 (q < L) is
-  // decomposed as Y1^H = U' S V'^H, so that Y1 = V' S U'^H: the factors swap.
-  if (q < L) {
-    st = AdjointInto(y1.get(), q, L, y1copy.get());
+  // The leading mr singular triplets: U q x mr, V L x mr.
+  if (tall) {
+    // Y1 = Q R (Q not kept); R has Y1's singular values and right vectors,
+    // and the left ones follow from them: U_M = Y1 V_M diag(1/s_M).
+    T* R = reduced.get();
+    st = QrReduce(y1.get(), q, L, rhs.get(), 1, R, R + LL);
     if (st != status::kOk) return st;
-    st = Svd(y1copy.get(), L, q, V.get(), s.get(), U.get());
+    st = SvdLeading(R, L, L, mr, Ur.get(), s.get(), V.get());
+    if (st != status::kOk) return st;
+    st = MatMul(y1.get(), V.get(), q, L, mr, U.get());
+    if (st != status::kOk) return st;
+    st = AdjointInto(U.get(), q, mr, Uh.get());
+    if (st != status::kOk) return st;
+    st = ScaleRowsByInverse(Uh.get(), mr, q, s.get());
   } else {
-    std::memcpy(y1copy.get(), y1.get(), qL * sizeof(T));
-    st = Svd(y1copy.get(), q, L, U.get(), s.get(), V.get());
+    st = SvdLeading(y1.get(), q, L, mr, U.get(), s.get(), V.get());
+    if (st != status::kOk) return st;
+    st = AdjointInto(U.get(), q, mr, Uh.get());
   }
   if (st != status::kOk) return st;
 
   // diag(1/s) U^H, unguarded: a zero singular value yields infinities.
-  st = AdjointInto(U.get(), q, r, Uh.get());
+  st = ScaleRowsByInverse(Uh.get(), mr, q, s.get());
   if (st != status::kOk) return st;
-  st = ScaleRowsByInverse(Uh.get(), r, q, s.get());
+  st = MatMul(Uh.get(), y2.get(), mr, q, L, T1.get());
   if (st != status::kOk) return st;
-  st = MatMul(Uh.get(), y2.get(), r, q, L, T1.get());
-  if (st != status::kOk) return st;
-  st = MatMul(T1.get(), V.get(), r, L, r, full.get());
+  st = MatMul(T1.get(), V.get(), mr, L, mr, full.get());
   if (st != status::kOk) return st;
 
   if (r >= M) {
     // Leading M x M block, row stride M.
-    for (int32_t i = 0; i < M; ++i) {
-      std::memcpy(K + static_cast<size_t>(i) * static_cast<size_t>(M),
-                  full.get() + static_cast<size_t>(i) * static_cast<size_t>(r),
-                  static_cast<size_t>(M) * sizeof(T));
-    }
+    std::memcpy(static_cast<void*>(K), full.get(),
+                static_cast<size_t>(M) * static_cast<size_t>(M) * sizeof(T));
   } else {
-    // Fewer components than modes: the whole r x r matrix, row stride r. The copy
-    // runs once per row of the pencil, each time to the same place.
-    const size_t whole = static_cast<size_t>(r) * static_cast<size_t>(r);
-    for (int32_t pass = 0; pass < r; ++pass) std::memcpy(K, full.get(), whole * sizeof(T));
+    // Fewer components than modes: the whole r x r matrix, row stride r.
+    std::memcpy(static_cast<void*>(K), full.get(),
+                static_cast<size_t>(r) * static_cast<size_t>(r) * sizeof(T));
   }
   return status::kOk;
 }

@@ -30,13 +30,13 @@ StatusCode ModeAmplitudes(const T* x, int32_t n, const Complex* z, int32_t k, Co
   const size_t cols = static_cast<size_t>(k);
   const size_t cells = (rows != 0 && cols > SIZE_MAX / rows) ? SIZE_MAX : rows * cols;
 
-  WorkArray<Complex> V = AllocWork<Complex>(cells);
+  WorkArray<Complex> V = AllocWorkUninit<Complex>(cells);
   if (!V) return status::kNoMemory;
-  WorkArray<Complex> data = AllocWork<Complex>(rows);
+  WorkArray<Complex> data = AllocWorkUninit<Complex>(rows);
   if (!data) return status::kNoMemory;
-  WorkArray<Complex> model = AllocWork<Complex>(rows);
+  WorkArray<Complex> model = AllocWorkUninit<Complex>(rows);
   if (!model) return status::kNoMemory;
-  WorkArray<Complex> residual = AllocWork<Complex>(rows);
+  WorkArray<Complex> residual = AllocWorkUninit<Complex>(rows);
   if (!residual) return status::kNoMemory;
 
   // Vandermonde matrix V[t][i] = z_i^t by running products down each column:

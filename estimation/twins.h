@@ -40,12 +40,39 @@ inline StatusCode Svd(const Complex* A, int32_t m, int32_t n, Complex* U, double
                       Complex* V) {
   return SvdComplex(A, m, n, U, S, V, 0);
 }
+// The leading `count` singular triplets.
+inline StatusCode SvdLeading(const double* A, int32_t m, int32_t n, int32_t count, double* U,
+                             double* S, double* V) {
+  return SvdLeadingReal(A, m, n, count, U, S, V);
+}
+inline StatusCode SvdLeading(const Complex* A, int32_t m, int32_t n, int32_t count, Complex* U,
+                             double* S, Complex* V) {
+  return SvdLeadingComplex(A, m, n, count, U, S, V);
+}
 // Pseudo-inverse with tolerance tol, over A's own storage.
 inline StatusCode PseudoInverse(double* A, int32_t m, int32_t n, double tol) {
   return PseudoInverseReal(A, m, n, tol, nullptr);
 }
 inline StatusCode PseudoInverse(Complex* A, int32_t m, int32_t n, double tol) {
   return PseudoInverseComplex(A, m, n, tol, nullptr);
+}
+// X = pinv(A) B over the `keep` strongest singular components of A.
+inline StatusCode TruncatedSolve(const double* A, int32_t m, int32_t n, const double* B,
+                                 double* X, int32_t keep) {
+  return LeastSquaresTruncatedReal(A, m, n, B, 1, X, keep);
+}
+inline StatusCode TruncatedSolve(const Complex* A, int32_t m, int32_t n, const Complex* B,
+                                 Complex* X, int32_t keep) {
+  return LeastSquaresTruncatedComplex(A, m, n, B, 1, X, keep);
+}
+// R and (Q^H B)[0:n] of A = QR.
+inline StatusCode QrReduce(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
+                           double* R, double* Y) {
+  return QrReduceReal(A, m, n, B, nrhs, R, Y);
+}
+inline StatusCode QrReduce(const Complex* A, int32_t m, int32_t n, const Complex* B,
+                           int32_t nrhs, Complex* R, Complex* Y) {
+  return QrReduceComplex(A, m, n, B, nrhs, R, Y);
 }
 // Eigenvalues only of a general matrix; the matrix is left as it is.
 inline StatusCode EigenvaluesOf(double* A, int32_t n, Complex* eigenvalues) {

@@ -9,15 +9,13 @@
 // symmetric solver sees A^T = A itself; the Hermitian one sees A^T = conj(A),
 // whose eigenvectors are the conjugates of A's.
 //
-// Workspaces are sized by formula, never by a query.
+// The drivers, their workspaces and their INFO mapping are in lapack_boundary.cpp.
 
-#include <cmath>
 #include <cstdint>
 #include <cstring>
-#include <limits>
 #include <type_traits>
 
-#include "numeric/lapack_shims.h"
+#include "numeric/lapack_boundary.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
@@ -26,36 +24,6 @@ namespace {
 // Flips the sign of the imaginary part of every element (conjugation by sign bit).
 void ConjugateInPlace(Complex* x, size_t count) {
   for (size_t i = 0; i < count; ++i) x[i] = Complex(x[i].real(), -x[i].imag());
-}
-
-StatusCode MapInfo(lapack_int info) {
-  if (info < 0) return status::kIllegalArgument;
-  if (info > 0) return status::kNoConvergence;
-  return status::kOk;
-}
-
-// Divide-and-conquer symmetric / Hermitian drivers. rwork is unused by the real one.
-void SymmetricEig(char jobz, lapack_int n, double* a, double* w, double* work, lapack_int lwork,
-                  double* /*rwork*/, lapack_int /*lrwork*/, lapack_int* iwork, lapack_int liwork,
-                  lapack_int* info) {
-  const char uplo = 'U';
-  LAPACK_dsyevd(&jobz, &uplo, &n, a, &n, w, work, &lwork, iwork, &liwork, info);
-}
-void SymmetricEig(char jobz, lapack_int n, Complex* a, double* w, Complex* work, lapack_int lwork,
-                  double* rwork, lapack_int lrwork, lapack_int* iwork, lapack_int liwork,
-                  lapack_int* info) {
-  const char uplo = 'U';
-  LAPACK_zheevd(&jobz, &uplo, &n, a, &n, w, work, &lwork, rwork, &lrwork, iwork, &liwork, info);
-}
-
-// n * trunc(2 (log2 n + 1) + c1 n + c0) + 1, with log2 n = ln n / ln 2; -1 when
-// the size does not fit LAPACK's 32-bit integer.
-int64_t LogWorkSize(int32_t n, double c1, double c0) {
-  const double log2n = std::log(static_cast<double>(n)) / std::log(2.0);
-  const double per_column = std::trunc(2.0 * (log2n + 1.0) + c1 * n + c0);
-  const double size = static_cast<double>(n) * per_column + 1.0;
-  if (size > static_cast<double>(std::numeric_limits<lapack_int>::max())) return -1;
-  return static_cast<int64_t>(size);
 }
 
 // Shared body of EigSymReal and EigHermitianComplex. `dest` receives the
@@ -72,28 +40,10 @@ StatusCode EigSymmetric(const T* A, int32_t n, int32_t wantVectors, double* eige
     if (HasNonFiniteReal(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
   }
 
-  // Sized for JOBZ = 'V' whatever is asked. DSYEVD needs WORK >= 1 + 6n + 2n^2;
-  // ZHEEVD needs WORK >= 2n + n^2 and RWORK >= 1 + 5n + 2n^2. Both need
-  // IWORK >= 3 + 5n.
-  const int64_t lwork = kComplex ? LogWorkSize(n, 1.0, 0.0) : LogWorkSize(n, 3.0, 5.0);
-  const int64_t lrwork = kComplex ? LogWorkSize(n, 3.0, 5.0) : 0;
-  const int64_t liwork = 5 * static_cast<int64_t>(n) + 3;
-  if (lwork < 0 || lrwork < 0 || liwork > std::numeric_limits<lapack_int>::max()) {
-    return status::kNoMemory;
-  }
-  WorkArray<T> a = AllocWork<T>(nn);
-  WorkArray<T> work = AllocWork<T>(static_cast<size_t>(lwork));
-  WorkArray<double> rwork;
-  if constexpr (kComplex) rwork = AllocWork<double>(static_cast<size_t>(lrwork));
-  WorkArray<lapack_int> iwork = AllocWork<lapack_int>(static_cast<size_t>(liwork));
-  if (!a || !work || (kComplex && !rwork) || !iwork) return status::kNoMemory;
-
-  std::memcpy(a.get(), A, nn * sizeof(T));
-  lapack_int info = 0;
-  SymmetricEig(wantVectors == 1 ? 'V' : 'N', n, a.get(), eigenvalues, work.get(),
-               static_cast<lapack_int>(lwork), rwork.get(), static_cast<lapack_int>(lrwork),
-               iwork.get(), static_cast<lapack_int>(liwork), &info);
-  const StatusCode st = MapInfo(info);
+  WorkArray<T> a = AllocWorkUninit<T>(nn);
+  if (!a) return status::kNoMemory;
+  std::memcpy(static_cast<void*>(a.get()), A, nn * sizeof(T));
+  const StatusCode st = lapack::Syevd(wantVectors == 1 ? 'V' : 'N', n, a.get(), eigenvalues);
   if (st != status::kOk) return st;
 
   if (wantVectors == 1 && dest != nullptr) {
@@ -119,30 +69,23 @@ StatusCode EigGeneralReal(const double* A, int32_t n, int32_t wantVectors, Compl
   const size_t nn = static_cast<size_t>(n) * static_cast<size_t>(n);
   if (HasNonFiniteReal(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
 
-  // One block: WORK (4n), the copy of A (n*n), WR (n), WI (n); VL on its own.
+  // One block: WORK, the copy of A (n*n), WR (n), WI (n); VL on its own.
   const size_t nz = static_cast<size_t>(n);
-  WorkArray<double> block = AllocWork<double>(nn + 6 * nz);
+  const size_t lwork = static_cast<size_t>(lapack::GeevWorkSize(n, false));
+  WorkArray<double> block = AllocWorkUninit<double>(nn + lwork + 2 * nz);
   if (!block) return status::kNoMemory;
   WorkArray<double> vl;
   if (wantVectors == 1) {
-    vl = AllocWork<double>(nn);
+    vl = AllocWorkUninit<double>(nn);
     if (!vl) return status::kNoMemory;
   }
   double* work = block.get();
-  double* a = work + 4 * nz;
+  double* a = work + lwork;
   double* wr = a + nn;
   double* wi = wr + nz;
   std::memcpy(a, A, nn * sizeof(double));
 
-  // LWORK = 4n is DGEEV's documented minimum when vectors are computed.
-  const char jobvl = wantVectors == 1 ? 'V' : 'N';
-  const char jobvr = 'N';
-  const lapack_int lwork = 4 * n;
-  double unused = 0.0;
-  lapack_int info = 0;
-  LAPACK_dgeev(&jobvl, &jobvr, &n, a, &n, wr, wi, vl ? vl.get() : &unused, &n, &unused, &n, work,
-               &lwork, &info);
-  const StatusCode st = MapInfo(info);
+  const StatusCode st = lapack::Geev(wantVectors == 1 ? 'V' : 'N', n, a, wr, wi, vl.get(), work);
   if (st != status::kOk) return st;
 
   double* values = reinterpret_cast<double*>(eigenvalues);
@@ -178,29 +121,23 @@ StatusCode EigGeneralComplex(Complex* A, int32_t n, int32_t wantVectors, Complex
   const size_t nn = static_cast<size_t>(n) * static_cast<size_t>(n);
   if (HasNonFiniteComplex(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
 
-  // One complex block: the copy of A (n*n), then WORK (2n); RWORK (2n); VL.
+  // One complex block: the copy of A (n*n), then WORK; RWORK (2n); VL.
   const size_t nz = static_cast<size_t>(n);
-  WorkArray<Complex> block = AllocWork<Complex>(nn + 2 * nz);
-  WorkArray<double> rwork = AllocWork<double>(2 * nz);
+  WorkArray<Complex> block =
+      AllocWorkUninit<Complex>(nn + static_cast<size_t>(lapack::GeevWorkSize(n, true)));
+  WorkArray<double> rwork = AllocWorkUninit<double>(2 * nz);
   if (!block || !rwork) return status::kNoMemory;
   WorkArray<Complex> vl;
   if (wantVectors == 1) {
-    vl = AllocWork<Complex>(nn);
+    vl = AllocWorkUninit<Complex>(nn);
     if (!vl) return status::kNoMemory;
   }
   Complex* a = block.get();
   Complex* work = a + nn;
   std::memcpy(a, A, nn * sizeof(Complex));
 
-  // LWORK = 2n is ZGEEV's documented minimum.
-  const char jobvl = wantVectors == 1 ? 'V' : 'N';
-  const char jobvr = 'N';
-  const lapack_int lwork = 2 * n;
-  Complex unused;
-  lapack_int info = 0;
-  LAPACK_zgeev(&jobvl, &jobvr, &n, a, &n, eigenvalues, vl ? vl.get() : &unused, &n, &unused, &n,
-               work, &lwork, rwork.get(), &info);
-  const StatusCode st = MapInfo(info);
+  const StatusCode st = lapack::Geev(wantVectors == 1 ? 'V' : 'N', n, a, eigenvalues, vl.get(),
+                                     work, rwork.get());
   if (st != status::kOk) return st;
 
   if (wantVectors == 1) {

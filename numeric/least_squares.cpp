@@ -1,7 +1,8 @@
 // Least-squares solves and pseudo-inverses. The real solve runs DGELSD except for
-// very wide systems, which go through the SVD pseudo-inverse; the pseudo-inverse
-// solves and the pseudo-inverses are built on the economy SVD A = U diag(S) V^H
-// as pinv(A) = V diag(1/S) U^H over the singular values above a threshold.
+// very wide systems, which go through the SVD pseudo-inverse solve. The
+// pseudo-inverse solves apply pinv(A) = V diag(1/S) U^H over the singular values
+// above a threshold without forming it, tall systems through a QR factorization
+// first; the pseudo-inverses are formed from the economy SVD A = U diag(S) V^H.
 
 #include <algorithm>
 #include <cmath>
@@ -9,7 +10,7 @@
 #include <type_traits>
 
 #include "core/call_record.h"
-#include "numeric/lapack_shims.h"
+#include "numeric/lapack_boundary.h"
 #include "numeric/mat_mul.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
@@ -109,6 +110,151 @@ StatusCode FormPinv(Factors<T>& f, int32_t m, int32_t n, int32_t k, T* P) {
   return MatMul<T>(f.V, f.U, n, k, m, P, false);
 }
 
+template <typename T>
+int32_t HasNonFinite(const T* x, int64_t n) {
+  if constexpr (kIsComplex<T>) {
+    return HasNonFiniteComplex(x, n);
+  } else {
+    return HasNonFiniteReal(x, n);
+  }
+}
+
+// A system with at least this many rows per column is solved through a QR
+// factorization first: the SVD is then taken of the small n-by-n R only.
+bool IsTall(int32_t m, int32_t n) { return int64_t{m} >= 2 * int64_t{n}; }
+
+// Rows of A per QR step of a tall solve: about 512 KiB of W = [R; block], and
+// at least 2n rows so that R's own rows stay a small part of each step; the
+// whole of A when it is no taller than that.
+template <typename T>
+int32_t BlockRows(int32_t m, int32_t n) {
+  const int64_t fit = (int64_t{512} * 1024 / static_cast<int64_t>(sizeof(T))) / n - n;
+  const int64_t c = std::max<int64_t>(fit, 2 * int64_t{n});
+  return static_cast<int32_t>(std::min<int64_t>(c, m));
+}
+
+// The tall A (m-by-n, m >= 2n) and B (m-by-nrhs) folded into R (n-by-n, upper
+// triangular with zeros below) and y = (Q^H B)[0:n] (n-by-nrhs), both
+// column-major with leading dimension n, where A = QR. Row blocks of A are
+// folded in one at a time: W holds [R; next block] column-major (ld = n + c)
+// and is factored by Householder QR, and the same reflectors are applied to
+// [y; next block of B] in Wb; R and y are then the leading n rows of W and Wb.
+// A block of c rows keeps W in cache, where the level-2 panel steps of the QR
+// run at full speed, and no column-major copy of the whole of A is made.
+template <typename T>
+StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* y) {
+  const int32_t c = BlockRows<T>(m, n);
+  const int32_t ld = n + c;
+  const int64_t w_count = int64_t{ld} * n;
+  const int64_t wb_count = int64_t{ld} * nrhs;
+  WorkArray<T> block = AllocWorkUninit<T>(static_cast<size_t>(w_count + n + wb_count));
+  if (!block) return status::kNoMemory;
+  T* W = block.get();
+  T* tau = W + w_count;
+  T* Wb = tau + n;
+  for (int32_t r0 = 0; r0 < m; r0 += c) {
+    const int32_t top = r0 == 0 ? 0 : n;  // rows of R above the block
+    const int32_t h = top + std::min(c, m - r0);
+    // R is the upper triangle the last step left; clear the reflectors below it.
+    for (int32_t j = 0; j < top; ++j) {
+      for (int32_t i = j + 1; i < top; ++i) W[int64_t{j} * ld + i] = T(0.0);
+    }
+    for (int32_t i = top; i < h; ++i) {
+      const T* a_row = A + int64_t{r0 + i - top} * n;
+      for (int32_t j = 0; j < n; ++j) W[int64_t{j} * ld + i] = a_row[j];
+      const T* b_row = B + int64_t{r0 + i - top} * nrhs;
+      for (int32_t j = 0; j < nrhs; ++j) Wb[int64_t{j} * ld + i] = b_row[j];
+    }
+    StatusCode st = lapack::Geqrf(h, n, W, ld, tau);
+    if (st != status::kOk) return st;
+    st = lapack::ApplyQAdjoint(h, nrhs, n, W, ld, tau, Wb, ld);
+    if (st != status::kOk) return st;
+  }
+  for (int32_t j = 0; j < n; ++j) {
+    for (int32_t i = 0; i < n; ++i) R[int64_t{j} * n + i] = i > j ? T(0.0) : W[int64_t{j} * ld + i];
+  }
+  for (int32_t j = 0; j < nrhs; ++j) {
+    std::memcpy(static_cast<void*>(y + int64_t{j} * n), Wb + int64_t{j} * ld,
+                static_cast<size_t>(n) * sizeof(T));
+  }
+  return status::kOk;
+}
+
+// Which singular values a solve keeps: those above max(m, n) S[0] e (relative),
+// or those above the midpoint threshold of TruncationThreshold for `keep`
+// components (absolute, no warning).
+struct Cut {
+  bool relative;
+  double e;
+  int32_t keep;
+};
+
+// X = V diag(1/S) U^H B over the kept singular values of A = U diag(S) V^H. A
+// tall A is first factored as A = QR (Householder QR over row blocks, Q^H
+// applied to B on the way) and the SVD taken of R = U_R diag(S) V_R^H, whose
+// singular values are those of A; then X = V_R diag(1/S) U_R^H (Q^H B)[0:n]. Neither U
+// of the tall matrix nor the pseudo-inverse itself is ever formed. *kept is the
+// number of singular values kept. nrhs < 1 (possible from the complex solve
+// only) factors A for its statuses and writes nothing.
+template <typename T>
+StatusCode SvdSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X, Cut cut,
+                    int32_t* kept) {
+  const int32_t k = std::min(m, n);
+  const bool tall = IsTall(m, n) && nrhs > 0;
+  const int32_t rows = tall ? n : m;  // rows of the matrix decomposed
+  const int64_t mn = int64_t{m} * n;
+
+  Factors<T> f;
+  if (!f.Allocate(rows, n, k)) return status::kNoMemory;
+  WorkArray<T> qr;
+  WorkArray<T> y;
+  const T* base = B;  // the right-hand sides U^H is applied to
+  StatusCode st = status::kOk;
+  if (tall) {
+    if (HasNonFinite(A, mn) != 0) return status::kNonFinite;
+    const int64_t nn = int64_t{n} * n;
+    const int64_t nr = int64_t{n} * nrhs;
+    qr = AllocWorkUninit<T>(static_cast<size_t>(2 * nn + nr));
+    y = AllocWorkUninit<T>(static_cast<size_t>(nr));
+    if (!qr || !y) return status::kNoMemory;
+    T* r_col = qr.get();
+    T* r = r_col + nn;
+    T* y_col = r + nn;
+    st = FoldQr(A, m, n, B, nrhs, r_col, y_col);
+    if (st != status::kOk) return st;
+    TransposeTo(r_col, n, n, r, false);
+    TransposeTo(y_col, nrhs, n, y.get(), false);
+    st = SvdOf(r, n, n, f.U, f.S, f.V);
+    base = y.get();
+  } else {
+    st = SvdOf(A, m, n, f.U, f.S, f.V);
+  }
+  if (st != status::kOk) return st;
+
+  const double threshold = cut.relative ? std::max(m, n) * f.S[0] * cut.e
+                                        : TruncationThreshold(f.S, k, cut.keep);
+  int32_t count = 0;
+  for (int32_t i = 0; i < k; ++i) count += f.S[i] > threshold ? 1 : 0;
+  *kept = count;
+  if (nrhs < 1) return nrhs < 0 ? status::kNegativeDim : status::kOk;
+
+  // z = diag(1/S) U^H base (k-by-nrhs), rows of dropped values zero; then V z.
+  const int64_t kr = int64_t{k} * nrhs;
+  WorkArray<T> z = AllocWorkUninit<T>(static_cast<size_t>(kr + int64_t{n} * nrhs));
+  if (!z) return status::kNoMemory;
+  lapack::Gemm(k, nrhs, rows, f.U, base, z.get(), true);
+  for (int32_t i = 0; i < k; ++i) {
+    const bool keep = f.S[i] > threshold;
+    const double factor = keep ? 1.0 / f.S[i] : 0.0;
+    T* row = z.get() + int64_t{i} * nrhs;
+    for (int32_t j = 0; j < nrhs; ++j) row[j] = keep ? row[j] * factor : T(0.0);
+  }
+  T* solution = z.get() + kr;
+  lapack::Gemm(n, nrhs, k, f.V, z.get(), solution);
+  std::memcpy(static_cast<void*>(X), solution, static_cast<size_t>(int64_t{n} * nrhs) * sizeof(T));
+  return status::kOk;
+}
+
 // X = pinv(A) B, with singular values at or below max(m, n) S[0] e dropped,
 // e = rcond when positive, machine epsilon otherwise.
 template <typename T>
@@ -116,8 +262,8 @@ StatusCode PinvSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs,
                      double rcond) {
   if constexpr (kIsComplex<T>) {
     // Deliberately narrower than the real twin: nrhs is not checked (a negative
-    // count surfaces as the product's -20004), and only B is screened here;
-    // the SVD screens A.
+    // count gives -20004 once A is factored), and only B is screened here; A
+    // is screened by its factorization.
     if (m < 1 || n < 1) return status::kBadSize;
     if (HasNonFiniteComplex(B, int64_t{m} * nrhs) != 0) return status::kNonFinite;
   } else {
@@ -126,49 +272,22 @@ StatusCode PinvSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs,
       return status::kNonFinite;
     }
   }
-  const int32_t k = std::min(m, n);
-  const int64_t mn = int64_t{m} * n;
-
-  Factors<T> f;
-  if (!f.Allocate(m, n, k)) return status::kNoMemory;
-  StatusCode st = SvdOf(A, m, n, f.U, f.S, f.V);
+  int32_t kept = 0;
+  const StatusCode st =
+      SvdSolve(A, m, n, B, nrhs, X, Cut{true, rcond > 0.0 ? rcond : kEpsilon, 0}, &kept);
   if (st != status::kOk) return st;
+  return kept == std::min(m, n) ? status::kOk : status::kRankDeficient;
+}
 
-  const double e = rcond > 0.0 ? rcond : kEpsilon;
-  const double threshold = std::max(m, n) * f.S[0] * e;
-  const int32_t kept = InvertKeptColumns(f.V, n, k, f.S, threshold);
-
-  WorkArray<T> pinv = AllocWork<T>(static_cast<size_t>(mn));
-  if (!pinv) return status::kNoMemory;
-  st = FormPinv(f, m, n, k, pinv.get());
-  if (st != status::kOk) return st;
-
-  // B followed by X' = P B, m*nrhs + n*nrhs elements.
-  const int64_t b_count = std::max<int64_t>(int64_t{m} * nrhs, 0);
-  const int64_t x_count = std::max<int64_t>(int64_t{n} * nrhs, 0);
-  WorkArray<T> rhs_block;
-  T* rhs = nullptr;
-  if constexpr (kIsComplex<T>) {
-    // The factor block is free again; it is reused, grown when nrhs > k.
-    if (nrhs > k) {
-      void* raw = f.uv.release();
-      st = NumRealloc(&raw, static_cast<size_t>(b_count + x_count) * sizeof(T));
-      f.uv.reset(static_cast<T*>(raw));
-      if (st != status::kOk) return st;
-    }
-    rhs = f.uv.get();
-  } else {
-    rhs_block = AllocWork<T>(static_cast<size_t>(b_count + x_count));
-    if (!rhs_block) return status::kNoMemory;
-    rhs = rhs_block.get();
+template <typename T>
+StatusCode TruncatedSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X,
+                          int32_t keep) {
+  if (m < 1 || n < 1 || nrhs < 1) return status::kBadSize;
+  if (HasNonFinite(A, int64_t{m} * n) != 0 || HasNonFinite(B, int64_t{m} * nrhs) != 0) {
+    return status::kNonFinite;
   }
-  if (b_count > 0) std::memcpy(static_cast<void*>(rhs), B, static_cast<size_t>(b_count) * sizeof(T));
-  st = MatMul<T>(pinv.get(), rhs, n, m, nrhs, rhs + b_count, false);
-  if (st != status::kOk) return st;
-  if (x_count > 0) {
-    std::memcpy(static_cast<void*>(X), rhs + b_count, static_cast<size_t>(x_count) * sizeof(T));
-  }
-  return kept == k ? status::kOk : status::kRankDeficient;
+  int32_t kept = 0;
+  return SvdSolve(A, m, n, B, nrhs, X, Cut{false, 0.0, keep}, &kept);
 }
 
 // pinv(A) into out, or over A when out is null. tol < 0 selects
@@ -211,43 +330,45 @@ StatusCode GelsdSolve(const double* A, int32_t m, int32_t n, const double* B, in
   if (UsesPinvPath(m, n)) return LeastSquaresPinvReal(A, m, n, B, nrhs, X, rcond);
 
   const int32_t k = std::min(m, n);
-  const int32_t ldb = std::max(m, n);
-
-  // Column-major right-hand sides; rows m..ldb-1 of each column are DGELSD's
-  // room for the solution of a wide system.
-  WorkArray<double> rhs = AllocWork<double>(static_cast<size_t>(int64_t{ldb} * nrhs));
-  if (!rhs) return status::kNoMemory;
-  for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(m, B + j, nrhs, rhs.get() + int64_t{j} * ldb, 1);
-
   // A negative or NaN rcond selects machine epsilon; zero stays zero.
   const double r = rcond >= 0.0 ? rcond : kEpsilon;
   const double lapack_rcond = std::max(m, n) * r;
+  lapack_int rank = 0;
+
+  if (IsTall(m, n)) {
+    // DGELSD on R and (Q^H B)[0:n] of A = QR: the same singular values, rank
+    // and minimum-norm solution as on A itself, RCOND unchanged.
+    const int64_t nn = int64_t{n} * n;
+    WorkArray<double> small = AllocWorkUninit<double>(static_cast<size_t>(nn + int64_t{n} * nrhs + n));
+    if (!small) return status::kNoMemory;
+    double* R = small.get();
+    double* y = R + nn;
+    double* sv = y + int64_t{n} * nrhs;
+    StatusCode st = FoldQr(A, m, n, B, nrhs, R, y);
+    if (st != status::kOk) return st;
+    st = lapack::Gelsd(n, n, nrhs, R, n, y, n, sv, lapack_rcond, &rank);
+    if (st != status::kOk) return st;
+    for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(n, y + int64_t{j} * n, 1, X + j, nrhs);
+    return rank < k ? status::kRankDeficient : status::kOk;
+  }
+
+  const int32_t ldb = std::max(m, n);
+  // Column-major right-hand sides; rows m..ldb-1 of each column are DGELSD's
+  // room for the solution of a wide system.
+  WorkArray<double> rhs = AllocWorkUninit<double>(static_cast<size_t>(int64_t{ldb} * nrhs));
+  if (!rhs) return status::kNoMemory;
+  for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(m, B + j, nrhs, rhs.get() + int64_t{j} * ldb, 1);
 
   // A^T row-major is A column-major with lda = m.
-  WorkArray<double> a_col = AllocWork<double>(static_cast<size_t>(int64_t{m} * n));
+  WorkArray<double> a_col = AllocWorkUninit<double>(static_cast<size_t>(int64_t{m} * n));
   if (!a_col) return status::kNoMemory;
-  StatusCode st = TransposeReal(const_cast<double*>(A), m, n, a_col.get());
-  if (st != status::kOk) return st;
-  WorkArray<double> sv = AllocWork<double>(static_cast<size_t>(k));
+  TransposeTo(A, m, n, a_col.get(), false);
+  WorkArray<double> sv = AllocWorkUninit<double>(static_cast<size_t>(k));
   if (!sv) return status::kNoMemory;
 
-  // Integer workspace (3 depth + 14) k, depth = floor(log2 k): enough for the
-  // divide-and-conquer tree of any block size.
-  const int64_t depth = static_cast<int64_t>(std::log(static_cast<double>(k)) / std::log(2.0));
-  WorkArray<lapack_int> iwork = AllocWork<lapack_int>(static_cast<size_t>((3 * depth + 14) * k));
-  if (!iwork) return status::kNoMemory;
-
-  double query = 0.0;
-  lapack_int rank = 0;
-  lapack_int info = 0;
-  lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(), lapack_rcond, &rank, &query,
-                -1, iwork.get(), &info);
-  const int64_t lwork = lapack::QueriedWorkSize(query);
-  WorkArray<double> work = AllocWork<double>(static_cast<size_t>(std::max<int64_t>(lwork, 0)));
-  if (!work) return status::kNoMemory;
-  lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(), lapack_rcond, &rank,
-                work.get(), static_cast<lapack_int>(lwork), iwork.get(), &info);
-  if (info > 0) return status::kNoConvergence;
+  StatusCode st = lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(),
+                                lapack_rcond, &rank);
+  if (st != status::kOk) return st;
 
   st = rank < k ? status::kRankDeficient : status::kOk;
   for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(n, rhs.get() + int64_t{j} * ldb, 1, X + j, nrhs);
@@ -277,6 +398,46 @@ StatusCode LeastSquaresComplex(const Complex* A, int32_t m, int32_t n, const Com
   const StatusCode st = PinvSolve<Complex>(A, m, n, B, nrhs, X, rcond);
   call_record::Note(st);
   return st;
+}
+
+StatusCode LeastSquaresTruncatedReal(const double* A, int32_t m, int32_t n, const double* B,
+                                     int32_t nrhs, double* X, int32_t keep) {
+  return TruncatedSolve<double>(A, m, n, B, nrhs, X, keep);
+}
+
+StatusCode LeastSquaresTruncatedComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
+                                        int32_t nrhs, Complex* X, int32_t keep) {
+  return TruncatedSolve<Complex>(A, m, n, B, nrhs, X, keep);
+}
+
+double TruncationThreshold(const double* S, int32_t count, int32_t keep) {
+  if (keep == count) return S[keep - 1] * 0.5;
+  if (keep >= 1 && keep < count) return (S[keep - 1] + S[keep]) * 0.5;
+  return 0.0;
+}
+
+template <typename T>
+StatusCode QrReduce(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* Y) {
+  if (m < 1 || n < 1 || nrhs < 1 || m < n) return status::kBadSize;
+  const int64_t nn = int64_t{n} * n;
+  const int64_t nr = int64_t{n} * nrhs;
+  WorkArray<T> col = AllocWorkUninit<T>(static_cast<size_t>(nn + nr));
+  if (!col) return status::kNoMemory;
+  const StatusCode st = FoldQr(A, m, n, B, nrhs, col.get(), col.get() + nn);
+  if (st != status::kOk) return st;
+  TransposeTo(col.get(), n, n, R, false);
+  TransposeTo(col.get() + nn, nrhs, n, Y, false);
+  return status::kOk;
+}
+
+StatusCode QrReduceReal(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
+                        double* R, double* Y) {
+  return QrReduce<double>(A, m, n, B, nrhs, R, Y);
+}
+
+StatusCode QrReduceComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
+                           int32_t nrhs, Complex* R, Complex* Y) {
+  return QrReduce<Complex>(A, m, n, B, nrhs, R, Y);
 }
 
 StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol, double* out) {

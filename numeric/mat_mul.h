@@ -1,3 +1,9 @@
+// out (n-by-m) = the transpose of the m-by-n A, conjugated when `conjugate` is
+// set (complex only), in cache-sized tiles; out does not overlap A. This is also
+// the column-major copy of a row-major A (lda = m).
+template <typename T>
+void TransposeTo(const T* A, int32_t m, int32_t n, T* out, bool conjugate);
+
 // The common worker behind MatMulReal and MatMulComplex. With copyInputs set, A
 // and B are copied to scratch and the product is formed in scratch before it is
 // copied to C, so that C may alias A or B. Instantiated for double and Complex.

@@ -37,6 +37,13 @@ int32_t HasNonFiniteComplex(const Complex* x, int64_t n);
 [[nodiscard]] StatusCode SvdComplex(const Complex* A, int32_t m, int32_t n, Complex* U, double* S,
                                     Complex* V, int32_t full);
 
+// The `count` largest singular values (non-increasing) with their vectors only:
+// U m-by-count, V n-by-count, A = U diag(S) V^H + the rest. A untouched.
+[[nodiscard]] StatusCode SvdLeadingReal(const double* A, int32_t m, int32_t n, int32_t count,
+                                        double* U, double* S, double* V);
+[[nodiscard]] StatusCode SvdLeadingComplex(const Complex* A, int32_t m, int32_t n, int32_t count,
+                                           Complex* U, double* S, Complex* V);
+
 // ---- least squares and pseudo-inverse ------------------------------------------
 // X (n-by-nrhs) minimising ||A X - B||, minimum norm; 20001 when rank deficient.
 [[nodiscard]] StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double* B,
@@ -47,6 +54,26 @@ int32_t HasNonFiniteComplex(const Complex* x, int64_t n);
 [[nodiscard]] StatusCode LeastSquaresComplex(const Complex* A, int32_t m, int32_t n,
                                              const Complex* B, int32_t nrhs, Complex* X,
                                              double rcond);
+// X = pinv_tau(A) B, pinv_tau over the singular values of A above the absolute
+// threshold TruncationThreshold(S, min(m, n), keep); 0 whatever the rank.
+[[nodiscard]] StatusCode LeastSquaresTruncatedReal(const double* A, int32_t m, int32_t n,
+                                                   const double* B, int32_t nrhs, double* X,
+                                                   int32_t keep);
+[[nodiscard]] StatusCode LeastSquaresTruncatedComplex(const Complex* A, int32_t m, int32_t n,
+                                                      const Complex* B, int32_t nrhs, Complex* X,
+                                                      int32_t keep);
+// Halfway between the keep-th and (keep+1)-th of the `count` non-increasing
+// singular values S (half the keep-th when keep == count; 0 when keep is out
+// of range), so that exactly the keep strongest pass a strict "S > tau" test
+// unless values tie at the boundary.
+double TruncationThreshold(const double* S, int32_t count, int32_t keep);
+// A = QR for m >= n, with B carried along: R (n-by-n, upper triangular, zeros
+// below) and Y = (Q^H B)[0:n] (n-by-nrhs). Q itself is not kept. A and B are
+// not screened.
+[[nodiscard]] StatusCode QrReduceReal(const double* A, int32_t m, int32_t n, const double* B,
+                                      int32_t nrhs, double* R, double* Y);
+[[nodiscard]] StatusCode QrReduceComplex(const Complex* A, int32_t m, int32_t n,
+                                         const Complex* B, int32_t nrhs, Complex* R, Complex* Y);
 // pinv(A), n-by-m, into out or over A when out is null.
 [[nodiscard]] StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol,
                                            double* out);

@@ -2,13 +2,14 @@
 // finiteness screen in front of every LAPACK call, and the transposes between
 // row-major storage and LAPACK's column-major storage.
 
+#include <algorithm>
 #include <bit>
 #include <cfloat>
 #include <cstring>
 #include <limits>
 #include <type_traits>
 
-#include "numeric/lapack_shims.h"
+#include "numeric/lapack_boundary.h"
 #include "numeric/mat_mul.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
@@ -49,7 +50,7 @@ void FillQuietNaN(T* C, int64_t count) {
   for (int64_t i = 0; i < count; ++i) C[i] = value;
 }
 
-// C = A * B into storage that does not overlap A or B; C already zeroed.
+// C = A * B into storage that does not overlap A or B.
 template <typename T>
 void GemmInto(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C) {
   if constexpr (std::is_same_v<T, double>) {
@@ -87,17 +88,17 @@ StatusCode MatMul(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C,
     return status::kOk;
   }
   if (!copyInputs) {
-    std::memset(static_cast<void*>(C), 0, static_cast<size_t>(mn) * sizeof(T));
+    // beta = 0: the BLAS writes every element of C without reading it.
     GemmInto(A, B, m, k, n, C);
     return status::kOk;
   }
   const int64_t mk = int64_t{m} * k;
   const int64_t kn = int64_t{k} * n;
-  WorkArray<T> a_copy = AllocWork<T>(static_cast<size_t>(mk));
+  WorkArray<T> a_copy = AllocWorkUninit<T>(static_cast<size_t>(mk));
   if (!a_copy) return status::kNoMemory;
-  WorkArray<T> b_copy = AllocWork<T>(static_cast<size_t>(kn));
+  WorkArray<T> b_copy = AllocWorkUninit<T>(static_cast<size_t>(kn));
   if (!b_copy) return status::kNoMemory;
-  WorkArray<T> product = AllocWork<T>(static_cast<size_t>(mn));
+  WorkArray<T> product = AllocWorkUninit<T>(static_cast<size_t>(mn));
   if (!product) return status::kNoMemory;
   std::memcpy(static_cast<void*>(a_copy.get()), A, static_cast<size_t>(mk) * sizeof(T));
   std::memcpy(static_cast<void*>(b_copy.get()), B, static_cast<size_t>(kn) * sizeof(T));
@@ -173,21 +174,39 @@ int32_t HasNonFiniteComplex(const Complex* x, int64_t n) {
 
 // ---- transposes ----------------------------------------------------------------------
 
+// Tiles of kTile x kTile elements keep both the rows read and the rows written
+// in cache; a plain column-by-column copy would stream the whole of A once per
+// column. Complex imaginary parts are conjugated by a sign-bit flip.
+template <typename T>
+void TransposeTo(const T* A, int32_t m, int32_t n, T* out, bool conjugate) {
+  constexpr int32_t kTile = 32;
+  for (int32_t i0 = 0; i0 < m; i0 += kTile) {
+    const int32_t i1 = std::min(m, i0 + kTile);
+    for (int32_t j0 = 0; j0 < n; j0 += kTile) {
+      const int32_t j1 = std::min(n, j0 + kTile);
+      for (int32_t i = i0; i < i1; ++i) {
+        const T* row = A + int64_t{i} * n;
+        for (int32_t j = j0; j < j1; ++j) {
+          T v = row[j];
+          if constexpr (!std::is_same_v<T, double>) {
+            if (conjugate) v.imag(FlipSign(v.imag()));
+          }
+          out[int64_t{j} * m + i] = v;
+        }
+      }
+    }
+  }
+}
+
+template void TransposeTo<double>(const double*, int32_t, int32_t, double*, bool);
+template void TransposeTo<Complex>(const Complex*, int32_t, int32_t, Complex*, bool);
+
 namespace {
 
 // out (n-by-m) = A^T, or A^H for complex A; out does not overlap A.
 template <typename T>
 void TransposeInto(const T* A, int32_t m, int32_t n, T* out) {
-  if constexpr (std::is_same_v<T, double>) {
-    // Column j of A (stride n) becomes row j of the result.
-    for (int32_t j = 0; j < n; ++j) lapack::Copy(m, A + j, n, out + int64_t{j} * m, 1);
-  } else {
-    // Row i of A becomes column i of the result (stride m), then every
-    // imaginary part has its sign bit flipped.
-    for (int32_t i = 0; i < m; ++i) lapack::Copy(n, A + int64_t{i} * n, 1, out + i, m);
-    const int64_t count = int64_t{m} * n;
-    for (int64_t e = 0; e < count; ++e) out[e].imag(FlipSign(out[e].imag()));
-  }
+  TransposeTo(A, m, n, out, !std::is_same_v<T, double>);
 }
 
 // The transpose in `out`, or back over A (through scratch) when out is null or

@@ -9,7 +9,7 @@
 #include <cstring>
 #include <type_traits>
 
-#include "numeric/lapack_shims.h"
+#include "numeric/lapack_boundary.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
@@ -46,7 +46,7 @@ StatusCode Svd(const T* A, int32_t m, int32_t n, T* U, double* S, T* V, int32_t 
   const int32_t q = full != 0 ? n : k;  // right singular vectors of A kept
 
   // The copy is A^T in column-major order, n rows by m columns, lda = n.
-  WorkArray<T> at = AllocWork<T>(static_cast<size_t>(mn));
+  WorkArray<T> at = AllocWorkUninit<T>(static_cast<size_t>(mn));
   if (!at) return status::kNoMemory;
   std::memcpy(static_cast<void*>(at.get()), A, static_cast<size_t>(mn) * sizeof(T));
 
@@ -54,40 +54,17 @@ StatusCode Svd(const T* A, int32_t m, int32_t n, T* U, double* S, T* V, int32_t 
   // its left factor U' (n-by-q, ldu = n), and the k singular values.
   const int64_t right_count = int64_t{p} * m;
   const int64_t left_count = int64_t{q} * n;
-  WorkArray<T> factors = AllocWork<T>(static_cast<size_t>(right_count + left_count + k));
+  WorkArray<T> factors = AllocWorkUninit<T>(static_cast<size_t>(right_count + left_count + k));
   if (!factors) return status::kNoMemory;
   T* right = factors.get();
   T* left = right + right_count;
   double* sv = reinterpret_cast<double*>(left + left_count);
 
-  WorkArray<lapack_int> iwork = AllocWork<lapack_int>(static_cast<size_t>(8) * k);
-  if (!iwork) return status::kNoMemory;
-
-  WorkArray<double> rwork;
-  if constexpr (!std::is_same_v<T, double>) {
-    // ZGESDD's real workspace: (5k + 7)k, raised where needed to the minimum
-    // LAPACK documents, max(5k^2 + 5k, 2 max(m,n) k + 2k^2 + k), which is larger
-    // when one side exceeds the other by more than about half (e.g. 22-by-40).
-    const int64_t kk = k;
-    const int64_t mx = std::max(m, n);
-    const int64_t lrwork = std::max((5 * kk + 7) * kk, 2 * mx * kk + 2 * kk * kk + kk);
-    rwork = AllocWork<double>(static_cast<size_t>(lrwork));
-    if (!rwork) return status::kNoMemory;
-  }
-
-  T query{};
-  lapack_int info = 0;
-  lapack::Gesdd(jobz, n, m, at.get(), n, sv, left, n, right, p, &query, -1, rwork.get(),
-                iwork.get(), &info);
-  const int64_t lwork = lapack::QueriedWorkSize(query);
-  WorkArray<T> work = AllocWork<T>(static_cast<size_t>(std::max<int64_t>(lwork, 0)));
-  if (!work) return status::kNoMemory;
-  lapack::Gesdd(jobz, n, m, at.get(), n, sv, left, n, right, p, work.get(),
-                static_cast<lapack_int>(lwork), rwork.get(), iwork.get(), &info);
-  if (info != 0) return status::kNoConvergence;
+  StatusCode st = lapack::Gesdd(jobz, n, m, at.get(), n, sv, left, n, right, p);
+  if (st != status::kOk) return st;
 
   // V (n-by-q) = conj of U', whose column-major array reads row-major as q-by-n.
-  const StatusCode st = AdjointInto(left, q, n, V);
+  st = AdjointInto(left, q, n, V);
   if (st != status::kOk) return st;
   std::memcpy(S, sv, static_cast<size_t>(k) * sizeof(double));
   // V'^H, p-by-m column-major with ldvt = p, is exactly the row-major m-by-p U.
@@ -95,7 +72,44 @@ StatusCode Svd(const T* A, int32_t m, int32_t n, T* U, double* S, T* V, int32_t 
   return status::kOk;
 }
 
+// The leading `count` singular triplets only, by the same reading of the
+// row-major array as A^T: U (m-by-count) is the right factor of A^T read
+// row-major, V (n-by-count) the conjugate of its left factor.
+template <typename T>
+StatusCode SvdLeading(const T* A, int32_t m, int32_t n, int32_t count, T* U, double* S, T* V) {
+  if (m < 1 || n < 1 || count < 1 || count > std::min(m, n)) return status::kBadSize;
+  const int64_t mn = int64_t{m} * n;
+  if (HasNonFinite(A, mn) != 0) return status::kNonFinite;
+  const int64_t right_count = int64_t{count} * m;
+  const int64_t left_count = int64_t{count} * n;
+  const int32_t k = std::min(m, n);  // the driver's S has room for all of them
+  WorkArray<T> block = AllocWorkUninit<T>(static_cast<size_t>(mn + right_count + left_count + k));
+  if (!block) return status::kNoMemory;
+  T* at = block.get();
+  T* right = at + mn;
+  T* left = right + right_count;
+  double* sv = reinterpret_cast<double*>(left + left_count);
+  std::memcpy(static_cast<void*>(at), A, static_cast<size_t>(mn) * sizeof(T));
+  StatusCode st = lapack::Gesvdx(n, m, at, n, count, sv, left, n, right, count);
+  if (st != status::kOk) return st;
+  std::memcpy(S, sv, static_cast<size_t>(count) * sizeof(double));
+  st = AdjointInto(left, count, n, V);
+  if (st != status::kOk) return st;
+  std::memcpy(static_cast<void*>(U), right, static_cast<size_t>(right_count) * sizeof(T));
+  return status::kOk;
+}
+
 }  // namespace
+
+StatusCode SvdLeadingReal(const double* A, int32_t m, int32_t n, int32_t count, double* U,
+                          double* S, double* V) {
+  return SvdLeading<double>(A, m, n, count, U, S, V);
+}
+
+StatusCode SvdLeadingComplex(const Complex* A, int32_t m, int32_t n, int32_t count, Complex* U,
+                             double* S, Complex* V) {
+  return SvdLeading<Complex>(A, m, n, count, U, S, V);
+}
 
 StatusCode SvdReal(const double* A, int32_t m, int32_t n, double* U, double* S, double* V,
                    int32_t full) {

@@ -35,15 +35,23 @@ struct NumFreeDeleter {
 template <typename T>
 using WorkArray = std::unique_ptr<T[], NumFreeDeleter>;
 
-// Zero-filled work array of `count` elements; empty holder on failure (or on a
-// byte size that would overflow). A count of 0 still allocates one element so
-// that success and failure stay distinguishable.
+// Work array of `count` elements whose contents are undefined until written:
+// for buffers that are filled before they are read. Empty holder on failure (or
+// on a byte size that would overflow). A count of 0 still allocates one element
+// so that success and failure stay distinguishable.
 template <typename T>
-WorkArray<T> AllocWork(size_t count) {
+WorkArray<T> AllocWorkUninit(size_t count) {
   if (count > SIZE_MAX / sizeof(T)) return WorkArray<T>();
   const size_t bytes = (count == 0 ? 1 : count) * sizeof(T);
   void* p = nullptr;
   if (NumAlloc(&p, bytes) != status::kOk) return WorkArray<T>();
-  std::memset(p, 0, bytes);
   return WorkArray<T>(static_cast<T*>(p));
+}
+
+// The same, zero-filled.
+template <typename T>
+WorkArray<T> AllocWork(size_t count) {
+  WorkArray<T> w = AllocWorkUninit<T>(count);
+  if (w) std::memset(static_cast<void*>(w.get()), 0, (count == 0 ? 1 : count) * sizeof(T));
+  return w;
 }

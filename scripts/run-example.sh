@@ -10,7 +10,7 @@
 set -euo pipefail
 cd "$(dirname "$0")/.."
 scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
-  libgtest-dev libgmock-dev gnuplot-nox
+  libopenblas0-serial libgtest-dev libgmock-dev gnuplot-nox
 
 cmake -S . -B build/release -DCMAKE_BUILD_TYPE=Release >/dev/null
 cmake --build build/release --target qdm_example -j"$(nproc)" >/dev/null

@@ -1,14 +1,16 @@
 #!/usr/bin/env bash
-# Builds and runs every test suite: the plain -O3 build, then the
-# AddressSanitizer + UndefinedBehaviorSanitizer build, then the Windows DLL
-# under wine (scripts/windows.sh). Installs what is missing on a fresh Debian
+# Builds and runs every test suite: the plain -O3 build (on OpenBLAS, the
+# default), the same build once more against the reference BLAS and LAPACK (a
+# library path switch, no rebuild), then the AddressSanitizer +
+# UndefinedBehaviorSanitizer build, then the Windows DLL under wine
+# (scripts/windows.sh). Installs what is missing on a fresh Debian
 # 12 machine (run as root). The last lines printed are ctest's own summary; the
 # exit status is non-zero if any suite failed.
 set -uo pipefail
 cd "$(dirname "$0")/.."
 scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
-  libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev pkg-config doxygen dpkg-dev \
-  || exit 1
+  libopenblas0-serial libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev \
+  python3-numpy pkg-config doxygen dpkg-dev || exit 1
 
 jobs=$(nproc)
 failed=0
@@ -25,6 +27,10 @@ suite release -DCMAKE_BUILD_TYPE=Release || failed=1
 # The install test also builds the Debian package and installs it with apt-get
 # (then removes it): CI runs as root on a machine of its own.
 [ $failed -eq 0 ] && { QDM_TEST_DEB=1 run release | tail -n 25 || failed=1; }
+# The same binaries on the reference BLAS and LAPACK: LD_LIBRARY_PATH is
+# searched before the library's RUNPATH.
+reference=/usr/lib/x86_64-linux-gnu/blas:/usr/lib/x86_64-linux-gnu/lapack
+[ $failed -eq 0 ] && { LD_LIBRARY_PATH=$reference run release | tail -n 25 || failed=1; }
 suite sanitize -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_SANITIZE=ON || failed=1
 if [ $failed -eq 0 ]; then
   export ASAN_OPTIONS=detect_leaks=1:abort_on_error=0 UBSAN_OPTIONS=print_stacktrace=1

@@ -140,6 +140,8 @@ struct Problem {
 const Problem kProblems[] = {
     {1, 1, 1, 1},  {4, 4, 4, 2},  {10, 4, 4, 3}, {3, 2, 1, 1},  {6, 5, 2, 2},
     {1, 5, 1, 1},  {5, 1, 1, 4},  {22, 42, 22, 1}, {8, 12, 3, 2}, {30, 7, 7, 1},
+    // tall enough to be factored in several row blocks, full rank and deficient
+    {2000, 40, 40, 2}, {1500, 40, 12, 1},
 };
 
 using Solver = StatusCode (*)(const double*, int32_t, int32_t, const double*, int32_t, double*,
@@ -408,6 +410,42 @@ TYPED_TEST(PinvTyped, BadInputWritesNothing) {
     for (const T& v : p) EXPECT_EQ(v, T(7.0));
     for (size_t i = 0; i < a.size(); ++i) {
       EXPECT_TRUE(a[i] == a0[i] || (std::isnan(std::real(a[i])) && std::isnan(std::real(a0[i]))));
+    }
+  }
+}
+
+// A tall system scaled to either end of the range has the solution and rank
+// decision of the unscaled one: the QR steps do not rescale the way an SVD
+// driver does, and must neither overflow nor lose the small values.
+TEST(LeastSquares, TallSystemsNearTheEndsOfTheRange) {
+  for (const Problem& p : {Problem{600, 12, 12, 1}, Problem{1500, 40, 12, 2}}) {
+    for (int solver = 0; solver < 4; ++solver) {
+      const auto a = MakeLowRank<double>(p.m, p.n, p.rank, 41).A;
+      const auto b = qdm_test::RandomMatrix<double>(p.m, p.nrhs, 42);
+      auto solve = [&](double scale, std::vector<Cx>& x) {
+        std::vector<double> as(a), bs(b), xr(x.size());
+        for (double& v : as) v *= scale;
+        for (double& v : bs) v *= scale;
+        const std::vector<Cx> ac(as.begin(), as.end()), bc(bs.begin(), bs.end());
+        StatusCode st = 0;
+        switch (solver) {
+          case 0: st = LeastSquaresReal(as.data(), p.m, p.n, bs.data(), p.nrhs, xr.data(), -1.0); break;
+          case 1: st = LeastSquaresPinvReal(as.data(), p.m, p.n, bs.data(), p.nrhs, xr.data(), -1.0); break;
+          case 2: return LeastSquaresComplex(ac.data(), p.m, p.n, bc.data(), p.nrhs, x.data(), -1.0);
+          default: st = LeastSquaresTruncatedReal(as.data(), p.m, p.n, bs.data(), p.nrhs, xr.data(), 3);
+        }
+        std::copy(xr.begin(), xr.end(), x.begin());
+        return st;
+      };
+      std::vector<Cx> x1(static_cast<size_t>(p.n) * p.nrhs);
+      const StatusCode st1 = solve(1.0, x1);
+      for (double scale : {1e150, 1e-150}) {
+        SCOPED_TRACE(::testing::Message() << p.m << "x" << p.n << " solver " << solver << " scale " << scale);
+        std::vector<Cx> xs(x1.size());
+        ASSERT_EQ(solve(scale, xs), st1);
+        const double norm = qdm_test::FrobNorm(x1.data(), static_cast<int64_t>(x1.size()));
+        for (size_t i = 0; i < x1.size(); ++i) EXPECT_LT(std::abs(xs[i] - x1[i]), 1e-11 * norm) << i;
+      }
     }
   }
 }

@@ -6,8 +6,10 @@
 #include <algorithm>
 #include <cfloat>
 #include <cmath>
+#include <string>
 #include <vector>
 
+#include "numeric/lapack_boundary.h"
 #include "numeric/numeric.h"
 #include "support/alloc_faults.h"
 #include "support/dense_oracles.h"
@@ -170,3 +172,41 @@ TYPED_TEST(SvdTyped, FailedAllocationLeavesOutputsUntouched) {
 }
 
 }  // namespace
+
+// A driver failure injected at the boundary reaches each caller as the status
+// its driver's INFO maps to, with nothing written.
+TEST(LapackBoundary, InjectedInfoMapsPerDriver) {
+  const auto a = qdm_test::RandomMatrix<double>(6, 4, 5);
+  const auto b = qdm_test::RandomMatrix<double>(6, 1, 6);
+  struct Case {
+    const char* name;
+    int32_t info;
+    StatusCode want;
+  } cases[] = {{"svd", 3, -20062},       {"svd", -2, -20062},  {"eig", 1, -20062},
+               {"eig", -4, -20999},      {"gelsd", 2, -20062}, {"gelsd", -3, 20001},
+               {"qr solve", -1, -20999}, {"sym eig", 5, -20062}};
+  for (const Case& c : cases) {
+    SCOPED_TRACE(::testing::Message() << c.name << " INFO " << c.info);
+    std::vector<double> u(24, 7.0), s(4, 7.0), v(16, 7.0), x(4, 7.0);
+    std::vector<Cx> w(4, Cx(7.0)), vec(16, Cx(7.0));
+    const std::string name = c.name;
+    LapackFailAt(1, c.info, false);
+    StatusCode st = 0;
+    if (name == "svd") st = SvdReal(a.data(), 6, 4, u.data(), s.data(), v.data(), 0);
+    if (name == "eig") st = EigGeneralReal(a.data(), 4, 1, w.data(), vec.data());
+    if (name == "gelsd") st = LeastSquaresReal(a.data(), 3, 4, b.data(), 1, x.data(), -1.0);
+    if (name == "qr solve") st = LeastSquaresComplex(std::vector<Cx>(a.begin(), a.end()).data(), 6, 2,
+                                                     std::vector<Cx>(b.begin(), b.end()).data(), 1,
+                                                     w.data(), -1.0);
+    if (name == "sym eig") st = EigSymReal(std::vector<double>(16, 1.0).data(), 4, 0, s.data(), nullptr);
+    EXPECT_EQ(LapackCalls(), 1);
+    LapackFailAt(0, 0, false);
+    EXPECT_EQ(st, c.want);
+    // gelsd's negative INFO is not an error: the rank LAPACK left (none) decides.
+    if (c.want < 0) {
+      for (double e : u) EXPECT_EQ(e, 7.0);
+      for (double e : x) EXPECT_EQ(e, 7.0);
+      for (const Cx& e : vec) EXPECT_EQ(e, Cx(7.0));
+    }
+  }
+}

@@ -1,0 +1,110 @@
+// The one boundary between the numeric layer and LAPACK/CBLAS. Every LAPACK
+// driver the library calls is reached through a routine here that takes its
+// workspace (a size query where the driver offers one, a fixed formula for the
+// eigenvalue drivers), allocates it through NumAlloc, runs the driver and turns
+// INFO into a StatusCode by the one mapping in lapack_boundary.cpp. Overloads
+// serve the real (d) and complex (z) twin from one template body. Integers are
+// LAPACK's 32-bit lapack_int.
+//
+// Every driver call is counted, and a test can make the k-th call from now
+// report a chosen INFO instead of running (LapackFailAt), as NumAllocFailAt does
+// for allocations.
+#pragma once
+
+#include <cstdint>
+
+#include "core/types.h"
+#include "numeric/lapack_api.h"
+
+namespace lapack {
+
+// ---- BLAS -------------------------------------------------------------------------
+// y(0:n) with stride incy = x(0:n) with stride incx.
+inline void Copy(int32_t n, const double* x, int32_t incx, double* y, int32_t incy) {
+  cblas_dcopy(n, x, incx, y, incy);
+}
+inline void Copy(int32_t n, const Complex* x, int32_t incx, Complex* y, int32_t incy) {
+  cblas_zcopy(n, x, incx, y, incy);
+}
+
+// Row-major C (m-by-n) = op(A) * B (k-by-n), beta = 0, where op(A) is A
+// (m-by-k, lda = k) or, with adjointA, the adjoint of A (k-by-m, lda = m):
+// the transpose for real data, the conjugate transpose for complex data.
+inline void Gemm(int32_t m, int32_t n, int32_t k, const double* A, const double* B, double* C,
+                 bool adjointA = false) {
+  cblas_dgemm(CblasRowMajor, adjointA ? CblasTrans : CblasNoTrans, CblasNoTrans, m, n, k, 1.0, A,
+              adjointA ? m : k, B, n, 0.0, C, n);
+}
+inline void Gemm(int32_t m, int32_t n, int32_t k, const Complex* A, const Complex* B, Complex* C,
+                 bool adjointA = false) {
+  const Complex one(1.0, 0.0);
+  const Complex zero(0.0, 0.0);
+  cblas_zgemm(CblasRowMajor, adjointA ? CblasConjTrans : CblasNoTrans, CblasNoTrans, m, n, k,
+              &one, A, adjointA ? m : k, B, n, &zero, C, n);
+}
+
+// ---- LAPACK drivers, column-major ---------------------------------------------------
+// Each returns 0, -20001 when its workspace cannot be had, or the status its
+// INFO maps to (see lapack_boundary.cpp for the mapping of each driver).
+
+// Divide-and-conquer SVD (jobz 'S' or 'A').
+[[nodiscard]] StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, double* a, lapack_int lda,
+                               double* s, double* u, lapack_int ldu, double* vt, lapack_int ldvt);
+[[nodiscard]] StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, Complex* a, lapack_int lda,
+                               double* s, Complex* u, lapack_int ldu, Complex* vt,
+                               lapack_int ldvt);
+
+// The `count` largest singular values (decreasing) and their vectors (jobu =
+// jobvt = 'V', range 'I', IL = 1, IU = count): u (m-by-count, ldu), vt
+// (count-by-n, ldvt).
+[[nodiscard]] StatusCode Gesvdx(lapack_int m, lapack_int n, double* a, lapack_int lda,
+                                lapack_int count, double* s, double* u, lapack_int ldu,
+                                double* vt, lapack_int ldvt);
+[[nodiscard]] StatusCode Gesvdx(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
+                                lapack_int count, double* s, Complex* u, lapack_int ldu,
+                                Complex* vt, lapack_int ldvt);
+
+// Minimum-norm least squares by divide and conquer (real only); *rank as
+// LAPACK leaves it.
+[[nodiscard]] StatusCode Gelsd(lapack_int m, lapack_int n, lapack_int nrhs, double* a,
+                               lapack_int lda, double* b, lapack_int ldb, double* s, double rcond,
+                               lapack_int* rank);
+
+// Householder QR, A = Q R: R in the upper triangle of a, Q as reflectors below
+// it and in tau (min(m, n) values).
+[[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, double* a, lapack_int lda,
+                               double* tau);
+[[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
+                               Complex* tau);
+
+// C (m-by-nrhs, ldc) replaced by Q^H C, Q the m-by-m product of the k
+// reflectors Geqrf left in a and tau.
+[[nodiscard]] StatusCode ApplyQAdjoint(lapack_int m, lapack_int nrhs, lapack_int k,
+                                       const double* a, lapack_int lda, const double* tau,
+                                       double* c, lapack_int ldc);
+[[nodiscard]] StatusCode ApplyQAdjoint(lapack_int m, lapack_int nrhs, lapack_int k,
+                                       const Complex* a, lapack_int lda, const Complex* tau,
+                                       Complex* c, lapack_int ldc);
+
+// General eigenproblem, left vectors only (jobvl 'V' or 'N'). The workspace is
+// the caller's, of GeevWorkSize elements: it lives in the caller's own block.
+int64_t GeevWorkSize(int32_t n, bool complex);
+[[nodiscard]] StatusCode Geev(char jobvl, lapack_int n, double* a, double* wr, double* wi,
+                              double* vl, double* work);
+[[nodiscard]] StatusCode Geev(char jobvl, lapack_int n, Complex* a, Complex* w, Complex* vl,
+                              Complex* work, double* rwork);
+
+// Symmetric / Hermitian divide and conquer, UPLO 'U', eigenvalues ascending in w.
+[[nodiscard]] StatusCode Syevd(char jobz, lapack_int n, double* a, double* w);
+[[nodiscard]] StatusCode Syevd(char jobz, lapack_int n, Complex* a, double* w);
+
+}  // namespace lapack
+
+// ---- driver failures injected by tests ------------------------------------------------
+// Makes the k-th LAPACK driver call from now (k >= 1) report `info` without
+// running; with `persistent` every call from the k-th on does. k = 0 switches
+// injection off. A driver call is one routine above, its workspace query
+// included.
+void LapackFailAt(int64_t k, int32_t info, bool persistent);
+// LAPACK driver calls made since the last LapackFailAt call.
+int64_t LapackCalls();
