@@ -43,6 +43,11 @@ set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
 set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_PACKAGE_SECTION science)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
+if(QDM_BLAS STREQUAL "openblas")
+  # The libraries' run path leads to the single-threaded OpenBLAS; without it
+  # they run on whatever libblas.so.3 and liblapack.so.3 the system provides.
+  set(CPACK_DEBIAN_PACKAGE_RECOMMENDS libopenblas0-serial)
+endif()
 include(CPack)
 
 # The reference: the header comments of both faces and the status page made

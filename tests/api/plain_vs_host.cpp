@@ -10,6 +10,7 @@
 #include <gtest/gtest.h>
 
 #include <climits>
+#include <cstdio>
 #include <cmath>
 #include <cstring>
 #include <functional>
@@ -19,6 +20,7 @@
 #include <string>
 #include <vector>
 
+#include "numeric/lapack_boundary.h"
 #include "numeric/work.h"
 #include "qdm_api.h"
 #include "support/export_table.h"
@@ -280,10 +282,23 @@ TEST(PlainApi, RefusesWhatTheHostFaceLetsThrough) {
   NumAllocFailAt(0, false);
 }
 
-// Each work allocation failed in turn, once and from then on: every call ends
-// with the clean run's exact results or with an error and emptied outputs.
-// Never success with other numbers.
+// Each work allocation failed in turn, once and from then on, and each LAPACK
+// driver call made to report INFO > 0 and INFO < 0: every call ends with the
+// clean run's exact results or with an error and emptied outputs. Never
+// success with other numbers.
+struct Fault {
+  const char* name;
+  std::function<void(int64_t k)> arm;  // k = 0 disarms
+  std::function<int64_t()> reached;    // calls counted since arming
+};
+
 TEST(PlainApi, NoFailureIsReportedAsSuccess) {
+  const Fault faults[] = {
+      {"allocation", [](int64_t k) { NumAllocFailAt(k, false); }, NumAllocAttempts},
+      {"allocations from", [](int64_t k) { NumAllocFailAt(k, true); }, NumAllocAttempts},
+      {"lapack info 1", [](int64_t k) { LapackFailAt(k, 1, false); }, LapackCalls},
+      {"lapack info -1", [](int64_t k) { LapackFailAt(k, -1, false); }, LapackCalls},
+  };
   int64_t faulted = 0;
   for (const Export& x : Exports()) {
     const PlainFn& plain = PlainFunctions().at(x.name);
@@ -292,16 +307,16 @@ TEST(PlainApi, NoFailureIsReportedAsSuccess) {
       PlainCall clean;
       const int32_t clean_status = plain(data.data(), s, clean);
       ASSERT_GE(clean_status, 0) << x.name;
-      for (bool persistent : {false, true}) {
+      for (const Fault& fault : faults) {
         for (int64_t k = 1;; ++k) {
           PlainCall p;
           const int64_t before = NumAllocOutstanding();
-          NumAllocFailAt(k, persistent);
+          fault.arm(k);
           const int32_t st = plain(data.data(), s, p);
-          const bool reached = NumAllocAttempts() >= k;
-          NumAllocFailAt(0, false);
-          const std::string where = std::string(x.name) + " n=" + std::to_string(s.n) +
-                                    (persistent ? " from " : " at ") + std::to_string(k);
+          const bool reached = fault.reached() >= k;
+          fault.arm(0);
+          const std::string where = std::string(x.name) + " n=" + std::to_string(s.n) + " " +
+                                    fault.name + " " + std::to_string(k);
           ASSERT_EQ(NumAllocOutstanding(), before) << where;
           if (!reached) break;
           ++faulted;
@@ -310,7 +325,6 @@ TEST(PlainApi, NoFailureIsReportedAsSuccess) {
             for (int i = 0; i < 4; ++i) EXPECT_EQ(p.out[i], clean.out[i]) << where << " out" << i;
             EXPECT_EQ(p.count, clean.count) << where;
           } else {
-            EXPECT_EQ(st, QDM_ERR_NO_MEMORY) << where;
             for (int i = 0; i < 4; ++i) {
               for (double v : p.out[i]) ASSERT_EQ(v, 0.0) << where << " out" << i;
             }
@@ -322,6 +336,8 @@ TEST(PlainApi, NoFailureIsReportedAsSuccess) {
     }
   }
   RecordProperty("faulted_calls", static_cast<int>(faulted));
+  std::printf("plain face: %lld faulted calls, none reported as success\n",
+              static_cast<long long>(faulted));
 }
 
 TEST(PlainApi, EveryStatusHasItsOwnText) {
