@@ -19,7 +19,7 @@ from typing import NamedTuple
 
 import numpy as _np
 
-from qdm._lib import functions as _fn, lib as _lib, status_text
+from qdm._lib import functions as _fn, lib as _clib, status_text
 
 __all__ = ["covariance", "pcar", "prony", "matrix_pencil", "mdl_order", "covariance_psd",
            "pcar_psd", "Error", "ArgumentError", "DTypeError", "OutOfMemoryError",
@@ -27,7 +27,7 @@ __all__ = ["covariance", "pcar", "prony", "matrix_pencil", "mdl_order", "covaria
            "CovarianceFit", "PcarFit", "PronyFit", "PencilFit", "CovarianceSpectrum",
            "PcarSpectrum"]
 
-__version__ = _lib.qdm_version().decode()
+__version__ = _clib.qdm_version().decode()
 
 
 # ---- errors ------------------------------------------------------------------------
@@ -287,7 +287,7 @@ def covariance_psd(x, *, order, points=512, fs=1.0):
     at N frequencies from -fs/2, N the power of two not below `points`."""
     x, c = _signal(x, "covariance_psd")
     n, p, pts = x.shape[0], _int(order), _int(points)
-    N = _lib.qdm_spectrum_length(pts)
+    N = _clib.qdm_spectrum_length(pts)
     spec = _np.empty(max(N, 1))
     f0, df, nv = _ct.c_double(), _ct.c_double(), _ct.c_double()
     _check(_fn["covariance_psd", _kind(c)](_addr(x), n, p, pts, _fs(fs), _addr(spec),
@@ -302,7 +302,7 @@ def pcar_psd(x, *, order, components, points=512, fs=1.0, real_signal=False):
     first), amplitudes fitted by least squares. No damping is reported."""
     x, c = _signal(x, "pcar_psd")
     n, p, k, pts = x.shape[0], _int(order), _int(components), _int(points)
-    N = _lib.qdm_spectrum_length(pts)
+    N = _clib.qdm_spectrum_length(pts)
     spec = _np.empty(max(N, 1))
     block, (amp, ph, fr) = _modes(3, _room(k, n))
     count = _ct.c_int32()
