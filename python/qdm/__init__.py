@@ -197,9 +197,11 @@ class PcarSpectrum(NamedTuple):
 
 
 def _modes(rows, k):
-    """k values of each of `rows` mode arrays, from one allocation."""
+    """Room for k values of each of `rows` mode arrays, in one allocation, and
+    the addresses of its rows."""
     block = _np.empty((rows, max(k, 1)))
-    return block, [block[i] for i in range(rows)]
+    base, stride = _addressof(_from_buffer(block)), block.strides[0]
+    return block, [base + i * stride for i in range(rows)]
 
 
 def _axis(f0, df, count):
@@ -240,18 +242,14 @@ def prony(x, *, order, fs=1.0, real_signal=False):
     one mode per conjugate pair."""
     x, c = _signal(x, "prony")
     n, p = x.shape[0], _int(order)
-    block, (amp, ph, dmp, fr) = _modes(4, _room(p, n))
+    block, rows = _modes(4, _room(p, n))
     count = _ct.c_int32()
     args = (_addr(x), n, p, _fs(fs))
     flag = _real_flag(real_signal, c, "prony")
     if not c:
         args += (flag,)
-    stride = block.strides[0]
-    base = _addr(block)
-    _check(_fn["prony", _kind(c)](*args, base, base + stride, base + 2 * stride,
-                                  base + 3 * stride, _ct.byref(count)), "prony")
-    k = count.value
-    return PronyFit(amp[:k], ph[:k], dmp[:k], fr[:k])
+    _check(_fn["prony", _kind(c)](*args, *rows, _ct.byref(count)), "prony")
+    return PronyFit(*block[:, :count.value])
 
 
 def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False):
@@ -262,19 +260,15 @@ def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False):
     n = x.shape[0]
     L = n // 3 if pencil is None else _int(pencil)
     M = _int(modes)
-    block, (amp, ph, dmp, fr) = _modes(4, _room(M, n))
+    block, rows = _modes(4, _room(M, n))
     count, mse = _ct.c_int32(), _ct.c_double()
     args = (_addr(x), n, L, M, _fs(fs))
     flag = _real_flag(real_signal, c, "matrix_pencil")
     if not c:
         args += (flag,)
-    stride = block.strides[0]
-    base = _addr(block)
-    _check(_fn["matrix_pencil", _kind(c)](*args, base, base + stride, base + 2 * stride,
-                                          base + 3 * stride, _ct.byref(count),
-                                          _ct.byref(mse)), "matrix_pencil")
-    k = count.value
-    return PencilFit(amp[:k], ph[:k], dmp[:k], fr[:k], mse.value)
+    _check(_fn["matrix_pencil", _kind(c)](*args, *rows, _ct.byref(count), _ct.byref(mse)),
+           "matrix_pencil")
+    return PencilFit(*block[:, :count.value], mse.value)
 
 
 def mdl_order(x, *, max_order=None, min_order=1):
@@ -312,18 +306,13 @@ def pcar_psd(x, *, order, components, points=512, fs=1.0, real_signal=False):
     n, p, k, pts = x.shape[0], _int(order), _int(components), _int(points)
     N = _clib.qdm_spectrum_length(pts)
     spec = _np.empty(max(N, 1))
-    block, (amp, ph, fr) = _modes(3, _room(k, n))
+    block, rows = _modes(3, _room(k, n))
     count = _ct.c_int32()
     f0, df, err = _ct.c_double(), _ct.c_double(), _ct.c_double()
     args = (_addr(x), n, p, pts, k, _fs(fs))
     flag = _real_flag(real_signal, c, "pcar_psd")
     if not c:
         args += (flag,)
-    stride = block.strides[0]
-    base = _addr(block)
-    _check(_fn["pcar_psd", _kind(c)](*args, base, base + stride, base + 2 * stride,
-                                     _ct.byref(count), _addr(spec), _ct.byref(f0),
-                                     _ct.byref(df), _ct.byref(err)), "pcar_psd")
-    m = count.value
-    return PcarSpectrum(_axis(f0.value, df.value, N), spec, amp[:m], ph[:m], fr[:m],
-                        err.value)
+    _check(_fn["pcar_psd", _kind(c)](*args, *rows, _ct.byref(count), _addr(spec),
+                                     _ct.byref(f0), _ct.byref(df), _ct.byref(err)), "pcar_psd")
+    return PcarSpectrum(_axis(f0.value, df.value, N), spec, *block[:, :count.value], err.value)
