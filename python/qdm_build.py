@@ -34,7 +34,7 @@ def _installed_library():
         libdir = subprocess.run(["pkg-config", "--variable=libdir", "qdm"], capture_output=True,
                                 text=True, check=True).stdout.strip()
         if os.path.exists(os.path.join(libdir, SONAME)):
-            return os.path.join(libdir, SONAME)
+            return os.path.normpath(os.path.join(libdir, SONAME))
     except (OSError, subprocess.CalledProcessError):
         pass
     for d in ("/usr/local/lib", "/usr/lib", "/usr/lib/x86_64-linux-gnu"):
