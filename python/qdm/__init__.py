@@ -111,7 +111,9 @@ def _signal(x, function):
     if a.ndim != 1:
         raise ArgumentError(None, f"x must be one-dimensional, not {a.ndim}-D "
                                   f"of shape {a.shape}", function)
-    return _signal(_np.ascontiguousarray(a, dtype=dt), function)
+    if a.shape[0] > _INT32_MAX:
+        raise ArgumentError(None, "more than 2^31 - 1 samples", function)
+    return _np.ascontiguousarray(a, dtype=dt), dt is _C128
 
 
 def _int(v):
