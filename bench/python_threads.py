@@ -2,15 +2,21 @@
 in sequence: the binding releases the GIL for every fit, so the threads run on
 every core. Each thread's results are checked against the single-thread ones.
 
-    python3 bench/python_threads.py [fits per thread]"""
+    python3 bench/python_threads.py [fits per thread]
+
+Run with a single-threaded BLAS: Debian's default libblas is OpenBLAS's pthread
+build, whose own thread pool, called from eight threads at once on a small
+machine, slows every fit tenfold and more. The script sets
+OPENBLAS_NUM_THREADS=1 unless the caller chose a value."""
 import os
 import sys
 import threading
 import time
 
-import numpy as np
+os.environ.setdefault("OPENBLAS_NUM_THREADS", "1")  # before numpy loads OpenBLAS
+import numpy as np  # noqa: E402
 
-import qdm
+import qdm  # noqa: E402
 
 THREADS = 8
 per_thread = int(sys.argv[1]) if len(sys.argv) > 1 else 40
@@ -47,7 +53,8 @@ t_thr = time.perf_counter() - t0
 same = all(np.array_equal(a.frequency, b.frequency) and np.array_equal(a.amplitude, b.amplitude)
            and a.mse == b.mse for s, p in zip(sequential, threaded) for a, b in zip(s, p))
 fits = THREADS * per_thread
-print(f"{fits} matrix-pencil fits (n=512, L=170, 8 modes, complex) on {os.cpu_count()} cores")
+print(f"{fits} matrix-pencil fits (n=512, L=170, 8 modes, complex) on {os.cpu_count()} cores, "
+      f"OPENBLAS_NUM_THREADS={os.environ['OPENBLAS_NUM_THREADS']}")
 print(f"  one thread in sequence: {t_seq:.3f} s ({t_seq / fits * 1e3:.2f} ms/fit)")
 print(f"  {THREADS} threads at once:     {t_thr:.3f} s ({t_thr / fits * 1e3:.2f} ms/fit)")
 print(f"  speed-up {t_seq / t_thr:.2f}x; every thread got the single-thread results: {same}")
