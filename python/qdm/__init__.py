@@ -292,12 +292,12 @@ def covariance_psd(x, *, order, points=512, fs=1.0):
     x, c = _signal(x, "covariance_psd")
     n, p, pts = x.shape[0], _int(order), _int(points)
     N = _clib.qdm_spectrum_length(pts)
-    spec = _np.empty(max(N, 1))
+    db = _np.empty(max(N, 1))
     f0, df, nv = _ct.c_double(), _ct.c_double(), _ct.c_double()
-    _check(_fn["covariance_psd", _kind(c)](_addr(x), n, p, pts, _fs(fs), _addr(spec),
+    _check(_fn["covariance_psd", _kind(c)](_addr(x), n, p, pts, _fs(fs), _addr(db),
                                            _ct.byref(f0), _ct.byref(df), _ct.byref(nv)),
            "covariance_psd")
-    return CovarianceSpectrum(_axis(f0.value, df.value, N), spec, nv.value)
+    return CovarianceSpectrum(_axis(f0.value, df.value, N), db, nv.value)
 
 
 def pcar_psd(x, *, order, components, points=512, fs=1.0, real_signal=False):
@@ -307,7 +307,7 @@ def pcar_psd(x, *, order, components, points=512, fs=1.0, real_signal=False):
     x, c = _signal(x, "pcar_psd")
     n, p, k, pts = x.shape[0], _int(order), _int(components), _int(points)
     N = _clib.qdm_spectrum_length(pts)
-    spec = _np.empty(max(N, 1))
+    db = _np.empty(max(N, 1))
     block, rows = _modes(3, _room(k, n))
     count = _ct.c_int32()
     f0, df, err = _ct.c_double(), _ct.c_double(), _ct.c_double()
@@ -315,6 +315,6 @@ def pcar_psd(x, *, order, components, points=512, fs=1.0, real_signal=False):
     flag = _real_flag(real_signal, c, "pcar_psd")
     if not c:
         args += (flag,)
-    _check(_fn["pcar_psd", _kind(c)](*args, *rows, _ct.byref(count), _addr(spec),
+    _check(_fn["pcar_psd", _kind(c)](*args, *rows, _ct.byref(count), _addr(db),
                                      _ct.byref(f0), _ct.byref(df), _ct.byref(err)), "pcar_psd")
-    return PcarSpectrum(_axis(f0.value, df.value, N), spec, *block[:, :count.value], err.value)
+    return PcarSpectrum(_axis(f0.value, df.value, N), db, *block[:, :count.value], err.value)
