@@ -5,12 +5,15 @@
 # UndefinedBehaviorSanitizer build, then the Windows DLL under wine
 # (scripts/windows.sh). Installs what is missing on a fresh Debian
 # 12 machine (run as root). The last lines printed are ctest's own summary; the
-# exit status is non-zero if any suite failed.
+# exit status is non-zero if any suite failed. The Python package (python/) is
+# tested in both builds as ctest tests: python.pytest, and python.install (pip,
+# offline, into a virtual environment).
 set -uo pipefail
 cd "$(dirname "$0")/.."
 scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
   libopenblas0-serial libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev \
-  python3-numpy pkg-config doxygen dpkg-dev || exit 1
+  python3-numpy python3-pytest python3-matplotlib python3-venv python3-pip \
+  pkg-config doxygen dpkg-dev || exit 1
 
 jobs=$(nproc)
 failed=0

@@ -1,0 +1,80 @@
+"""Loading libqdm_api and declaring its functions for ctypes."""
+import ctypes
+import ctypes.util
+import os
+
+try:  # written by the wheel builder: where the library was found at install
+    from qdm._where import LIBRARY as _INSTALLED
+except ImportError:
+    _INSTALLED = None
+
+_HERE = os.path.dirname(os.path.abspath(__file__))
+SONAME = "libqdm_api.so.1"
+
+
+def _candidates():
+    """The libraries to try, first found wins: $QDM_LIBRARY, the copy bundled
+    into the package, the one recorded at install, then the loader's own
+    search (ldconfig's cache, the standard directories)."""
+    if os.environ.get("QDM_LIBRARY"):
+        yield os.environ["QDM_LIBRARY"]
+        return
+    bundled = os.path.join(_HERE, SONAME)
+    if os.path.exists(bundled):
+        yield bundled
+    if _INSTALLED:
+        yield _INSTALLED
+    yield SONAME
+    found = ctypes.util.find_library("qdm_api")
+    if found:
+        yield found
+
+
+def _load():
+    tried = []
+    for path in _candidates():
+        try:
+            return ctypes.CDLL(path)
+        except OSError as e:
+            tried.append(f"{path}: {e}")
+    raise ImportError("qdm: cannot load libqdm_api (set QDM_LIBRARY to its path, or build it "
+                      "and reinstall the package):\n  " + "\n  ".join(tried))
+
+
+lib = _load()
+
+_P = ctypes.c_void_p
+_I = ctypes.c_int32
+_D = ctypes.c_double
+
+# name: argument types after the leading (x, n) pair, for the real twin; the
+# complex twin is the same without real_signal (marked R).
+_SIGNATURES = {
+    "covariance": [_I, _P, _P, _P],
+    "pcar": [_I, _I, _P, _P],
+    "prony": [_I, _D, "R", _P, _P, _P, _P, _P],
+    "matrix_pencil": [_I, _I, _D, "R", _P, _P, _P, _P, _P, _P],
+    "mdl_order": [_I, _I, _P],
+    "covariance_psd": [_I, _I, _D, _P, _P, _P, _P],
+    "pcar_psd": [_I, _I, _I, _D, "R", _P, _P, _P, _P, _P, _P, _P, _P],
+}
+
+functions = {}
+for _name, _args in _SIGNATURES.items():
+    for _kind in ("real", "complex"):
+        _f = getattr(lib, f"qdm_{_name}_{_kind}")
+        _f.restype = _I
+        _f.argtypes = [_P, _I] + [_I if a == "R" else a for a in _args
+                                  if not (a == "R" and _kind == "complex")]
+        functions[_name, _kind] = _f
+
+lib.qdm_status_text.restype = ctypes.c_char_p
+lib.qdm_status_text.argtypes = [_I]
+lib.qdm_spectrum_length.restype = _I
+lib.qdm_spectrum_length.argtypes = [_I]
+lib.qdm_version.restype = ctypes.c_char_p
+lib.qdm_version.argtypes = []
+
+
+def status_text(code):
+    return lib.qdm_status_text(code).decode()
