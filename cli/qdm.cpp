@@ -1,12 +1,8 @@
-// qdm: the command-line tool over the plain C API (libqdm_api).
-//
-// One method per run, on a signal read from a CSV file, standard input or the
-// built-in example; results as a table, JSON or CSV on standard output, and a
-// plot drawn with gnuplot. With several files (or --jobs) each file is fitted
-// on a pool of threads and printed as one JSON line, in input order.
-//
-// Exit status: 0 success, 1 bad usage or input, 2 a library status (in batch
-// mode: any record failed), 3 an output that cannot be written.
+// qdm: the command-line tool over the plain C API (libqdm_api). One method per run on a CSV
+// file, standard input or the built-in example; a table, JSON or CSV on standard output, and a
+// plot drawn with gnuplot. With several files (or --jobs) the files are fitted on a pool of
+// threads and printed as JSON lines, in input order. Exit status: 0 success, 1 bad usage or
+// input, 2 a library status (several files: any record failed), 3 an output not written.
 #include <unistd.h>
 
 #include <algorithm>
@@ -27,10 +23,9 @@
 #include <utility>
 #include <vector>
 
-#include <CLI/CLI.hpp>
-#include <nlohmann/json.hpp>
-
+#include "CLI/CLI.hpp"
 #include "example_signal.h"
+#include "nlohmann/json.hpp"
 #include "qdm_api.h"
 
 namespace {
@@ -51,11 +46,8 @@ constexpr unsigned Bit(Method m) { return 1u << m; }
 constexpr unsigned kSpectra = Bit(kCovSpectrum) | Bit(kPcarSpectrum);
 constexpr unsigned kModal = Bit(kProny) | Bit(kPencil) | Bit(kPcarSpectrum);
 
-struct MethodInfo {
-  const char* name;
-  const char* title;
-};
-constexpr MethodInfo kMethods[] = {
+constexpr const char* kMethods[][2] = {
+    // name, title
     {"covariance", "covariance-method AR: coefficients, poles, noise variance"},
     {"prony", "Prony damped exponentials"},
     {"pcar", "principal-component AR: coefficients and roots"},
@@ -78,35 +70,42 @@ struct Options {
 // The integer parameters, and the methods each applies to.
 struct IntOption {
   const char* flag;
+  const char* key;
   std::optional<int32_t> Options::*field;
+  int32_t fallback;  // pencil: n/3, prony's order: 6
   const char* help;
   unsigned methods;
 };
 const IntOption kIntOptions[] = {
-    {"--order", &Options::order, "model order p [12; prony 6]",
+    {"--order", "order", &Options::order, 12, "model order p [12; prony 6]",
      Bit(kCovariance) | Bit(kProny) | Bit(kPcar) | kSpectra},
-    {"--components", &Options::components, "singular components / modes k [6]",
+    {"--components", "components", &Options::components, 6, "singular components / modes k [6]",
      Bit(kPcar) | Bit(kPcarSpectrum)},
-    {"--pencil", &Options::pencil, "pencil parameter L [n/3]", Bit(kPencil)},
-    {"--modes", &Options::modes, "number of modes M [6]", Bit(kPencil)},
-    {"--upper", &Options::upper, "upper order L [16]", Bit(kMdl)},
-    {"--min-order", &Options::minOrder, "smallest order tried [1]", Bit(kMdl)},
-    {"--points", &Options::points, "spectrum points, rounded up to a power of two [512]",
-     kSpectra},
+    {"--pencil", "pencil", &Options::pencil, 0, "pencil parameter L [n/3]", Bit(kPencil)},
+    {"--modes", "modes", &Options::modes, 6, "number of modes M [6]", Bit(kPencil)},
+    {"--upper", "upper", &Options::upper, 16, "upper order L [16]", Bit(kMdl)},
+    {"--min-order", "min_order", &Options::minOrder, 1, "smallest order tried [1]", Bit(kMdl)},
+    {"--points", "points", &Options::points, 512,
+     "spectrum points, rounded up to a power of two [512]", kSpectra},
 };
-
-// ---- the signal -------------------------------------------------------------------
 
 struct Signal {
   bool complex = false;
   std::vector<double> values;  // n reals, or n (re, im) pairs
   int32_t n = 0;
   double defaultRate = 1.0;
+  // The samples as either twin takes them.
+  operator const double*() const { return values.data(); }
+  operator const qdm_complex*() const {
+    return reinterpret_cast<const qdm_complex*>(values.data());
+  }
 };
 
+[[noreturn]] void Bad(const std::string& message) { throw Failure{kUsage, {}, message}; }
+
 std::string Trim(const std::string& s) {
-  const size_t b = s.find_first_not_of(" \t\r");
-  return b == std::string::npos ? "" : s.substr(b, s.find_last_not_of(" \t\r") - b + 1);
+  const size_t b = s.find_first_not_of(" \t\r\n");
+  return b == std::string::npos ? "" : s.substr(b, s.find_last_not_of(" \t\r\n") - b + 1);
 }
 
 bool ToDouble(const std::string& field, double* v) {
@@ -136,22 +135,18 @@ Signal ReadCsv(std::istream& in, const std::string& name) {
         std::none_of(fields.begin(), fields.end(), [&](auto& f) { return ToDouble(f, &v); }))
       continue;  // a header
     if (columns == 0) columns = fields.size();
-    if (columns > 2)
-      throw Failure{kUsage, {}, where + std::to_string(columns) + " columns; expected 1 or 2"};
+    if (columns > 2) Bad(where + std::to_string(columns) + " columns; expected 1 or 2");
     if (fields.size() != columns)
-      throw Failure{kUsage, {}, where + std::to_string(fields.size()) + " fields, expected " +
-                                    std::to_string(columns)};
+      Bad(where + std::to_string(fields.size()) + " fields, expected " + std::to_string(columns));
     for (size_t c = 0; c < columns; ++c) {
       if (!ToDouble(fields[c], &v))
-        throw Failure{kUsage, {},
-                      where + "field " + std::to_string(c + 1) + " '" + fields[c] +
-                          "' is not a number"};
+        Bad(where + "field " + std::to_string(c + 1) + " '" + fields[c] + "' is not a number");
       s.values.push_back(v);
     }
   }
-  if (in.bad()) throw Failure{kUsage, {}, "error reading " + name};
-  if (columns == 0) throw Failure{kUsage, {}, name + ": no samples"};
-  if (s.values.size() / columns > INT32_MAX) throw Failure{kUsage, {}, name + ": too many samples"};
+  if (in.bad()) Bad("error reading " + name);
+  if (columns == 0) Bad(name + ": no samples");
+  if (s.values.size() / columns > INT32_MAX) Bad(name + ": too many samples");
   s.complex = columns == 2;
   s.n = static_cast<int32_t>(s.values.size() / columns);
   return s;
@@ -168,11 +163,9 @@ Signal Load(const std::string& path, const Options& o) {
   }
   if (path == "-") return ReadCsv(std::cin, "standard input");
   std::ifstream in(path);
-  if (!in) throw Failure{kUsage, {}, "cannot read " + path + ": " + std::strerror(errno)};
+  if (!in) Bad("cannot read " + path + ": " + std::strerror(errno));
   return ReadCsv(in, path);
 }
-
-// ---- running a method ------------------------------------------------------------
 
 struct Record {
   Json json;  // input, method, signal, parameters, status, results (or error)
@@ -180,187 +173,122 @@ struct Record {
   std::string warning;
 };
 
-void Check(int32_t status, const char* function, Record& r) {
+void Check(int32_t status, const char* function, bool complex, Record& r) {
   r.status = status;
   if (status == QDM_WARN_RANK_DEFICIENT) r.warning = qdm_status_text(status);
-  else if (status != QDM_OK)
-    throw Failure{kLibrary, status,
-                  std::string(function) + " returned " + std::to_string(status) + ": " +
-                      qdm_status_text(status)};
+  if (status == QDM_OK || status == QDM_WARN_RANK_DEFICIENT) return;
+  throw Failure{kLibrary, status,
+                function + std::string(complex ? "_complex" : "_real") + " returned " +
+                    std::to_string(status) + ": " + qdm_status_text(status)};
+}
+
+// A caller-allocated output that passes as either twin's pointer type.
+struct Array {
+  std::vector<double> v;
+  explicit Array(size_t doubles) : v(std::max<size_t>(doubles, 2)) {}
+  operator double*() { return v.data(); }
+  operator qdm_complex*() { return reinterpret_cast<qdm_complex*>(v.data()); }
+};
+
+// The twins of a plain-API function that take the same arguments after the samples.
+#define QDM_TWIN(fn, ...) \
+  Check(s.complex ? fn##_complex(s, __VA_ARGS__) : fn##_real(s, __VA_ARGS__), #fn, s.complex, r)
+
+// Rows of named columns: row i of column c is values[c][i * stride]; null columns are left out.
+Json Rows(std::initializer_list<const char*> names, std::vector<const double*> values, size_t n,
+          size_t stride = 1) {
+  Json t = Json::array();
+  for (size_t i = 0; i < n; ++i) {
+    Json row = Json::object();
+    size_t c = 0;
+    for (const char* name : names)
+      if (const double* column = values[c++]) row[name] = column[i * stride];
+    t.push_back(row);
+  }
+  return t;
 }
 
 // Complex values (pairs) with their modulus and frequency.
-Json Poles(const std::vector<double>& z, double rate) {
+Json Poles(const double* z, size_t n, double rate) {
   Json t = Json::array();
-  for (size_t i = 0; i + 1 < z.size(); i += 2)
-    t.push_back({{"real", z[i]}, {"imag", z[i + 1]}, {"modulus", std::hypot(z[i], z[i + 1])},
+  for (size_t i = 0; i < 2 * n; i += 2)
+    t.push_back({{"real", z[i]},
+                 {"imag", z[i + 1]},
+                 {"modulus", std::hypot(z[i], z[i + 1])},
                  {"frequency_hz", std::atan2(z[i + 1], z[i]) * rate / (2.0 * kPi)}});
-  return t;
-}
-
-Json Coefficients(const std::vector<double>& a, bool complex) {
-  Json t = Json::array();
-  for (size_t i = 0; i < a.size(); i += complex ? 2 : 1)
-    t.push_back(complex ? Json{{"real", a[i]}, {"imag", a[i + 1]}} : Json{{"value", a[i]}});
-  return t;
-}
-
-struct Modes {
-  std::vector<double> amplitude, phase, damping, frequency;
-  int32_t count = 0;
-  explicit Modes(int32_t room)
-      : amplitude(std::max(room, 1)), phase(amplitude), damping(amplitude), frequency(amplitude) {}
-  Json Table(bool withDamping) const {
-    Json t = Json::array();
-    for (int32_t i = 0; i < count; ++i) {
-      Json row = {{"amplitude", amplitude[i]}, {"phase_rad", phase[i]}};
-      if (withDamping) row["damping"] = damping[i];
-      row["frequency_hz"] = frequency[i];
-      t.push_back(row);
-    }
-    return t;
-  }
-};
-
-// The highest local maxima of the periodic spectrum; non-negative half for real data.
-Json Peaks(const std::vector<double>& db, double f0, double df, bool realData, size_t count) {
-  const size_t L = db.size();
-  std::vector<std::pair<double, size_t>> peaks;
-  for (size_t j = realData ? L / 2 : 0; j < L && L >= 3; ++j)
-    if (db[j] >= db[(j + L - 1) % L] && db[j] > db[(j + 1) % L]) peaks.push_back({db[j], j});
-  std::stable_sort(peaks.begin(), peaks.end(), [](auto& a, auto& b) { return a.first > b.first; });
-  Json t = Json::array();
-  for (size_t i = 0; i < peaks.size() && i < count; ++i)
-    t.push_back({{"frequency_hz", f0 + static_cast<double>(peaks[i].second) * df},
-                 {"db", peaks[i].first}});
   return t;
 }
 
 Record Fit(Method m, const Options& o, const std::string& input, const Signal& s) {
   Record r;
-  const double* x = s.values.data();
-  const auto* cx = reinterpret_cast<const qdm_complex*>(s.values.data());
   const double rate = o.rate.value_or(s.defaultRate);
-  const int32_t flag = o.realSignal ? 1 : 0;
-  const int32_t p = o.order.value_or(m == kProny ? 6 : 12), k = o.components.value_or(6);
+  const int32_t flag = o.realSignal ? 1 : 0, n = s.n;
+  int32_t resolved[std::size(kIntOptions)];
+  for (size_t i = 0; i < std::size(kIntOptions); ++i)
+    resolved[i] = (o.*kIntOptions[i].field).value_or(kIntOptions[i].fallback);
+  if (!o.order && m == kProny) resolved[0] = 6;
+  if (!o.pencil) resolved[2] = n / 3;
+  const auto [p, k, L, M, upper, minOrder, points] = resolved;
   Json par = Json::object(), res = Json::object();
+  for (size_t i = 0; i < std::size(kIntOptions); ++i)
+    if (kIntOptions[i].methods & Bit(m)) par[kIntOptions[i].key] = resolved[i];
+  if (m != kMdl) par["rate_hz"] = rate;
+  if ((kModal & Bit(m)) && !s.complex) par["real_signal"] = flag;
+  // Outputs are sized from parameters the library accepts (orders below n).
+  const size_t room = std::clamp(std::max({p, k, M}), 1, std::max(n, 1)) + 1;
+  Array a(2 * room), z(2 * room), amp(room), phase(room), damping(room), freq(room);
+  Array db(std::max(qdm_spectrum_length(points), 1));
+  double variance = 0.0, mse = 0.0, f0 = 0.0, df = 0.0, fitError = 0.0;
+  int32_t count = 0, order = 0;
   switch (m) {
-    case kCovariance:
-    case kPcar: {
-      par["order"] = p;
-      if (m == kPcar) par["components"] = k;
-      par["rate_hz"] = rate;
-      std::vector<double> a((s.complex ? 2 : 1) * (std::max(p, 0) + 1)), z(2 * std::max(p, 1));
-      auto* za = reinterpret_cast<qdm_complex*>(a.data());
-      auto* zz = reinterpret_cast<qdm_complex*>(z.data());
-      double variance = 0.0;
-      if (m == kCovariance) {
-        const int32_t st = s.complex ? qdm_covariance_complex(cx, s.n, p, za, zz, &variance)
-                                     : qdm_covariance_real(x, s.n, p, a.data(), zz, &variance);
-        Check(st, s.complex ? "qdm_covariance_complex" : "qdm_covariance_real", r);
-        res["noise_variance"] = variance;
-      } else {
-        const int32_t st = s.complex ? qdm_pcar_complex(cx, s.n, p, k, za, zz)
-                                     : qdm_pcar_real(x, s.n, p, k, a.data(), zz);
-        Check(st, s.complex ? "qdm_pcar_complex" : "qdm_pcar_real", r);
-      }
-      z.resize(2 * std::max(p, 0));
-      res["coefficients"] = Coefficients(a, s.complex);
-      res[m == kCovariance ? "poles" : "roots"] = Poles(z, rate);
-      break;
-    }
-    case kProny:
-    case kPencil: {
-      const int32_t L = o.pencil.value_or(s.n / 3), M = o.modes.value_or(6);
-      if (m == kPencil) {
-        par["pencil"] = L;
-        par["modes"] = M;
-      } else {
-        par["order"] = p;
-      }
-      par["rate_hz"] = rate;
-      if (!s.complex) par["real_signal"] = flag;
-      Modes md(m == kProny ? p : M);
-      double mse = 0.0;
-      int32_t st;
-      if (m == kProny)
-        st = s.complex ? qdm_prony_complex(cx, s.n, p, rate, md.amplitude.data(), md.phase.data(),
-                                           md.damping.data(), md.frequency.data(), &md.count)
-                       : qdm_prony_real(x, s.n, p, rate, flag, md.amplitude.data(),
-                                        md.phase.data(), md.damping.data(), md.frequency.data(),
-                                        &md.count);
-      else
-        st = s.complex
-                 ? qdm_matrix_pencil_complex(cx, s.n, L, M, rate, md.amplitude.data(),
-                                             md.phase.data(), md.damping.data(),
-                                             md.frequency.data(), &md.count, &mse)
-                 : qdm_matrix_pencil_real(x, s.n, L, M, rate, flag, md.amplitude.data(),
-                                          md.phase.data(), md.damping.data(),
-                                          md.frequency.data(), &md.count, &mse);
-      Check(st, m == kProny ? (s.complex ? "qdm_prony_complex" : "qdm_prony_real")
-                            : (s.complex ? "qdm_matrix_pencil_complex" : "qdm_matrix_pencil_real"),
-            r);
-      res["mode_count"] = md.count;
-      if (m == kPencil) res["mse"] = mse;
-      res["modes"] = md.Table(true);
-      break;
-    }
-    case kMdl: {
-      const int32_t upper = o.upper.value_or(16), minOrder = o.minOrder.value_or(1);
-      par["upper"] = upper;
-      par["min_order"] = minOrder;
-      int32_t order = 0;
-      const int32_t st = s.complex ? qdm_mdl_order_complex(cx, s.n, upper, minOrder, &order)
-                                   : qdm_mdl_order_real(x, s.n, upper, minOrder, &order);
-      Check(st, s.complex ? "qdm_mdl_order_complex" : "qdm_mdl_order_real", r);
-      res["order"] = order;
-      break;
-    }
+    case kCovariance: QDM_TWIN(qdm_covariance, n, p, a, z, &variance); break;
+    case kPcar: QDM_TWIN(qdm_pcar, n, p, k, a, z); break;
+    case kMdl: QDM_TWIN(qdm_mdl_order, n, upper, minOrder, &order); break;
     case kCovSpectrum:
-    case kPcarSpectrum: {
-      const bool pcar = m == kPcarSpectrum;
-      const int32_t points = o.points.value_or(512);
-      par["order"] = p;
-      if (pcar) par["components"] = k;
-      par["points"] = points;
-      par["rate_hz"] = rate;
-      if (pcar && !s.complex) par["real_signal"] = flag;
-      std::vector<double> db(std::max(qdm_spectrum_length(points), 1));
-      Modes md(k);
-      double f0 = 0.0, df = 0.0, variance = 0.0, fitError = 0.0;
-      int32_t st;
-      if (!pcar)
-        st = s.complex ? qdm_covariance_psd_complex(cx, s.n, p, points, rate, db.data(), &f0, &df,
-                                                    &variance)
-                       : qdm_covariance_psd_real(x, s.n, p, points, rate, db.data(), &f0, &df,
-                                                 &variance);
-      else
-        st = s.complex ? qdm_pcar_psd_complex(cx, s.n, p, points, k, rate, md.amplitude.data(),
-                                              md.phase.data(), md.frequency.data(), &md.count,
-                                              db.data(), &f0, &df, &fitError)
-                       : qdm_pcar_psd_real(x, s.n, p, points, k, rate, flag, md.amplitude.data(),
-                                           md.phase.data(), md.frequency.data(), &md.count,
-                                           db.data(), &f0, &df, &fitError);
-      Check(st, pcar ? (s.complex ? "qdm_pcar_psd_complex" : "qdm_pcar_psd_real")
-                     : (s.complex ? "qdm_covariance_psd_complex" : "qdm_covariance_psd_real"),
-            r);
-      if (pcar) {
-        res["fit_error"] = fitError;
-        res["mode_count"] = md.count;
-        res["modes"] = md.Table(false);
-      } else {
-        res["noise_variance"] = variance;
-      }
-      // As many peaks as the model holds modes: half of them for real data.
-      const size_t peaks = pcar ? std::max(k, 1) : 6;
-      res["peaks"] = Peaks(db, f0, df, !s.complex, s.complex ? peaks : (peaks + 1) / 2);
-      res["spectrum"] = {{"f0_hz", f0}, {"df_hz", df}, {"length", db.size()}, {"db", db}};
+      QDM_TWIN(qdm_covariance_psd, n, p, points, rate, db, &f0, &df, &variance);
       break;
-    }
+    case kProny:  // the real twins of these three take the real-signal flag
+      Check(s.complex ? qdm_prony_complex(s, n, p, rate, amp, phase, damping, freq, &count)
+                      : qdm_prony_real(s, n, p, rate, flag, amp, phase, damping, freq, &count),
+            "qdm_prony", s.complex, r);
+      break;
+    case kPencil:
+      Check(s.complex ? qdm_matrix_pencil_complex(s, n, L, M, rate, amp, phase, damping, freq,
+                                                  &count, &mse)
+                      : qdm_matrix_pencil_real(s, n, L, M, rate, flag, amp, phase, damping, freq,
+                                               &count, &mse),
+            "qdm_matrix_pencil", s.complex, r);
+      break;
+    case kPcarSpectrum:
+      Check(s.complex ? qdm_pcar_psd_complex(s, n, p, points, k, rate, amp, phase, freq, &count, db,
+                                             &f0, &df, &fitError)
+                      : qdm_pcar_psd_real(s, n, p, points, k, rate, flag, amp, phase, freq, &count,
+                                          db, &f0, &df, &fitError),
+            "qdm_pcar_psd", s.complex, r);
+      break;
+  }
+  if (m == kCovariance || m == kCovSpectrum) res["noise_variance"] = variance;
+  if (m == kCovariance || m == kPcar) {
+    const double* c = a;
+    res["coefficients"] =
+        s.complex ? Rows({"real", "imag"}, {c, c + 1}, p + 1, 2) : Rows({"value"}, {c}, p + 1);
+    res[m == kPcar ? "roots" : "poles"] = Poles(z, p, rate);
+  }
+  if (m == kMdl) res["order"] = order;
+  if (m == kPcarSpectrum) res["fit_error"] = fitError;
+  if (m == kPencil) res["mse"] = mse;
+  if (kModal & Bit(m)) {
+    res["mode_count"] = count;
+    res["modes"] = Rows({"amplitude", "phase_rad", "damping", "frequency_hz"},
+                        {amp, phase, m == kPcarSpectrum ? nullptr : damping.v.data(), freq}, count);
+  }
+  if (kSpectra & Bit(m)) {
+    db.v.resize(qdm_spectrum_length(points));
+    res["spectrum"] = {{"f0_hz", f0}, {"df_hz", df}, {"length", db.v.size()}, {"db", db.v}};
   }
   r.json = {{"input", input},
-            {"method", kMethods[m].name},
-            {"signal", {{"type", s.complex ? "complex" : "real"}, {"samples", s.n}}},
+            {"method", kMethods[m][0]},
+            {"signal", {{"type", s.complex ? "complex" : "real"}, {"samples", n}}},
             {"parameters", par},
             {"status", r.status}};
   if (!r.warning.empty()) r.json["warning"] = r.warning;
@@ -368,188 +296,167 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   return r;
 }
 
-// ---- output -----------------------------------------------------------------------
-
-// Shortest text that reads back as the same double; nan, inf, -inf otherwise.
-std::string Exact(double v) {
-  char buf[32];
-  return std::string(buf, std::to_chars(buf, buf + sizeof buf, v).ptr);
+// Shortest text that reads back as the same double (null, for NaN: nan).
+std::string Exact(const Json& v) {
+  char b[32];
+  return std::string(b, std::to_chars(b, b + sizeof b, v.is_null() ? NAN : v.get<double>()).ptr);
 }
 
 std::string Brief(const Json& v) {
-  if (!v.is_number_float()) return v.dump();
   char buf[32];
-  std::snprintf(buf, sizeof buf, "%.8g", v.get<double>());
-  return buf;
+  std::snprintf(buf, sizeof buf, "%.8g", v.is_null() ? NAN : v.get<double>());
+  return v.is_number_float() || v.is_null() ? buf : v.dump();
+}
+
+std::string Padded(const std::string& text, size_t width) {
+  return std::string(width > text.size() ? width - text.size() : 1, ' ') + text;
 }
 
 std::string Table(const Json& j) {
   const std::string input = j["input"];
   std::string out = "qdm " + j["method"].get<std::string>() + ": " +
                     (input == "-" ? "standard input" : input) + ", " +
-                    j["signal"]["type"].get<std::string>() + ", " +
-                    std::to_string(j["signal"]["samples"].get<int>()) + " samples\nparameters:";
+                    j["signal"]["type"].get<std::string>() + ", " + j["signal"]["samples"].dump() +
+                    " samples\nparameters:";
   for (const auto& [key, v] : j["parameters"].items()) out += " " + key + " = " + Brief(v);
   out += "\n\n";
   for (const auto& [key, v] : j["results"].items())
-    if (v.is_primitive()) out += key + std::string(16 - std::min<size_t>(key.size(), 15), ' ') + Brief(v) + "\n";
+    if (v.is_primitive()) out += key + Padded(Brief(v), 30 - key.size()) + "\n";
   for (const auto& [key, v] : j["results"].items()) {
     if (key == "spectrum") {
-      out += "\nspectrum: " + std::to_string(v["length"].get<int>()) + " values in dB from " +
-             Brief(v["f0_hz"]) + " Hz in steps of " + Brief(v["df_hz"]) + " Hz (--csv lists them)\n";
+      out += "\nspectrum: " + v["length"].dump() + " values in dB from " + Brief(v["f0_hz"]) +
+             " Hz in steps of " + Brief(v["df_hz"]) + " Hz (--csv lists them)\n";
     } else if (v.is_array()) {
       out += "\n" + key + (v.empty() ? ": none\n" : "\n   #");
       if (!v.empty())
-        for (const auto& [column, _] : v[0].items()) out += std::string(17 - std::min<size_t>(column.size(), 16), ' ') + column;
+        for (const auto& [column, _] : v[0].items()) out += Padded(column, 17);
       for (size_t i = 0; i < v.size(); ++i) {
-        char index[32];
-        std::snprintf(index, sizeof index, "\n%4zu", i);
-        out += index;
-        for (const auto& cell : v[i]) {
-          const std::string text = Brief(cell);
-          out += std::string(17 - std::min<size_t>(text.size(), 16), ' ') + text;
-        }
+        out += "\n" + Padded(std::to_string(i), 4);
+        for (const Json& cell : v[i]) out += Padded(Brief(cell), 17);
       }
-      if (!v.empty()) out += "\n";
+      out += v.empty() ? "" : "\n";
     }
   }
   return out;
 }
 
-// The method's main table: spectrum, modes, coefficients, or the chosen order.
-std::string Csv(const Json& results) {
+// One table of the results as CSV, numbers exact: the spectrum (frequency_hz,
+// power_db) or an array of records (modes, coefficients, poles).
+std::string CsvTable(const Json& res, const std::string& key) {
   std::string out;
-  if (results.contains("spectrum")) {
-    const Json& s = results["spectrum"];
+  if (key == "spectrum") {
+    const Json& s = res[key];
     out = "frequency_hz,power_db\n";
-    const double f0 = s["f0_hz"], df = s["df_hz"];
     for (size_t i = 0; i < s["db"].size(); ++i)
-      out += Exact(f0 + static_cast<double>(i) * df) + "," +
-             Exact(s["db"][i].is_null() ? NAN : s["db"][i].get<double>()) + "\n";
-    return out;
+      out += Exact(s["f0_hz"].get<double>() + static_cast<double>(i) * s["df_hz"].get<double>()) +
+             "," + Exact(s["db"][i]) + "\n";
   }
-  for (const char* key : {"modes", "coefficients"})
-    if (results.contains(key)) {
-      const Json& t = results[key];
-      for (size_t i = 0; i < t.size(); ++i) {
-        std::string header, row;
-        for (const auto& [column, v] : t[i].items()) {
-          header += (header.empty() ? "" : ",") + column;
-          row += (row.empty() ? "" : ",") + Exact(v.is_null() ? NAN : v.get<double>());
-        }
-        out += (i == 0 ? header + "\n" : "") + row + "\n";
-      }
-      return out;
+  for (size_t i = 0; key != "spectrum" && i < res[key].size(); ++i) {
+    std::string header, row;
+    for (const auto& [column, v] : res[key][i].items()) {
+      header.append(",").append(column);
+      row.append(",").append(Exact(v));
     }
-  return "order\n" + results["order"].dump() + "\n";
-}
-
-std::string FindOnPath(const char* program) {
-  const char* path = std::getenv("PATH");
-  std::stringstream dirs(path ? path : "");
-  for (std::string dir; std::getline(dirs, dir, ':');) {
-    const std::string candidate = (dir.empty() ? "." : dir) + "/" + program;
-    if (access(candidate.c_str(), X_OK) == 0) return candidate;
+    out += (i == 0 ? header.substr(1) + "\n" : "") + row.substr(1) + "\n";
   }
-  return "";
+  return out;
 }
 
-std::string Quoted(const std::string& s, char quote, const std::string& escaped) {
-  std::string out(1, quote);
-  for (const char c : s) out += c == quote ? escaped : std::string(1, c);
-  return out + quote;
+// The method's main table: the spectrum, the modes, the coefficients, or the order.
+std::string Csv(const Json& res) {
+  for (const char* key : {"spectrum", "modes", "coefficients"})
+    if (res.contains(key)) return CsvTable(res, key);
+  return "order\n" + res["order"].dump() + "\n";
+}
+
+std::string Quoted(const std::string& s) {  // a gnuplot string
+  std::string out = "'";
+  for (const char c : s) out += c == '\'' ? std::string("''") : std::string(1, c);
+  return out + "'";
 }
 
 // Draws the spectrum (modes marked), the modes, or the poles; false: no gnuplot.
 bool Plot(const std::string& png, const Json& j) {
   const Json& res = j["results"];
-  if (!res.contains("spectrum") && !res.contains("modes") && !res.contains("coefficients"))
-    return true;  // mdl: nothing to draw
-  const std::string gnuplot = FindOnPath("gnuplot");
-  if (gnuplot.empty()) return false;
-  std::string title = "qdm " + j["method"].get<std::string>() + ", " +
-                      j["input"].get<std::string>() + ", parameters:";
-  for (const auto& [key, v] : j["parameters"].items()) title += " " + key + " " + Brief(v);
+  std::string key;
+  for (const char* k : {"spectrum", "modes", "poles", "roots"})
+    if (key.empty() && res.contains(k)) key = k;
+  if (key.empty()) return true;  // mdl: nothing to draw
+  if (std::system("command -v gnuplot >/dev/null 2>&1") != 0) return false;
+  std::string title =
+      "qdm " + j["method"].get<std::string>() + ", " + j["input"].get<std::string>();
+  for (const auto& [name, v] : j["parameters"].items()) title += ", " + name + " " + Brief(v);
   std::string script = "set terminal pngcairo size 1100,650 font 'DejaVu Sans,11'\nset output " +
-                       Quoted(png, '\'', "''") + "\nset title " + Quoted(title, '\'', "''") +
-                       " noenhanced\nset grid\nset key bottom right opaque box\n$d << EOD\n";
-  if (res.contains("spectrum")) {
-    const Json& s = res["spectrum"];
-    const double f0 = s["f0_hz"], df = s["df_hz"];
-    double low = 0.0;
-    for (size_t i = 0; i < s["db"].size(); ++i) {
-      const double v = s["db"][i].is_null() ? NAN : s["db"][i].get<double>();
-      low = std::isfinite(v) ? std::min(low, v) : low;
-      script += Exact(f0 + static_cast<double>(i) * df) + " " + Exact(v) + "\n";
-    }
-    script += "EOD\nset xlabel 'Frequency (Hz)'\nset ylabel 'Power (dB, peak = 0 dB)'\n";
-    script += "set yrange [" + Exact(std::max(std::floor(low / 10.0) * 10.0 - 5.0, -160.0)) + ":3]\n";
+                       Quoted(png) + "\nset title " + Quoted(title) +
+                       " noenhanced\nset grid\nset key bottom right opaque box\n"
+                       "set datafile separator ','\nset datafile columnheaders\n$d << EOD\n" +
+                       CsvTable(res, key) + "EOD\n";
+  if (key == "spectrum") {
     const bool mirror = j["parameters"].value("real_signal", 0) == 1;
-    int arrow = 0;
-    for (const Json& mode : res.value("modes", Json::array()))
-      for (int side = 0; side < (mirror ? 2 : 1); ++side) {
-        const std::string f = Exact(side ? -mode["frequency_hz"].get<double>() : mode["frequency_hz"].get<double>());
-        script += "set arrow " + std::to_string(++arrow) + " from " + f + ", graph 0 to " + f +
+    const Json modes = res.value("modes", Json::array());
+    for (const Json& mode : modes) {
+      const double f = mode["frequency_hz"];
+      script += "set label '" + Brief(f) + " Hz' at " + Exact(f) +
+                ", graph 0.96 offset 0.5,0 tc rgb '#c0392b'\n";
+      for (const double x : mirror ? std::vector{f, -f} : std::vector{f})
+        script += "set arrow from " + Exact(x) + ", graph 0 to " + Exact(x) +
                   ", graph 1 nohead dt 2 lw 1.5 lc rgb '#c0392b'\n";
-        if (!side) script += "set label '" + Brief(mode["frequency_hz"]) + " Hz' at " + f + ", graph 0.96 offset 0.5,0 tc rgb '#c0392b'\n";
-      }
-    script += "plot $d using 1:2 with lines lw 2 lc rgb '#1f5fa8' title 'AR spectrum'";
-    if (arrow) script += ", NaN with lines dt 2 lw 1.5 lc rgb '#c0392b' title 'modes'";
-  } else if (res.contains("modes")) {
-    for (const Json& mode : res["modes"])
-      script += Exact(mode["frequency_hz"]) + " " + Exact(mode["amplitude"]) + "\n";
-    script += "EOD\nset xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n"
-              "plot $d using 1:2 with impulses lw 3 lc rgb '#1f5fa8' title 'modes', "
-              "$d using 1:2:(sprintf('%.4g Hz', $1)) with labels offset 0,1 notitle";
-  } else {
-    for (const Json& z : res.contains("poles") ? res["poles"] : res["roots"])
-      script += Exact(z["real"]) + " " + Exact(z["imag"]) + "\n";
-    script += "EOD\nset parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
-              "set ylabel 'Imaginary'\nplot cos(t), sin(t) with lines lc rgb 'gray' title "
-              "'unit circle', $d using 1:2 with points pt 7 ps 1.5 lc rgb '#1f5fa8' title 'poles'";
-  }
-  script += "\n";
-  char scriptPath[] = "/tmp/qdm-plot-XXXXXX";
-  const int fd = mkstemp(scriptPath);
-  const bool written = fd >= 0 && write(fd, script.data(), script.size()) == ssize_t(script.size());
-  if (fd >= 0) close(fd);
-  std::string lastLine;
-  int rc = -1;
-  if (written)
-    if (FILE* p = popen((Quoted(gnuplot, '\'', "'\\''") + " " + scriptPath + " 2>&1").c_str(), "r")) {
-      char buf[512];
-      while (std::fgets(buf, sizeof buf, p))  // gnuplot's own reason is its last line
-        if (const std::string line = Trim(std::string(buf, std::strcspn(buf, "\n"))); !line.empty())
-          lastLine = line;
-      rc = pclose(p);
     }
-  if (fd >= 0) std::remove(scriptPath);
-  if (rc != 0)
-    throw Failure{kOutput, {}, "gnuplot could not draw " + png + (lastLine.empty() ? "" : ": " + lastLine)};
+    script +=
+        "set xlabel 'Frequency (Hz)'\nset ylabel 'Power (dB, peak = 0 dB)'\n"
+        "set yrange [-160<*:3]\nplot $d using 1:2 with lines lw 2 lc rgb '#1f5fa8' title "
+        "'AR spectrum'" +
+        std::string(modes.empty() ? ""
+                                  : ", NaN with lines dt 2 lw 1.5 lc rgb '#c0392b' title 'modes'");
+  } else if (key == "modes") {
+    script +=
+        "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n"
+        "plot $d using 'frequency_hz':'amplitude' with impulses lw 3 lc rgb '#1f5fa8' "
+        "title 'modes', '' using 'frequency_hz':'amplitude':(sprintf('%.4g Hz', "
+        "column('frequency_hz'))) with labels offset 0,1 notitle";
+  } else {
+    script +=
+        "set parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
+        "set ylabel 'Imaginary'\nplot cos(t), sin(t) with lines lc rgb 'gray' title "
+        "'unit circle', $d using 1:2 with points pt 7 ps 1.5 lc rgb '#1f5fa8' title " +
+        Quoted(key);
+  }
+  char path[] = "/tmp/qdm-plot-XXXXXX";
+  const int fd = mkstemp(path);
+  script += "\n";
+  const bool written = fd >= 0 && write(fd, script.data(), script.size()) == ssize_t(script.size());
+  std::string reason;  // gnuplot's last line
+  int rc = -1;
+  FILE* gnuplot =
+      written ? popen(("gnuplot " + std::string(path) + " 2>&1").c_str(), "r") : nullptr;
+  for (char line[512]; gnuplot && std::fgets(line, sizeof line, gnuplot);)
+    if (!Trim(line).empty()) reason = Trim(line);
+  if (gnuplot) rc = pclose(gnuplot);
+  if (fd >= 0) close(fd), std::remove(path);
+  if (rc != 0) throw Failure{kOutput, {}, "gnuplot could not draw " + png + ": " + reason};
   return true;
 }
 
-// ---- one record, many records -------------------------------------------------------
-
 // Fits one input; the record, or the error record, and the exit code it gives.
 Record RunOne(Method m, const Options& o, const std::string& path, int* exitCode) {
-  *exitCode = kOk;
+  Failure f;
   try {
+    *exitCode = kOk;
     return Fit(m, o, path, Load(path, o));
-  } catch (const Failure& f) {
-    *exitCode = f.exit;
-    Record r;
-    r.json = {{"input", path}, {"method", kMethods[m].name}, {"status", nullptr}, {"exit", f.exit},
-              {"error", f.message}};
-    if (f.status) r.json["status"] = *f.status;
-    return r;
-  } catch (const std::exception& e) {
-    *exitCode = kUsage;
-    Record r;
-    r.json = {{"input", path}, {"method", kMethods[m].name}, {"status", nullptr}, {"exit", kUsage},
-              {"error", e.what()}};
-    return r;
+  } catch (const Failure& failure) {
+    f = failure;
+  } catch (const std::exception& e) {  // no memory for the samples, say
+    f = {kUsage, {}, path + ": " + e.what()};
   }
+  *exitCode = f.exit;
+  Record r;
+  r.json = {{"input", path},
+            {"method", kMethods[m][0]},
+            {"status", nullptr},
+            {"exit", f.exit},
+            {"error", f.message}};
+  if (f.status) r.json["status"] = *f.status;
+  return r;
 }
 
 // Each file on a pool of threads; one JSON line per file, printed in input order.
@@ -578,8 +485,10 @@ int RunBatch(Method m, const Options& o) {
     const Record r = std::move(*records[i]);
     records[i].reset();
     lock.unlock();
-    std::fputs((r.json.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n").c_str(), stdout);
-    if (!r.warning.empty()) std::fprintf(stderr, "qdm: %s: warning: %s\n", o.files[i].c_str(), r.warning.c_str());
+    std::fputs((r.json.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n").c_str(),
+               stdout);
+    if (!r.warning.empty())
+      std::fprintf(stderr, "qdm: %s: warning: %s\n", o.files[i].c_str(), r.warning.c_str());
     if (codes[i] != kOk) exit = kLibrary;
   }
   return exit;
@@ -608,19 +517,20 @@ int RunSingle(Method m, const Options& o) {
 }  // namespace
 
 int main(int argc, char** argv) {
-  CLI::App app{"qdm: parametric fits of sampled signals (AR models, damped exponentials, AR "
-               "spectra) over the qdm library.\nThe signal is a CSV file (one column: real "
-               "samples; two: real and imaginary parts), standard input\n(FILE '-' or none), or "
-               "the built-in example (--example).",
-               "qdm"};
+  CLI::App app{
+      "qdm: AR models, damped exponentials and AR spectra of a signal: a CSV file (one "
+      "column: real samples;\ntwo: real and imaginary parts), standard input (FILE '-' "
+      "or none), or the built-in example.",
+      "qdm"};
   app.set_version_flag("--version", std::string("qdm ") + qdm_version());
   app.require_subcommand(1);
-  app.footer("Exit status: 0 success, 1 bad usage or input, 2 a library status (with several "
-             "files: any record failed), 3 an output that cannot be written.");
+  app.footer(
+      "Exit status: 0 success, 1 bad usage or input, 2 a library status (with several "
+      "files: any record failed), 3 an output that cannot be written.");
   Options o;
   std::vector<std::pair<CLI::App*, Method>> subs;
   for (int m = kCovariance; m <= kPcarSpectrum; ++m) {
-    CLI::App* sub = app.add_subcommand(kMethods[m].name, kMethods[m].title);
+    CLI::App* sub = app.add_subcommand(kMethods[m][0], kMethods[m][1]);
     subs.push_back({sub, Method(m)});
     const unsigned bit = Bit(Method(m));
     for (const IntOption& io : kIntOptions)
@@ -632,22 +542,26 @@ int main(int argc, char** argv) {
         ->group(kModal & bit ? "Parameters" : "");
     sub->add_option("files", o.files, "CSV files; '-' or none: standard input");
     sub->add_option("--example", o.example, "fit the built-in example signal: real or complex")
-        ->expected(0, 1)->default_str("real")->check(CLI::IsMember({"real", "complex"}));
+        ->expected(0, 1)
+        ->default_str("real")
+        ->check(CLI::IsMember({"real", "complex"}));
     CLI::Option* json = sub->add_flag("--json", o.json, "print JSON");
     sub->add_flag("--csv", o.csv, "print the main table as CSV")->excludes(json);
     sub->add_option("--plot", o.plot, "draw the results to FILE.png with gnuplot");
-    sub->add_option("--jobs", o.jobs, "fit the files on N threads (0: one per core), one JSON "
-                                      "line each")->check(CLI::Range(0, 1024));
+    sub->add_option("--jobs", o.jobs, "fit the files on N threads (0: one per core), JSON lines")
+        ->check(CLI::Range(0, 1024));
     sub->footer("Options of the other methods are accepted and ignored.");
   }
-  const auto named = [&](const char* a) {
-    return std::any_of(std::begin(kMethods), std::end(kMethods),
-                       [&](const MethodInfo& mi) { return std::strcmp(a, mi.name) == 0; });
-  };
-  if (argc < 2 || (argv[1][0] != '-' && !named(argv[1]))) {
-    std::fprintf(stderr, "qdm: %s%s%s (methods: covariance, prony, pcar, pencil, mdl, covspectrum, "
-                 "pcarspectrum; see qdm --help)\n", argc < 2 ? "no method given" : "unknown method '",
-                 argc < 2 ? "" : argv[1], argc < 2 ? "" : "'");
+  Method method = kCovariance;  // the first argument names it
+  CLI::App* chosen = nullptr;
+  for (const auto& [sub, m] : subs)
+    if (argc > 1 && sub->get_name() == argv[1]) chosen = sub, method = m;
+  if (chosen == nullptr && (argc < 2 || argv[1][0] != '-')) {
+    std::fprintf(stderr,
+                 "qdm: %s%s%s; methods: covariance, prony, pcar, pencil, mdl, covspectrum, "
+                 "pcarspectrum (see qdm --help)\n",
+                 argc < 2 ? "no method given" : "unknown method '", argc < 2 ? "" : argv[1],
+                 argc < 2 ? "" : "'");
     return kUsage;
   }
   try {
@@ -657,19 +571,16 @@ int main(int argc, char** argv) {
     std::fprintf(stderr, "qdm: %s (see qdm --help)\n", e.what());
     return kUsage;
   }
-  Method method = kCovariance;
-  bool jobsGiven = false;
-  for (const auto& [sub, m] : subs)
-    if (sub->parsed()) method = m, jobsGiven = sub->count("--jobs") > 0;
-  const bool batch = o.files.size() > 1 || jobsGiven;
+  const bool batch = o.files.size() > 1 || chosen->count("--jobs") > 0;
   std::string usage;
   if (!o.example.empty() && !o.files.empty()) usage = "--example takes no FILE";
   if (batch && (o.csv || !o.plot.empty())) usage = "--csv and --plot take one FILE, not --jobs";
   if (!usage.empty()) {
-    std::fprintf(stderr, "qdm: %s (see qdm %s --help)\n", usage.c_str(), kMethods[method].name);
+    std::fprintf(stderr, "qdm: %s (see qdm %s --help)\n", usage.c_str(), kMethods[method][0]);
     return kUsage;
   }
-  if (o.files.empty()) o.files.push_back(o.example.empty() ? "-" : "built-in example (" + o.example + ")");
+  if (o.files.empty())
+    o.files.push_back(o.example.empty() ? "-" : "built-in example (" + o.example + ")");
   int code = kOk;
   try {
     code = batch ? RunBatch(method, o) : RunSingle(method, o);
