@@ -445,7 +445,8 @@ Record RunOne(Method m, const Options& o, const std::string& path, int* exitCode
     return Fit(m, o, path, Load(path, o));
   } catch (const Failure& failure) {
     f = failure;
-  } catch (const std::exception& e) {  // no memory for the samples, say
+    if (f.status) f.message = path + ": " + f.message;  // read errors name the file already
+  } catch (const std::exception& e) {                   // no memory for the samples, say
     f = {kUsage, {}, path + ": " + e.what()};
   }
   *exitCode = f.exit;
@@ -490,6 +491,8 @@ int RunBatch(Method m, const Options& o) {
     if (!r.warning.empty())
       std::fprintf(stderr, "qdm: %s: warning: %s\n", o.files[i].c_str(), r.warning.c_str());
     if (codes[i] != kOk) exit = kLibrary;
+    if (codes[i] != kOk)
+      std::fprintf(stderr, "qdm: %s\n", r.json["error"].get<std::string>().c_str());
   }
   return exit;
 }
