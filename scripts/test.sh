@@ -7,7 +7,8 @@
 set -uo pipefail
 cd "$(dirname "$0")/.."
 scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
-  libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev || exit 1
+  libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev libcli11-dev nlohmann-json3-dev \
+  gnuplot-nox || exit 1
 
 jobs=$(nproc)
 failed=0
