@@ -148,9 +148,9 @@ struct Signal {
 };
 
 bool ParseNumber(const std::string& text, double* v) {
-  const char* end = text.data() + text.size();
-  const auto r = std::from_chars(text.data(), end, *v);
-  return !text.empty() && r.ec == std::errc() && r.ptr == end;
+  char* end = nullptr;
+  *v = std::strtod(text.c_str(), &end);
+  return !text.empty() && end == text.c_str() + text.size();
 }
 
 Signal ReadCsv(const std::string& path) {
