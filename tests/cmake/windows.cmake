@@ -35,7 +35,7 @@ if(WIN32 AND TARGET qdm_example AND QDM_LINUX_EXAMPLE)
   set(_win_out ${CMAKE_CURRENT_BINARY_DIR}/linux_vs_windows)
   file(MAKE_DIRECTORY ${_win_out})
   set(_win_marple ${CMAKE_SOURCE_DIR}/tests/data/marple64.csv)
-  # name | arguments (@OUT@: a file prefix per case and side)
+  # name | arguments
   set(_win_cases
       "covariance_real|covariance"
       "covariance_complex|covariance|--example|complex"
@@ -47,12 +47,12 @@ if(WIN32 AND TARGET qdm_example AND QDM_LINUX_EXAMPLE)
       "pencil_complex|pencil|--example|complex"
       "mdl_real|mdl"
       "mdl_complex|mdl|--example|complex"
-      "covspectrum_real|covspectrum|--no-plot|--csv|@OUT@.csv"
-      "covspectrum_complex|covspectrum|--example|complex|--no-plot|--csv|@OUT@.csv"
-      "pcarspectrum_real|pcarspectrum|--real-signal|--no-plot|--csv|@OUT@.csv"
-      "pcarspectrum_complex|pcarspectrum|--example|complex|--no-plot|--csv|@OUT@.csv"
+      "covspectrum_real|covspectrum"
+      "covspectrum_complex|covspectrum|--example|complex"
+      "pcarspectrum_real|pcarspectrum|--real-signal"
+      "pcarspectrum_complex|pcarspectrum|--example|complex"
       "marple64_covariance|covariance|${_win_marple}|--order|4"
-      "marple64_covspectrum|covspectrum|${_win_marple}|--order|8|--points|100|--no-plot|--csv|@OUT@.csv")
+      "marple64_covspectrum|covspectrum|${_win_marple}|--order|8|--points|100")
   foreach(case IN LISTS _win_cases)
     string(FIND "${case}" "|" bar)
     string(SUBSTRING "${case}" 0 ${bar} name)

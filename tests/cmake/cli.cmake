@@ -1,0 +1,18 @@
+# End-to-end runs of the installed qdm tool (Linux): the build is installed into
+# a prefix under the build tree with cmake --install, and tests/cmake/cli.sh
+# runs that copy: standard input and output, --jobs with a bad file among good
+# ones, every exit code, and plotting with and without gnuplot.
+if(NOT TARGET qdm_cli)
+  return()
+endif()
+set(_cli_prefix ${CMAKE_CURRENT_BINARY_DIR}/cli_prefix)
+add_test(NAME cli.install
+         COMMAND ${CMAKE_COMMAND} --install ${CMAKE_BINARY_DIR} --prefix ${_cli_prefix})
+set_tests_properties(cli.install PROPERTIES FIXTURES_SETUP qdm_cli_installed)
+foreach(case stdin_stdout jobs exit_codes plot)
+  add_test(NAME cli.${case}
+           COMMAND bash ${CMAKE_CURRENT_LIST_DIR}/cli.sh ${_cli_prefix}
+                   ${CMAKE_CURRENT_BINARY_DIR}/cli_work/${case}
+                   ${CMAKE_SOURCE_DIR}/tests/data/marple64.csv ${case})
+  set_tests_properties(cli.${case} PROPERTIES FIXTURES_REQUIRED qdm_cli_installed)
+endforeach()
