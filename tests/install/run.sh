@@ -36,7 +36,8 @@ host = json.load(open(sys.argv[1]))["results"]
 lines = [l.split() for l in open(sys.argv[2])]
 assert float(lines[0][1]) == host["noise_variance"], (lines[0], host["noise_variance"])
 coeffs = [(float(l[1]), float(l[2])) for l in lines[1:]]
-assert coeffs == [(c["real"], c["imag"]) for c in host["coefficients"]], "coefficients differ"
+flat = host["coefficients"]  # interleaved real and imaginary parts
+assert coeffs == list(zip(flat[0::2], flat[1::2])), "coefficients differ"
 PY
 done
 echo "installed tree: find_package and pkg-config consumers match the host face"
