@@ -28,21 +28,31 @@ StatusCode FirstFailedCheck(std::span<const ArgCheck> checks) {
   return status::kOk;
 }
 
+int32_t OutputLength(const OutputArray& out) {
+  switch (out.length) {
+    case Length::kArgument: return out.argument;
+    case Length::kArgumentPlusOne: return out.argument + 1;
+    case Length::kSpectrumOf: return SpectrumLength(out.argument);
+  }
+  return 0;
+}
+
 namespace {
 
 size_t ElementBytes(int32_t typeCode) { return DoublesPerElement(typeCode) * sizeof(double); }
 
 // Steps 4 and 5: aligned copies, the estimator, results into the host blocks.
-// `handles` are the output handles as the resizes left them.
+// `handles` are the output handles as the resizes left them, `lengths` their
+// element counts.
 StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* handles,
-                              EstimatorCall estimate) {
+                              const int32_t* lengths, EstimatorCall estimate) {
   const size_t n = entry.n < 0 ? 0 : static_cast<size_t>(entry.n);
   WorkArray<double> input = AllocWork<double>(n * DoublesPerElement(entry.inputType));
   WorkArray<double> outputs[kMaxOutputs];
   bool have_all = static_cast<bool>(input);
   for (size_t i = 0; i < entry.outputs.size(); ++i) {
     const OutputArray& out = entry.outputs[i];
-    outputs[i] = AllocWork<double>(static_cast<size_t>(out.length) *
+    outputs[i] = AllocWork<double>(static_cast<size_t>(lengths[i]) *
                                    DoublesPerElement(out.typeCode));
     have_all = have_all && outputs[i];
   }
@@ -51,7 +61,10 @@ StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* hand
   std::memcpy(input.get(), BlockElements(entry.input), n * ElementBytes(entry.inputType));
   EntryCall call{};
   call.input = input.get();
-  for (size_t i = 0; i < entry.outputs.size(); ++i) call.outputs[i] = outputs[i].get();
+  for (size_t i = 0; i < entry.outputs.size(); ++i) {
+    call.outputs[i] = outputs[i].get();
+    call.lengths[i] = lengths[i];
+  }
   for (size_t j = 0; j < entry.outDoubles.size(); ++j) {
     if (entry.outDoubles[j].role == OutDoubleRole::kPassThrough) {
       std::memcpy(&call.outDoubles[j], entry.outDoubles[j].host, sizeof(double));
@@ -70,7 +83,7 @@ StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* hand
   for (size_t i = 0; i < entry.outputs.size(); ++i) {
     const OutputArray& out = entry.outputs[i];
     std::memcpy(BlockElements(handles[i]), outputs[i].get(),
-                static_cast<size_t>(out.length) * ElementBytes(out.typeCode));
+                static_cast<size_t>(lengths[i]) * ElementBytes(out.typeCode));
     if (out.count == CountSource::kModes) SetBlockCount(handles[i], call.modes);
   }
   for (size_t j = 0; j < entry.outDoubles.size(); ++j) {
@@ -94,10 +107,12 @@ int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
   QdmArrayHandle handles[kMaxOutputs] = {};
   for (size_t i = 0; i < entry.outputs.size(); ++i) handles[i] = entry.outputs[i].handle;
 
+  int32_t lengths[kMaxOutputs] = {};
   StatusCode s = FirstFailedCheck(entry.checks);
   for (size_t i = 0; s == status::kOk && i < entry.outputs.size(); ++i) {
     const OutputArray& out = entry.outputs[i];
-    s = NumericArrayResize(out.typeCode, 1, &handles[i], static_cast<size_t>(out.length));
+    lengths[i] = OutputLength(out);
+    s = NumericArrayResize(out.typeCode, 1, &handles[i], static_cast<size_t>(lengths[i]));
     if (s != status::kOk && entry.onResizeFailure == ResizeFailure::kReturnAtOnce) {
       return MapStatus(s);
     }
@@ -105,10 +120,10 @@ int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
   if (s == status::kOk) {
     for (size_t i = 0; i < entry.outputs.size(); ++i) {
       if (entry.outputs[i].count == CountSource::kLength) {
-        SetBlockCount(handles[i], entry.outputs[i].length);
+        SetBlockCount(handles[i], lengths[i]);
       }
     }
-    s = EstimateAndCopyOut(entry, handles, estimate);
+    s = EstimateAndCopyOut(entry, handles, lengths, estimate);
     if (s == status::kOk) return 0;
   }
 

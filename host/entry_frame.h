@@ -64,12 +64,25 @@ StatusCode FirstFailedCheck(std::span<const ArgCheck> checks);
 // every such output after a successful call).
 enum class CountSource : uint8_t { kLength, kModes };
 
+// How an output's length follows from one of the entry point's integer
+// arguments. The frame works the length out only once every check has passed,
+// so no size is ever computed from an argument that has not been checked (an
+// order of INT32_MAX has no p + 1).
+enum class Length : uint8_t {
+  kArgument,         // the argument itself
+  kArgumentPlusOne,  // the argument + 1 (p + 1 coefficients)
+  kSpectrumOf,       // SpectrumLength(argument): the smallest power of two >= m
+};
+
 struct OutputArray {
   QdmArrayHandle handle;
   int32_t typeCode;  // QDM_TYPE_DOUBLE or QDM_TYPE_COMPLEX
-  int32_t length;    // elements asked of the resize
+  int32_t argument;  // the argument the length follows from
+  Length length;
   CountSource count;
 };
+// The elements asked of an output's resize; valid only after the checks.
+int32_t OutputLength(const OutputArray& out);
 
 // What an out double receives on success, and whether failure zeroes it.
 enum class OutDoubleRole : uint8_t {
@@ -104,12 +117,13 @@ struct EntrySpec {
 // ---- what the estimator sees -------------------------------------------------------
 
 // Aligned stand-ins for the host memory of one call. outputs[i] belongs to
-// entry.outputs[i] (zero-filled, `length` elements); outDoubles[j] to
+// entry.outputs[i] (zero-filled, lengths[i] elements); outDoubles[j] to
 // entry.outDoubles[j]; `modes` is the count for CountSource::kModes outputs;
 // `spectrum` is the record handed to the spectrum estimators.
 struct EntryCall {
   const void* input;
   void* outputs[kMaxOutputs];
+  int32_t lengths[kMaxOutputs];
   double outDoubles[kMaxOutDoubles];
   int32_t modes;
   SpectrumResult spectrum;

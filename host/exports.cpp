@@ -12,6 +12,7 @@ using host::ArgCheck;
 using host::CountSource;
 using host::EntryCall;
 using host::EntrySpec;
+using host::Length;
 using host::OutDouble;
 using host::OutDoubleRole;
 using host::OutputArray;
@@ -41,10 +42,10 @@ int32_t PronyEntry(QdmArrayHandle data, int32_t type, int32_t p, double rate,
                              {p <= 0, status::kBadCount},
                              {p > MaxOrder(n), status::kBadCount},
                              {BadRate(rate), status::kBadSampleRate}};
-  const OutputArray outputs[] = {{amp, kReal, p, CountSource::kModes},
-                                 {phase, kReal, p, CountSource::kModes},
-                                 {damp, kReal, p, CountSource::kModes},
-                                 {freq, kReal, p, CountSource::kModes}};
+  const OutputArray outputs[] = {{amp, kReal, p, Length::kArgument, CountSource::kModes},
+                                 {phase, kReal, p, Length::kArgument, CountSource::kModes},
+                                 {damp, kReal, p, Length::kArgument, CountSource::kModes},
+                                 {freq, kReal, p, Length::kArgument, CountSource::kModes}};
   return host::RunEntry(EntrySpec{data, type, n, checks, outputs, {}, onResizeFailure}, estimate);
 }
 
@@ -56,8 +57,9 @@ template <typename Estimate>
 int32_t ArEntry(QdmArrayHandle data, int32_t type, std::span<const ArgCheck> checks, int32_t p,
                 QdmArrayHandle coefficients, QdmArrayHandle second,
                 std::span<const OutDouble> outDoubles, const Estimate& estimate) {
-  const OutputArray outputs[] = {{second, kCx, p, CountSource::kLength},
-                                 {coefficients, type, p + 1, CountSource::kLength}};
+  const OutputArray outputs[] = {
+      {second, kCx, p, Length::kArgument, CountSource::kLength},
+      {coefficients, type, p, Length::kArgumentPlusOne, CountSource::kLength}};
   return host::RunEntry(EntrySpec{data, type, host::BlockCount(data), checks, outputs,
                                   outDoubles},
                         estimate);
@@ -100,10 +102,10 @@ int32_t PencilEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t M, dou
                              {M <= 0, status::kBadCount},
                              {M > L, status::kCountAboveOrder},
                              {BadRate(rate), status::kBadSampleRate}};
-  const OutputArray outputs[] = {{amp, kReal, M, CountSource::kModes},
-                                 {phase, kReal, M, CountSource::kModes},
-                                 {damp, kReal, M, CountSource::kModes},
-                                 {freq, kReal, M, CountSource::kModes}};
+  const OutputArray outputs[] = {{amp, kReal, M, Length::kArgument, CountSource::kModes},
+                                 {phase, kReal, M, Length::kArgument, CountSource::kModes},
+                                 {damp, kReal, M, Length::kArgument, CountSource::kModes},
+                                 {freq, kReal, M, Length::kArgument, CountSource::kModes}};
   const OutDouble outDoubles[] = {{mse, OutDoubleRole::kEstimator}};
   return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles}, estimate);
 }
@@ -121,28 +123,31 @@ int32_t MdlEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t minOrder,
 }
 
 // ---- spectra ----------------------------------------------------------------------------
-// The spectrum has N = SpectrumLength(m) points. An m beyond 2^30 has no
-// 32-bit power of two above it and is reported like a spectrum size below 2.
+// The spectrum has N = SpectrumLength(m) points, worked out by the frame once
+// the checks have passed. An m beyond 2^30 has no 32-bit power of two above it
+// and is reported like a spectrum size below 2.
+
+constexpr int32_t kLargestSpectrumSize = INT32_C(1) << 30;
+bool BadSpectrumSize(int32_t m) { return m <= 1 || m > kLargestSpectrumSize; }
 
 template <typename Estimate>
 int32_t CovSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t m, double rate,
                          double* f0, double* df, QdmArrayHandle spectrum, double* variance,
                          const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
-  const int32_t N = SpectrumLength(m);
   const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
                              {p < 0, status::kBadCount},
                              {p > MaxOrder(n), status::kBadCount},
-                             {m <= 1 || N == 0, status::kBadSpectrumSize},
+                             {BadSpectrumSize(m), status::kBadSpectrumSize},
                              {BadRate(rate), status::kBadSampleRate}};
-  const OutputArray outputs[] = {{spectrum, kReal, N, CountSource::kLength}};
+  const OutputArray outputs[] = {{spectrum, kReal, m, Length::kSpectrumOf, CountSource::kLength}};
   const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
                                   {df, OutDoubleRole::kSpectrumDf},
                                   {variance, OutDoubleRole::kEstimator}};
   return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles},
                         [&](EntryCall& c) {
                           c.spectrum.values = c.RealOutput(0);
-                          return estimate(c, N);
+                          return estimate(c, c.lengths[0]);
                         });
 }
 
@@ -153,25 +158,25 @@ int32_t PcarSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t 
                           double* fitError, ResizeFailure onResizeFailure,
                           const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
-  const int32_t N = SpectrumLength(m);
   const ArgCheck checks[] = {{n < 1, status::kEmptyInput},
                              {p < 0, status::kBadOrder},
                              {p > MaxOrder(n), status::kBadOrder},
                              {k <= 0, status::kBadCount},
                              {k > p, status::kCountAboveOrder},
-                             {m <= 1 || N == 0, status::kBadSpectrumSize},
+                             {BadSpectrumSize(m), status::kBadSpectrumSize},
                              {BadRate(rate), status::kBadSampleRate}};
-  const OutputArray outputs[] = {{amp, kReal, k, CountSource::kModes},
-                                 {phase, kReal, k, CountSource::kModes},
-                                 {freq, kReal, k, CountSource::kModes},
-                                 {spectrum, kReal, N, CountSource::kLength}};
+  const OutputArray outputs[] = {
+      {amp, kReal, k, Length::kArgument, CountSource::kModes},
+      {phase, kReal, k, Length::kArgument, CountSource::kModes},
+      {freq, kReal, k, Length::kArgument, CountSource::kModes},
+      {spectrum, kReal, m, Length::kSpectrumOf, CountSource::kLength}};
   const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
                                   {df, OutDoubleRole::kSpectrumDf},
                                   {fitError, OutDoubleRole::kPassThrough}};
   return host::RunEntry(EntrySpec{data, type, n, checks, outputs, outDoubles, onResizeFailure},
                         [&](EntryCall& c) {
                           c.spectrum.values = c.RealOutput(3);
-                          return estimate(c, N);
+                          return estimate(c, c.lengths[3]);
                         });
 }
 

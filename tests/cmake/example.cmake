@@ -134,6 +134,8 @@ qdm_example_fails(status_empty_input "QdmReCovarianceH returned -42401: empty in
                   ${_ex_data}/empty.csv)
 qdm_example_fails(status_bad_order "QdmCxCovarianceH returned -42412: order" covariance
                   ${_ex_marple} --order 0)
+qdm_example_fails(status_largest_order "QdmCxCovarianceH returned -42412: order" covariance
+                  ${_ex_marple} --order 2147483647)
 qdm_example_fails(status_bad_rate "QdmReCovPowerSpectrH returned -42418: sampling rate not positive"
                   covspectrum --rate 0 --no-plot --csv ${_ex_data}/unused.csv)
 qdm_example_fails(status_components_above_order

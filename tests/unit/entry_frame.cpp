@@ -52,8 +52,9 @@ struct Fixture {
 
   template <typename Estimator>
   int32_t Run(const Estimator& estimate) {
-    const OutputArray outputs[] = {{known, QDM_TYPE_DOUBLE, 3, CountSource::kLength},
-                                   {modes, QDM_TYPE_COMPLEX, 2, CountSource::kModes}};
+    const OutputArray outputs[] = {
+        {known, QDM_TYPE_DOUBLE, 2, host::Length::kArgumentPlusOne, CountSource::kLength},
+        {modes, QDM_TYPE_COMPLEX, 2, host::Length::kArgument, CountSource::kModes}};
     const OutDouble doubles[] = {{&estimated, OutDoubleRole::kEstimator},
                                  {&f0, OutDoubleRole::kSpectrumF0},
                                  {&passed, OutDoubleRole::kPassThrough}};
