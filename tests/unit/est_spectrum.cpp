@@ -138,14 +138,16 @@ TEST(ArSpectrum, RealCoefficientsGiveASpectrumSymmetricAboutDc) {
   for (int32_t j = 0; j < L; ++j) EXPECT_NEAR(real.values[j], cx.values[j], 1e-9) << j;
 }
 
-TEST(ArSpectrum, RealCoefficientsLongerThanTheGridWrapByAssignment) {
+TEST(ArSpectrum, CoefficientsLongerThanTheGridWrapByAssignment) {
   // m = 5 on L = 2: slot 0 ends holding a[4], slot 1 a[3].
   const std::vector<double> a = {1.0, 0.3, -0.2, 0.5, 2.0};
-  const Evaluated e = EvalReal(a, 1.0, 2, 2);
-  ExpectMatchesOracle(e, ar_oracle::SpectrumDb({C(2.0), C(0.5)}, 2), 1.0, "wrap");
-  // The complex evaluator needs m <= L and refuses the rest.
-  std::vector<C> ac(a.begin(), a.end());
-  EXPECT_EQ(EvalComplex(ac, 1.0, 2, 2).status, status::kBadSize);
+  ExpectMatchesOracle(EvalReal(a, 1.0, 2, 2), ar_oracle::SpectrumDb({C(2.0), C(0.5)}, 2), 1.0,
+                      "real wrap");
+  // Complex: m = 7 on L = 4: slots 0..3 hold a[4], a[5], a[6], a[3].
+  const std::vector<C> ac = {C(1, 1), C(0.3, -2), C(-0.2, 0.1), C(0.5, 0.5),
+                             C(2, -1), C(0.1, 0.4), C(-0.6, 0.2)};
+  ExpectMatchesOracle(EvalComplex(ac, 1.0, 4, 4),
+                      ar_oracle::SpectrumDb({ac[4], ac[5], ac[6], ac[3]}, 4), 1.0, "complex wrap");
 }
 
 TEST(ArSpectrum, NanSamplingRateGivesNanGridAndTheUsualValues) {
