@@ -23,26 +23,12 @@ struct Outcome {
   bool operator==(const Outcome&) const = default;
 };
 
-void AddBits(std::vector<uint64_t>& bits, double v) {
-  uint64_t b;
-  std::memcpy(&b, &v, sizeof b);
-  bits.push_back(b);
-}
-
 Outcome CallOnce(const QdmApi& qdm, const Export& x) {
   const Scalars s = Valid(x.family);
   Call c = MakeCall(x, s);
   Outcome o;
   o.status = x.invoke(qdm, c, s);
-  for (int i = 0; i < x.outputs; ++i) {
-    o.bits.push_back(static_cast<uint64_t>(c.out[i].Count()));
-    o.bits.push_back(c.out[i].Capacity());
-    for (double v : c.out[i].Reals(static_cast<int32_t>(c.out[i].Capacity()) *
-                                   (x.resizes(s)[static_cast<size_t>(i)].typeCode == kC ? 2 : 1)))
-      AddBits(o.bits, v);
-  }
-  for (int j = 0; j < x.doubles; ++j) AddBits(o.bits, c.d[j]);
-  o.bits.push_back(static_cast<uint64_t>(c.order));
+  o.bits = Leftovers(x, c, s);
   return o;
 }
 

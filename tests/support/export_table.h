@@ -16,6 +16,7 @@
 #include <cmath>
 #include <complex>
 #include <cstdint>
+#include <cstring>
 #include <functional>
 #include <string>
 #include <vector>
@@ -229,6 +230,28 @@ inline void ExpectEmptied(const Export& x, const Call& c, const std::string& whe
       EXPECT_EQ(c.d[j], kStale) << where << " double " << j;
     }
   }
+}
+
+// Everything a successful call left behind, doubles as bit patterns (NaN-safe):
+// every output's count, capacity and elements, the out doubles, the MDL result.
+inline std::vector<uint64_t> Leftovers(const Export& x, const Call& c, const Scalars& s) {
+  std::vector<uint64_t> bits;
+  auto add = [&bits](double v) {
+    uint64_t b;
+    std::memcpy(&b, &v, sizeof b);
+    bits.push_back(b);
+  };
+  const std::vector<ResizeCall> resizes = x.resizes(s);
+  for (int i = 0; i < x.outputs; ++i) {
+    const HostArray& out = c.out[i];
+    bits.push_back(static_cast<uint64_t>(out.Count()));
+    bits.push_back(out.Capacity());
+    const int32_t perElement = resizes[static_cast<size_t>(i)].typeCode == kC ? 2 : 1;
+    for (double v : out.Reals(static_cast<int32_t>(out.Capacity()) * perElement)) add(v);
+  }
+  for (int j = 0; j < x.doubles; ++j) add(c.d[j]);
+  bits.push_back(static_cast<uint64_t>(c.order));
+  return bits;
 }
 
 // The resizes of the failure path: every output to 0 with its type code.
