@@ -50,10 +50,11 @@ StatusCode PcarThreshold(const T* A, int32_t rows, int32_t cols, int32_t k, doub
     // Hermitian solver: real eigenvalues returned as (w, 0).
     st = EigComplex(gram.get(), mn, 1, 0, eig.get(), nullptr);
     if (st != status::kOk) return st;
-    for (int32_t i = 0; i < mn; ++i) {
-      const double re = eig[i].real(), im = eig[i].imag();
-      lambda[i] = std::sqrt(re * re + im * im);
-    }
+    // The modulus by hypot: the eigenvalues carry the square of the data's
+    // scale, so re * re would overflow for data of magnitude 1e90 (or vanish
+    // for 1e-90) and move the threshold to infinity (or 0). Where the squares
+    // stay in range the two agree exactly, the imaginary parts being zero.
+    for (int32_t i = 0; i < mn; ++i) lambda[i] = std::hypot(eig[i].real(), eig[i].imag());
   } else {
     st = EigSymReal(gram.get(), mn, 0, lambda.get(), nullptr);
     if (st != status::kOk) return st;
