@@ -212,6 +212,33 @@ inline Scalars Valid(Family f) {
   return {};
 }
 
+// More argument sets per family: the valid set (n = 12), one on a longer
+// record, and for the spectra a range of sizes including primes; they round up
+// to the power-of-two grid, so FFT plans of every length from 2 to 4096 are built.
+inline constexpr int32_t kSpectrumSizes[] = {2, 3, 5, 17, 53, 127, 1009, 4096};
+
+inline std::vector<Scalars> ArgumentSets(Family f) {
+  std::vector<Scalars> sets = {Valid(f)};
+  switch (f) {
+    case Family::kProny: sets.push_back({64, 8, 0, 0, 2.0}); break;
+    case Family::kCovariance: sets.push_back({64, 10, 0, 0, 1.0}); break;
+    case Family::kPcar: sets.push_back({64, 12, 4, 0, 1.0}); break;
+    case Family::kPencil: sets.push_back({64, 20, 6, 0, 3.0}); break;
+    case Family::kMdl: sets.push_back({64, 12, 2, 0, 1.0}); break;
+    case Family::kCovSpectrum:
+      sets.clear();
+      for (int32_t m : kSpectrumSizes) sets.push_back({12, 2, m, 0, 1.0});
+      sets.push_back({64, 10, 256, 0, 1.0});
+      break;
+    case Family::kPcarSpectrum:
+      sets.clear();
+      for (int32_t m : kSpectrumSizes) sets.push_back({12, 4, m, 2, 1.0});
+      sets.push_back({64, 12, 256, 4, 1.0});
+      break;
+  }
+  return sets;
+}
+
 inline Call MakeCall(const Export& x, const Scalars& s) { return Call{Signal(x.complexData, s.n)}; }
 
 // Every output at count 0 and capacity 0, every out double but the
