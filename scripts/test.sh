@@ -24,12 +24,14 @@ run() {  # name
 
 suite release -DCMAKE_BUILD_TYPE=Release || failed=1
 [ $failed -eq 0 ] && { run release | tail -n 25 || failed=1; }
-# ThreadSanitizer: only the concurrency tests are built and run.
+# ThreadSanitizer: only the end-to-end concurrency test is built and run. (A
+# unit test linking the kernels statically cannot run under it: their
+# target_clones resolvers run before the sanitizer's run-time is set up.)
 tsan() {
   cmake -S . -B build/tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_TSAN=ON \
     -DQDM_BUILD_EXAMPLE=OFF >/dev/null || return 1
-  cmake --build build/tsan -j"$jobs" --target e2e_concurrency unit_fft_plan >/dev/null || return 1
-  TSAN_OPTIONS=halt_on_error=1 ctest --test-dir build/tsan -R 'Concurren' \
+  cmake --build build/tsan -j"$jobs" --target e2e_concurrency >/dev/null || return 1
+  TSAN_OPTIONS="halt_on_error=1 suppressions=$PWD/tests/tsan.supp" ctest --test-dir build/tsan -R '^e2e\.Concurrency' \
     --output-on-failure --timeout 900 | tail -n 3
 }
 # The fuzzer: every corpus and regression input once, then a minute of fuzzing
