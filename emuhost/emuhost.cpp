@@ -41,6 +41,7 @@ constexpr int64_t kLogSize = 1024;
 std::mutex g_mutex;
 int32_t g_fail_skip = 0;
 int32_t g_fail_error = 0;
+bool g_fail_persistent = false;
 int64_t g_calls = 0;
 ResizeEntry g_log[kLogSize];
 
@@ -100,7 +101,7 @@ int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArrayHandle* ha
         --g_fail_skip;
       } else {
         const int32_t e = g_fail_error;
-        g_fail_error = 0;
+        if (!g_fail_persistent) g_fail_error = 0;
         return e;
       }
     }
@@ -143,6 +144,14 @@ void EmuFailResize(int32_t skip, int32_t error) {
   std::lock_guard<std::mutex> lock(g_mutex);
   g_fail_skip = skip;
   g_fail_error = error;
+  g_fail_persistent = false;
+}
+
+void EmuFailResizesFrom(int32_t skip, int32_t error) {
+  std::lock_guard<std::mutex> lock(g_mutex);
+  g_fail_skip = skip;
+  g_fail_error = error;
+  g_fail_persistent = true;
 }
 
 int64_t EmuResizeCalls(void) {

@@ -52,6 +52,8 @@ EMUHOST_API void EmuRead(QdmArrayHandle handle, double* out, size_t doubles);
 /* The next NumericArrayResize call (after `skip` further ones that succeed)
  * returns `error` instead of resizing; error 0 clears. */
 EMUHOST_API void EmuFailResize(int32_t skip, int32_t error);
+/* As EmuFailResize, but every call from that one on fails until cleared. */
+EMUHOST_API void EmuFailResizesFrom(int32_t skip, int32_t error);
 /* Number of NumericArrayResize calls so far, and the arguments of the last one. */
 EMUHOST_API int64_t EmuResizeCalls(void);
 EMUHOST_API void EmuLastResize(int32_t* typeCode, int32_t* numDims, size_t* count);

@@ -139,14 +139,14 @@ StatusCode ArSpectrumComplex(Complex* a, int32_t m, int32_t recip, double fs, in
   for (size_t i = 0; i < mm; ++i) a[i] = Complex(re[i], im[i]);
 
   const int32_t L = SpectrumLength(N);
-  // The zero padding needs m <= L; a longer coefficient vector has no
-  // meaning on this grid and is refused.
-  if (L < 1 || m > L) return status::kBadSize;
+  if (L < 1) return status::kBadSize;
   const size_t LL = static_cast<size_t>(L);
   WorkArray<Complex> in = AllocWork<Complex>(LL), out = AllocWork<Complex>(LL);
   WorkArray<double> P = AllocWork<double>(LL);
   if (!in || !out || !P) return status::kNoMemory;
-  std::memcpy(static_cast<void*>(in.get()), a, mm * sizeof(Complex));
+  // As in the real evaluator, coefficients beyond L wrap by assignment: a
+  // later one replaces an earlier one in the same slot.
+  for (size_t i = 0; i < mm; ++i) in[i % LL] = a[i];
 
   PlanHolder plan{FftPlanAcquire(L)};
   if (plan.plan == nullptr) return status::kNoMemory;

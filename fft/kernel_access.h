@@ -26,8 +26,10 @@
 // built for SSE2 and AVX and picked by the loader (target_clones), which saves
 // the register copies of the two-operand SSE2 instructions. No fused
 // multiply-adds anywhere, so every variant gives bit-identical results. Not
-// on Windows: GCC there does not align the stack for 32-byte spills.
-#if defined(__GNUC__) && defined(__x86_64__) && defined(__ELF__)
+// on Windows: GCC there does not align the stack for 32-byte spills. Not with
+// clang (the fuzzing build): it ignores the pragma regions, and clang 14 names
+// the target_clones resolvers of C++ functions apart from their callers.
+#if defined(__GNUC__) && !defined(__clang__) && defined(__x86_64__) && defined(__ELF__)
 #define FFTK_WIDE 1
 #define FFTK_CLONES __attribute__((target_clones("avx", "default")))
 #else
@@ -102,12 +104,12 @@ struct InterleavedAccess {
     V2 a, b;
     std::memcpy(&a, re, sizeof a);
     std::memcpy(&b, re + li, sizeof b);
-    r = __builtin_shuffle(a, b, V2i{0, 2});
-    i = __builtin_shuffle(a, b, V2i{1, 3});
+    r = __builtin_shufflevector(a, b, 0, 2);
+    i = __builtin_shufflevector(a, b, 1, 3);
   }
   void StC(double* re, double*, T r, T i) const {
-    const V2 a = __builtin_shuffle(r, i, V2i{0, 2});
-    const V2 b = __builtin_shuffle(r, i, V2i{1, 3});
+    const V2 a = __builtin_shufflevector(r, i, 0, 2);
+    const V2 b = __builtin_shufflevector(r, i, 1, 3);
     std::memcpy(re, &a, sizeof a);
     std::memcpy(re + lo, &b, sizeof b);
   }
@@ -177,12 +179,12 @@ struct Interleaved4Access {
   void LdC(const double* re, const double*, T& r, T& i) const {
     const V4 a = Join(re, re + li);
     const V4 b = Join(re + 2 * li, re + l3 * li);
-    r = __builtin_shuffle(a, b, V4i{0, 4, 2, 6});
-    i = __builtin_shuffle(a, b, V4i{1, 5, 3, 7});
+    r = __builtin_shufflevector(a, b, 0, 4, 2, 6);
+    i = __builtin_shufflevector(a, b, 1, 5, 3, 7);
   }
   void StC(double* re, double*, T r, T i) const {
-    Split(re, re + lo, __builtin_shuffle(r, i, V4i{0, 4, 2, 6}));
-    Split(re + 2 * lo, re + l3 * lo, __builtin_shuffle(r, i, V4i{1, 5, 3, 7}));
+    Split(re, re + lo, __builtin_shufflevector(r, i, 0, 4, 2, 6));
+    Split(re + 2 * lo, re + l3 * lo, __builtin_shufflevector(r, i, 1, 5, 3, 7));
   }
 };
 
@@ -192,13 +194,13 @@ struct Interleaved4Access {
 // butterfly 1, whose entry also fills lane 0 (never used).
 struct Lane4FirstAccess : Lane4Access {
   T LdW(const double* p) const { return T{p[0], p[0], p[lw], p[2 * lw]}; }
-  static T Tw0(T x, T v) { return __builtin_shuffle(x, v, V4i{0, 5, 6, 7}); }
+  static T Tw0(T x, T v) { return __builtin_shufflevector(x, v, 0, 5, 6, 7); }
 };
 
 // As Lane4FirstAccess, lanes in the order 0, 2, 1, 3.
 struct Interleaved4FirstAccess : Interleaved4Access {
   T LdW(const double* p) const { return T{p[0], p[lw], p[0], p[2 * lw]}; }
-  static T Tw0(T x, T v) { return __builtin_shuffle(x, v, V4i{0, 5, 6, 7}); }
+  static T Tw0(T x, T v) { return __builtin_shufflevector(x, v, 0, 5, 6, 7); }
 };
 
 #pragma GCC pop_options

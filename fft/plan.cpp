@@ -197,7 +197,8 @@ int32_t FftFactorize(int32_t n, int32_t* factor, int32_t* kind) {
   }
   if (rest != 1) {
     if (rest >= 9) {
-      for (int32_t d = 3; d * d <= rest; d += 2) {
+      // d <= rest / d: d * d would overflow for a prime rest near 2^31.
+      for (int32_t d = 3; d <= rest / d; d += 2) {
         while (rest % d == 0) {
           factor[count] = d;
           kind[count] = d < 50 ? kFftKindGeneric : kFftKindRader;

@@ -112,6 +112,8 @@ qdm_example_fails(status_bad_order "covariance returned -42412: order" covarianc
                   --order 0)
 qdm_example_fails(status_bad_rate "covspectrum returned -42418: sampling rate not positive"
                   covspectrum --rate 0)
+qdm_example_fails(status_largest_order "covariance returned -42412: order" covariance
+                  ${_ex_marple} --order 2147483647)
 
 # Good runs: every output handle resized and filled by the library.
 qdm_example_json(json_marple64_covariance

@@ -23,61 +23,64 @@ struct Outcome {
   bool operator==(const Outcome&) const = default;
 };
 
-void AddBits(std::vector<uint64_t>& bits, double v) {
-  uint64_t b;
-  std::memcpy(&b, &v, sizeof b);
-  bits.push_back(b);
+// One call of the mix: an export and one of its argument sets.
+struct MixedCall {
+  const Export* x;
+  Scalars s;
+};
+
+// Every export with every argument set of its family: short and long records,
+// and spectra whose FFT lengths run from 2 to 4096.
+std::vector<MixedCall> Mix() {
+  std::vector<MixedCall> mix;
+  for (const Export& x : Exports())
+    for (const Scalars& s : ArgumentSets(x.family)) mix.push_back({&x, s});
+  return mix;
 }
 
-Outcome CallOnce(const QdmApi& qdm, const Export& x) {
-  const Scalars s = Valid(x.family);
-  Call c = MakeCall(x, s);
+Outcome CallOnce(const QdmApi& qdm, const MixedCall& m) {
+  Call c = MakeCall(*m.x, m.s);
   Outcome o;
-  o.status = x.invoke(qdm, c, s);
-  for (int i = 0; i < x.outputs; ++i) {
-    o.bits.push_back(static_cast<uint64_t>(c.out[i].Count()));
-    o.bits.push_back(c.out[i].Capacity());
-    for (double v : c.out[i].Reals(static_cast<int32_t>(c.out[i].Capacity()) *
-                                   (x.resizes(s)[static_cast<size_t>(i)].typeCode == kC ? 2 : 1)))
-      AddBits(o.bits, v);
-  }
-  for (int j = 0; j < x.doubles; ++j) AddBits(o.bits, c.d[j]);
-  o.bits.push_back(static_cast<uint64_t>(c.order));
+  o.status = m.x->invoke(qdm, c, m.s);
+  o.bits = Leftovers(*m.x, c, m.s);
   return o;
 }
 
 TEST(Concurrency, SimultaneousFirstCallsMatchCallsMadeAlone) {
   const QdmApi& qdm = Qdm();
-  const std::vector<Export>& exports = Exports();
-  constexpr int kThreads = 8;
-  constexpr int kRounds = 3;
+  const std::vector<MixedCall> mix = Mix();
+  constexpr int kThreads = 16;
+  constexpr int kRounds = 2;
   std::vector<std::vector<Outcome>> outcomes(kThreads);
   std::atomic<int> ready{0};
   std::vector<std::thread> threads;
+  // Each thread starts at a different call of the mix (every one begins with a
+  // resize, so the first resolution of the host function races) and walks it
+  // with its own stride, so that different sizes and FFT lengths overlap.
+  auto order = [&](int t, size_t i) {
+    const size_t stride = 2 * static_cast<size_t>(t) + 1;
+    return (static_cast<size_t>(t) * 7 + i * stride) % mix.size();
+  };
   for (int t = 0; t < kThreads; ++t) {
     threads.emplace_back([&, t] {
       ready.fetch_add(1);
       while (ready.load() < kThreads) std::this_thread::yield();
-      // Each thread starts at a different export; every one begins with a resize.
-      for (int r = 0; r < kRounds; ++r) {
-        for (size_t i = 0; i < exports.size(); ++i) {
-          const size_t e = (i + static_cast<size_t>(t) * 3) % exports.size();
-          outcomes[static_cast<size_t>(t)].push_back(CallOnce(qdm, exports[e]));
-        }
-      }
+      for (int r = 0; r < kRounds; ++r)
+        for (size_t i = 0; i < mix.size(); ++i)
+          outcomes[static_cast<size_t>(t)].push_back(CallOnce(qdm, mix[order(t, i)]));
     });
   }
   for (std::thread& th : threads) th.join();
 
   std::vector<Outcome> alone;
-  for (const Export& x : exports) alone.push_back(CallOnce(qdm, x));
+  for (const MixedCall& m : mix) alone.push_back(CallOnce(qdm, m));
   for (int t = 0; t < kThreads; ++t) {
     size_t k = 0;
     for (int r = 0; r < kRounds; ++r) {
-      for (size_t i = 0; i < exports.size(); ++i, ++k) {
-        const size_t e = (i + static_cast<size_t>(t) * 3) % exports.size();
-        EXPECT_EQ(outcomes[static_cast<size_t>(t)][k], alone[e])
-            << exports[e].name << " thread " << t << " round " << r;
+      for (size_t i = 0; i < mix.size(); ++i, ++k) {
+        const MixedCall& m = mix[order(t, i)];
+        EXPECT_EQ(outcomes[static_cast<size_t>(t)][k], alone[order(t, i)])
+            << m.x->name << " n=" << m.s.n << " size " << m.s.b << " thread " << t;
       }
     }
   }

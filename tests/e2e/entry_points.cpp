@@ -301,4 +301,105 @@ TEST(EntryPoints, InputIsReadInPlaceAndLeftUnchanged) {
   }
 }
 
+
+// ---- integer arguments at their extremes --------------------------------------------
+// Every integer argument of every export walked through 0, +-1, the check
+// limits, 2^30 and the ends of the 32-bit range, the others kept valid. The
+// expected code comes from the check table written out again here, in 64-bit
+// arithmetic. A call that passes its checks has its last resize failed (host
+// error 3), so that the length it asks for is seen without being allocated
+// and no estimator runs on it. Under UBSan this is also the test that no size
+// is computed from an argument before it is checked.
+
+// Internal code of the first failing check, 0 when all pass.
+int32_t ExpectedCheckCode(Family f, const Scalars& s) {
+  const int64_t bound = (2 * int64_t{s.n}) / 3;
+  const bool badRate = !(s.fs > 0) && !std::isnan(s.fs);
+  const bool badM = s.b <= 1 || s.b > (int64_t{1} << 30);
+  if (s.n < 1) return 1;
+  switch (f) {
+    case Family::kProny:
+      if (s.a <= 0 || s.a > bound) return 12;
+      return badRate ? 18 : 0;
+    case Family::kCovariance:
+      return (s.a <= 0 || s.a > bound) ? 12 : 0;
+    case Family::kPcar:
+      if (s.a < 0 || s.a > bound) return 11;
+      if (s.b <= 0) return 12;
+      return s.b > s.a ? 13 : 0;
+    case Family::kPencil:
+      if (s.a < 0 || s.a > bound) return 11;
+      if (s.b <= 0) return 12;
+      if (s.b > s.a) return 13;
+      return badRate ? 18 : 0;
+    case Family::kMdl:
+      if (s.b < 1) return 14;
+      return (s.a <= s.b || s.a > bound) ? 15 : 0;
+    case Family::kCovSpectrum:
+      if (s.a < 0 || s.a > bound) return 12;
+      if (badM) return 17;
+      return badRate ? 18 : 0;
+    case Family::kPcarSpectrum:
+      if (s.a < 0 || s.a > bound) return 11;
+      if (s.c <= 0) return 12;
+      if (s.c > s.a) return 13;
+      if (badM) return 17;
+      return badRate ? 18 : 0;
+  }
+  return -1;
+}
+
+int IntegerArguments(Family f) {
+  switch (f) {
+    case Family::kProny:
+    case Family::kCovariance: return 1;
+    case Family::kPcarSpectrum: return 3;
+    default: return 2;
+  }
+}
+
+TEST(EntryChecks, IntegerArgumentsAtTheirExtremes) {
+  const QdmApi& qdm = Qdm();
+  constexpr int32_t kTwo30 = INT32_C(1) << 30;
+  const int32_t values[] = {INT32_MIN, INT32_MIN + 1, -1, 0, 1, 2, 8, 9, kTwo30 - 1,
+                            kTwo30,    kTwo30 + 1,    INT32_MAX - 1, INT32_MAX};
+  constexpr int32_t kInjected = 3;
+  int calls = 0;
+  for (const Export& x : Exports()) {
+    for (int arg = 0; arg < IntegerArguments(x.family); ++arg) {
+      for (int32_t v : values) {
+        Scalars s = Valid(x.family);
+        (arg == 0 ? s.a : arg == 1 ? s.b : s.c) = v;
+        const std::string where = std::string(x.name) + " argument " + std::to_string(arg) +
+                                  " = " + std::to_string(v);
+        const int32_t code = ExpectedCheckCode(x.family, s);
+        Call c = MakeCall(x, s);
+        const int64_t mark = qdmtest::ResizeMark();
+        if (code == 0 && x.outputs > 0) EmuFailResize(x.outputs - 1, kInjected);
+        const int32_t st = x.invoke(qdm, c, s);
+        EmuFailResize(0, 0);
+        ++calls;
+        if (x.family == Family::kMdl) {
+          if (code != 0) EXPECT_EQ(st, HostCode(code)) << where;
+          else EXPECT_TRUE(st != HostCode(14) && st != HostCode(15)) << where;
+          continue;
+        }
+        if (code != 0) {
+          EXPECT_EQ(st, HostCode(code)) << where;
+          EXPECT_EQ(ResizesSince(mark), EmptyingResizes(x, s)) << where;
+          ExpectEmptied(x, c, where);
+          continue;
+        }
+        EXPECT_EQ(st, HostCode(kInjected)) << where;
+        std::vector<ResizeCall> made = ResizesSince(mark);
+        const std::vector<ResizeCall> asked = x.resizes(s);
+        ASSERT_GE(made.size(), asked.size()) << where;
+        made.resize(asked.size());
+        EXPECT_EQ(made, asked) << where;
+      }
+    }
+  }
+  RecordProperty("calls", calls);
+}
+
 }  // namespace

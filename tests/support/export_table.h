@@ -16,6 +16,7 @@
 #include <cmath>
 #include <complex>
 #include <cstdint>
+#include <cstring>
 #include <functional>
 #include <string>
 #include <vector>
@@ -211,6 +212,33 @@ inline Scalars Valid(Family f) {
   return {};
 }
 
+// More argument sets per family: the valid set (n = 12), one on a longer
+// record, and for the spectra a range of sizes including primes; they round up
+// to the power-of-two grid, so FFT plans of every length from 2 to 4096 are built.
+inline constexpr int32_t kSpectrumSizes[] = {2, 3, 5, 17, 53, 127, 1009, 4096};
+
+inline std::vector<Scalars> ArgumentSets(Family f) {
+  std::vector<Scalars> sets = {Valid(f)};
+  switch (f) {
+    case Family::kProny: sets.push_back({64, 8, 0, 0, 2.0}); break;
+    case Family::kCovariance: sets.push_back({64, 10, 0, 0, 1.0}); break;
+    case Family::kPcar: sets.push_back({64, 12, 4, 0, 1.0}); break;
+    case Family::kPencil: sets.push_back({64, 20, 6, 0, 3.0}); break;
+    case Family::kMdl: sets.push_back({64, 12, 2, 0, 1.0}); break;
+    case Family::kCovSpectrum:
+      sets.clear();
+      for (int32_t m : kSpectrumSizes) sets.push_back({12, 2, m, 0, 1.0});
+      sets.push_back({64, 10, 256, 0, 1.0});
+      break;
+    case Family::kPcarSpectrum:
+      sets.clear();
+      for (int32_t m : kSpectrumSizes) sets.push_back({12, 4, m, 2, 1.0});
+      sets.push_back({64, 12, 256, 4, 1.0});
+      break;
+  }
+  return sets;
+}
+
 inline Call MakeCall(const Export& x, const Scalars& s) { return Call{Signal(x.complexData, s.n)}; }
 
 // Every output at count 0 and capacity 0, every out double but the
@@ -229,6 +257,28 @@ inline void ExpectEmptied(const Export& x, const Call& c, const std::string& whe
       EXPECT_EQ(c.d[j], kStale) << where << " double " << j;
     }
   }
+}
+
+// Everything a successful call left behind, doubles as bit patterns (NaN-safe):
+// every output's count, capacity and elements, the out doubles, the MDL result.
+inline std::vector<uint64_t> Leftovers(const Export& x, const Call& c, const Scalars& s) {
+  std::vector<uint64_t> bits;
+  auto add = [&bits](double v) {
+    uint64_t b;
+    std::memcpy(&b, &v, sizeof b);
+    bits.push_back(b);
+  };
+  const std::vector<ResizeCall> resizes = x.resizes(s);
+  for (int i = 0; i < x.outputs; ++i) {
+    const HostArray& out = c.out[i];
+    bits.push_back(static_cast<uint64_t>(out.Count()));
+    bits.push_back(out.Capacity());
+    const int32_t perElement = resizes[static_cast<size_t>(i)].typeCode == kC ? 2 : 1;
+    for (double v : out.Reals(static_cast<int32_t>(out.Capacity()) * perElement)) add(v);
+  }
+  for (int j = 0; j < x.doubles; ++j) add(c.d[j]);
+  bits.push_back(static_cast<uint64_t>(c.order));
+  return bits;
 }
 
 // The resizes of the failure path: every output to 0 with its type code.

@@ -188,24 +188,6 @@ TEST(EntryFrame, NegativeResizeErrorPassesUnchanged) {
   EmuFailResize(0, 0);
 }
 
-TEST(EntryFrame, ExhaustedWorkMemoryIsReportedAndNothingLeaks) {
-  for (int64_t k = 1; k <= 3; ++k) {
-    Fixture f;
-    const int64_t before = NumAllocOutstanding();
-    NumAllocFailAt(k, false);
-    bool called = false;
-    const int32_t st = f.Run([&](EntryCall&) {
-      called = true;
-      return status::kOk;
-    });
-    NumAllocFailAt(0, false);
-    EXPECT_EQ(st, -20001) << k;
-    EXPECT_FALSE(called);
-    EXPECT_EQ(EmuCount(f.known), 0);
-    EXPECT_EQ(NumAllocOutstanding(), before);
-  }
-}
-
 TEST(EntryFrame, MdlRunnerReturnsHostCodesAndZeroesTheOrderOnlyOnEstimatorFailure) {
   QdmArrayHandle x = MakeReal({1, 2, 3});
   const StatusCode failing = 14;

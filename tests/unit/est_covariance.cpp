@@ -270,46 +270,4 @@ TEST(Covariance, ArgumentCodesAndTheLargestAcceptedOrder) {
   }
 }
 
-// ---- exhausted memory --------------------------------------------------------------
-
-// Fails the k-th allocation for k = 1, 2, ... until a run sees no fault. The
-// estimator's own arrays come first, so their failure must be reported; later
-// faults inside the least-squares solve are deliberately not, so those runs may
-// succeed. Nothing may leak either way.
-template <typename Run>
-void FaultSweep(int own_allocations, Run run) {
-  for (bool persistent : {false, true}) {
-    for (int64_t k = 1; k < 1000; ++k) {
-      const int64_t before = NumAllocOutstanding();
-      NumAllocFailAt(k, persistent);
-      const StatusCode st = run();
-      const int64_t attempts = NumAllocAttempts();
-      NumAllocFailAt(0, false);
-      EXPECT_EQ(NumAllocOutstanding(), before) << "k=" << k;
-      if (k <= own_allocations) {
-        EXPECT_EQ(st, -20001) << "k=" << k;
-      }
-      EXPECT_TRUE(st == 0 || st == -20001) << "k=" << k << " st=" << st;
-      if (attempts < k) {
-        EXPECT_EQ(st, 0);
-        break;
-      }
-    }
-  }
-}
-
-TEST(Covariance, EveryFailedAllocationIsReportedOrAbsorbedWithoutLeak) {
-  std::vector<double> xr(24);
-  std::vector<C> xc(24);
-  for (int t = 0; t < 24; ++t) {
-    xr[t] = std::cos(0.5 * t) + 0.3 * std::sin(1.7 * t);
-    xc[t] = std::polar(1.0, 0.5 * t) + 0.3 * std::polar(0.95, -1.7 * t);
-  }
-  std::vector<double> ar(5);
-  std::vector<C> ac(5), r(4);
-  double v = 0;
-  FaultSweep(7, [&] { return CovarianceArReal(xr.data(), 24, 4, ar.data(), r.data(), &v); });
-  FaultSweep(6, [&] { return CovarianceArComplex(xc.data(), 24, 4, ac.data(), r.data(), &v); });
-}
-
 }  // namespace

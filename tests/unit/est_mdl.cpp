@@ -163,32 +163,4 @@ TEST(MdlOrder, ComplexArgumentCodes) {
   EXPECT_EQ(Cplx(xc, 10, 0).status, status::kBadSize);
 }
 
-TEST(MdlOrder, EveryFailedAllocationIsReportedWithoutLeak) {
-  const int n = 40;
-  const auto x = damped_modes::Noise(n, 1.0, 81);
-  const std::vector<std::complex<double>> xc(x.begin(), x.end());
-  for (int twin = 0; twin < 2; ++twin) {
-    const int64_t before = NumAllocOutstanding();
-    int failures = 0;
-    for (int64_t k = 1;; ++k) {
-      NumAllocFailAt(k, false);
-      const Outcome o = twin == 0 ? Real(x, 12, 2) : Cplx(xc, 12, 2);
-      const int64_t attempts = NumAllocAttempts();
-      NumAllocFailAt(0, false);
-      EXPECT_EQ(NumAllocOutstanding(), before);
-      if (attempts < k) {
-        EXPECT_EQ(o.status, 0);
-        break;
-      }
-      // The mode fit does not report its least-squares solve; everything else does.
-      EXPECT_TRUE(o.status == status::kNoMemory || o.status == 0) << k << ": " << o.status;
-      if (o.status == status::kNoMemory) ++failures;
-      if (k <= 15) {
-        EXPECT_EQ(o.status, status::kNoMemory) << "twin " << twin << " k " << k;
-      }
-    }
-    EXPECT_GT(failures, 15);
-  }
-}
-
 }  // namespace

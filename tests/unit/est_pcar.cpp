@@ -283,31 +283,4 @@ TEST(PcarEstimate, LargestOrderAccepted) {
   EXPECT_EQ(a[0], 1.0);
 }
 
-// ---- exhausted memory ------------------------------------------------------------------
-TEST(PcarEstimate, EveryFailedAllocationIsReportedWithoutLeak) {
-  const int n = 40, p = 6;
-  const auto x = damped_modes::Noise(n, 1.0, 5);
-  const std::vector<std::complex<double>> xc(x.begin(), x.end());
-  std::vector<double> a(p + 1);
-  std::vector<std::complex<double>> ac(p + 1), roots(p);
-  for (int twin = 0; twin < 2; ++twin) {
-    const int64_t before = NumAllocOutstanding();
-    for (int64_t k = 1;; ++k) {
-      NumAllocFailAt(k, false);
-      const StatusCode st = twin == 0 ? PcarEstimateReal(x.data(), n, p, 3, a.data(), roots.data())
-                                      : PcarEstimateComplex(xc.data(), n, p, 3, ac.data(),
-                                                            roots.data());
-      const int64_t attempts = NumAllocAttempts();
-      NumAllocFailAt(0, false);
-      EXPECT_EQ(NumAllocOutstanding(), before) << "twin " << twin << " k " << k;
-      if (attempts < k) {  // nothing failed: the run is complete
-        EXPECT_EQ(st, 0);
-        EXPECT_GT(k, 10);
-        break;
-      }
-      EXPECT_EQ(st, status::kNoMemory) << "twin " << twin << " k " << k;
-    }
-  }
-}
-
 }  // namespace

@@ -213,39 +213,4 @@ TEST(Prony, ArgumentCodesInOrder) {
 
 // ---- exhausted memory --------------------------------------------------------------
 
-TEST(Prony, EveryFailedAllocationIsReportedOrAbsorbedWithoutLeak) {
-  std::vector<double> x(20);
-  std::vector<C> xc(20);
-  for (int t = 0; t < 20; ++t) {
-    x[t] = std::cos(0.4 * t) + 0.5 * std::cos(1.9 * t + 1);
-    xc[t] = C(x[t], std::sin(0.4 * t));
-  }
-  std::vector<double> amp(4), phase(4), damp(4), freq(4);
-  int32_t count = 0;
-  for (bool real : {false, true}) {
-    for (bool persistent : {false, true}) {
-      for (int64_t k = 1; k < 1000; ++k) {
-        const int64_t before = NumAllocOutstanding();
-        NumAllocFailAt(k, persistent);
-        const StatusCode st =
-            real ? PronyReal(x.data(), 20, 4, 1.0, 1, amp.data(), phase.data(), damp.data(),
-                             freq.data(), &count)
-                 : PronyComplex(xc.data(), 20, 4, 1.0, amp.data(), phase.data(), damp.data(),
-                                freq.data(), &count);
-        const int64_t attempts = NumAllocAttempts();
-        NumAllocFailAt(0, false);
-        EXPECT_EQ(NumAllocOutstanding(), before) << k;
-        if (k <= 3) {
-          EXPECT_EQ(st, -20001) << k;  // Prony's own three arrays
-        }
-        EXPECT_TRUE(st == 0 || st == -20001) << k << " " << st;
-        if (attempts < k) {
-          EXPECT_EQ(st, 0);
-          break;
-        }
-      }
-    }
-  }
-}
-
 }  // namespace

@@ -65,6 +65,19 @@ TEST(FftPlan, FactorisationAndKinds) {
   }
 }
 
+// Trial division stops before its square would overflow: a prime near 2^31
+// takes it past 46340, whose square is the last below 2^31.
+TEST(FftPlan, FactorisationNearTheTopOfTheRange) {
+  int32_t factor[32], kind[32];
+  for (int32_t prime : {INT32_MAX, 2147483629}) {
+    ASSERT_EQ(FftFactorize(prime, factor, kind), 1) << prime;
+    EXPECT_EQ(factor[0], prime);
+  }
+  ASSERT_EQ(FftFactorize(46327 * 46337, factor, kind), 2);
+  EXPECT_EQ(factor[0], 46327);
+  EXPECT_EQ(factor[1], 46337);
+}
+
 // Twiddles: entry (k-1)*(r-1) + (j-1) of stage s is exp(-2 pi i jk/N_s).
 TEST(FftPlan, TwiddleTablesMatchTheirAngles) {
   for (int32_t n : {1000, 2438, 4096, 30030}) {

@@ -1,0 +1,15 @@
+# fuzz_exports: the libFuzzer target over the analysis exports (QDM_FUZZ=ON,
+# clang). fuzz.replay runs it once over the seed corpus and every input that
+# ever made it fail (tests/fuzz/regressions), so a fixed crash stays fixed.
+# tools/fuzz_campaign.sh runs long campaigns; scripts/test.sh a short one.
+if(QDM_FUZZ)
+  add_executable(fuzz_exports ${CMAKE_SOURCE_DIR}/tests/fuzz/fuzz_exports.cpp)
+  target_include_directories(fuzz_exports PRIVATE ${CMAKE_SOURCE_DIR}/tests)
+  target_link_libraries(fuzz_exports PRIVATE qdm_core gfrtemu ${QDM_LINALG_LIBS}
+                        Threads::Threads ${CMAKE_DL_LIBS})
+  target_link_options(fuzz_exports PRIVATE -fsanitize=fuzzer)
+  file(GLOB QDM_FUZZ_INPUTS CONFIGURE_DEPENDS ${CMAKE_SOURCE_DIR}/tests/fuzz/corpus/*
+       ${CMAKE_SOURCE_DIR}/tests/fuzz/regressions/*)
+  # Files given one by one are run once each, never mutated.
+  add_test(NAME fuzz.replay COMMAND fuzz_exports ${QDM_FUZZ_INPUTS})
+endif()

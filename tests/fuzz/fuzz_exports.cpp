@@ -1,0 +1,207 @@
+// libFuzzer target over the fourteen analysis exports, linked with the library's
+// internal objects and the emulated host run-time, built with ASan and UBSan.
+//
+// Input, read front to back (missing bytes read as zero):
+//   face (1 byte: 0 host; further faces take the next values), export (1 byte),
+//   flags (1 byte: bit 0 the real-signal flag, bit 1 fail a work allocation,
+//   bit 2 from then on, bit 3 fail a host resize), the three integer arguments
+//   (each a selector byte, maybe four more), n (2 bytes, up to 256), the
+//   sampling rate, the fault position (2 bytes), then the n data values (two per
+//   complex element). A value is a selector byte, maybe followed by its bits:
+//   NaN, +-inf, +-1e308, +-DBL_MAX, denormals, signed zeros, small or raw values.
+//
+// Beyond the sanitizers, each call is checked: its status is 0 or a documented
+// code; work memory is never left allocated; a failed call leaves its outputs
+// as the failure path does; and a call with an injected allocation failure
+// gives the clean call's result bit for bit or -20001 (the exports that ignore
+// a least-squares solve's status on purpose may also succeed differently). A
+// broken check aborts, which libFuzzer reports as a crash.
+#include <cfloat>
+#include <cmath>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "emuhost.h"
+#include "numeric/work.h"
+#include "qdm.h"
+#include "support/export_table.h"
+
+namespace {
+
+using namespace qdmtest;
+
+class Reader {
+ public:
+  Reader(const uint8_t* data, size_t size) : p_(data), left_(size) {}
+  uint8_t Byte() {
+    if (left_ == 0) return 0;
+    --left_;
+    return *p_++;
+  }
+  template <typename T>
+  T Bits() {
+    unsigned char b[sizeof(T)] = {};
+    for (unsigned char& c : b) c = Byte();
+    T v;
+    std::memcpy(&v, b, sizeof v);
+    return v;
+  }
+
+ private:
+  const uint8_t* p_;
+  size_t left_;
+};
+
+int32_t IntegerArgument(Reader& r) {
+  const uint8_t s = r.Byte();
+  switch (s % 8) {
+    case 0: return INT32_MIN;
+    case 1: return INT32_MAX;
+    case 2: return INT32_C(1) << 30;
+    case 3: return (INT32_C(1) << 30) + 1;
+    case 4: return r.Bits<int32_t>();
+    default: return static_cast<int8_t>(s) / 8;  // -16..15: the interesting range
+  }
+}
+
+double Value(Reader& r) {
+  const uint8_t s = r.Byte();
+  switch (s % 16) {
+    case 0: return NAN;
+    case 1: return INFINITY;
+    case 2: return -INFINITY;
+    case 3: return 1e308;
+    case 4: return -1e308;
+    case 5: return DBL_MAX;
+    case 6: return -DBL_MAX;
+    case 7: return 4.9e-324;
+    case 8: return -DBL_MIN / 4;
+    case 9: return 0.0;
+    case 10: return -0.0;
+    case 11: return r.Bits<double>();
+    default: return static_cast<int16_t>(r.Bits<uint16_t>()) / 4096.0 + (s >> 4);
+  }
+}
+
+// Host codes a call may return: argument errors, numeric and FFT failures,
+// the injected host resize error.
+constexpr int32_t kResizeError = 3;
+const std::set<int32_t> kStatuses = {0,      -42401, -42411, -42412, -42413, -42414, -42415,
+                                     -42416, -42417, -42418, -20001, -20003, -20004, -20061,
+                                     -20062, -20063, -20068, -20116, -20999, -1,
+                                     -42400 - kResizeError};
+
+const std::set<std::string> kSolveStatusIgnored = {
+    "QdmReCovarianceH",     "QdmCxCovarianceH",        "QdmRePronyH",
+    "QdmCxPronyH",          "QdmReMatrixPencilH",      "QdmCxMatrixPencilH",
+    "QdmReCovPowerSpectrH", "QdmCxCovPowerSpectrH",    "QdmRePCARPowerSpectrumH",
+    "QdmCxPCARPowerSpectrumH", "QdmReMinDescriptLenH", "QdmCxMinDescriptLenH"};
+
+void Require(bool ok, const char* what, const Export& x, int32_t st) {
+  if (ok) return;
+  std::fprintf(stderr, "fuzz check failed: %s (%s, status %d)\n", what, x.name, st);
+  std::abort();
+}
+
+// ---- faces ------------------------------------------------------------------------------
+// A face calls one export row on prepared host state. The host face calls the
+// linked exports directly.
+const QdmApi& HostApi() {
+  static const QdmApi api = [] {
+    QdmApi a;
+#define QDM_FUZZ_BIND(name) a.name = &::name;
+    QDM_TEST_EXPORTS(QDM_FUZZ_BIND)
+#undef QDM_FUZZ_BIND
+    return a;
+  }();
+  return api;
+}
+
+using FaceCall = int32_t (*)(const Export&, Call&, const Scalars&);
+const FaceCall kFaces[] = {
+    [](const Export& x, Call& c, const Scalars& s) { return x.invoke(HostApi(), c, s); },
+};
+constexpr size_t kFaceCount = sizeof(kFaces) / sizeof(kFaces[0]);
+
+Call Prepare(const Export& x, const Scalars& s, const std::vector<double>& values, bool flag) {
+  Call c{x.complexData ? HostArray::Complex(std::span<const std::complex<double>>(
+                             reinterpret_cast<const std::complex<double>*>(values.data()),
+                             values.size() / 2))
+                       : HostArray::Real(values)};
+  c.flag = flag ? 1 : 0;
+  (void)s;
+  return c;
+}
+
+bool Emptied(const Export& x, const Call& c) {
+  for (int i = 0; i < x.outputs; ++i)
+    if (c.out[i].Count() != 0) return false;
+  return true;
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  Reader r(data, size);
+  const FaceCall face = kFaces[r.Byte() % kFaceCount];
+  const std::vector<Export>& exports = Exports();
+  const Export& x = exports[r.Byte() % exports.size()];
+  const uint8_t flags = r.Byte();
+  Scalars s{};
+  s.a = IntegerArgument(r);
+  s.b = IntegerArgument(r);
+  s.c = IntegerArgument(r);
+  // Spectrum sizes between 8192 and 2^30 are valid but only cost time.
+  const bool spectrum = x.family == Family::kCovSpectrum || x.family == Family::kPcarSpectrum;
+  if (spectrum && s.b > 8192 && s.b <= (INT32_C(1) << 30)) s.b = 2 + s.b % 8191;
+  s.n = r.Bits<uint16_t>() % 257;
+  s.fs = Value(r);
+  const uint16_t faultAt = r.Bits<uint16_t>();
+  std::vector<double> values(static_cast<size_t>(s.n) * (x.complexData ? 2 : 1));
+  for (double& v : values) v = Value(r);
+
+  // The clean call.
+  Call clean = Prepare(x, s, values, flags & 1);
+  const int32_t cleanStatus = face(x, clean, s);
+  Require(kStatuses.count(cleanStatus) != 0, "undocumented status", x, cleanStatus);
+  Require(NumAllocOutstanding() == 0, "work memory left allocated", x, cleanStatus);
+  if (cleanStatus != 0 && x.family != Family::kMdl) {
+    Require(Emptied(x, clean), "failed call did not empty its outputs", x, cleanStatus);
+  }
+  if ((flags & 10) == 0) return 0;
+
+  // The same call with a fault.
+  Call faulted = Prepare(x, s, values, flags & 1);
+  const bool resize = (flags & 8) != 0;
+  if (resize) {
+    EmuFailResize(faultAt % 4, kResizeError);
+  } else {
+    NumAllocFailAt(faultAt % 1024 + 1, (flags & 4) != 0);
+  }
+  const int32_t st = face(x, faulted, s);
+  NumAllocFailAt(0, false);
+  EmuFailResize(0, 0);
+  Require(NumAllocOutstanding() == 0, "work memory left allocated after a fault", x, st);
+  Require(kStatuses.count(st) != 0, "undocumented status after a fault", x, st);
+  if (st == cleanStatus) {
+    if (st == 0 && kSolveStatusIgnored.count(x.name) == 0) {
+      Require(Leftovers(x, faulted, s) == Leftovers(x, clean, s),
+              "success after a fault with a different result", x, st);
+    }
+    return 0;
+  }
+  if (resize) {
+    Require(st == -42400 - kResizeError, "resize failure not reported", x, st);
+  } else if (st == 0) {
+    Require(kSolveStatusIgnored.count(x.name) != 0, "success after a fault, clean call failed",
+            x, st);
+  } else {
+    Require(st == -20001, "a fault gave neither the clean status nor -20001", x, st);
+  }
+  return 0;
+}
