@@ -44,9 +44,10 @@ set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_PACKAGE_SECTION science)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
 if(QDM_BLAS STREQUAL "openblas")
-  # The libraries' run path leads to the single-threaded OpenBLAS; without it
-  # they run on whatever libblas.so.3 and liblapack.so.3 the system provides.
-  set(CPACK_DEBIAN_PACKAGE_RECOMMENDS libopenblas0-serial)
+  # The libraries' run path leads to OpenBLAS's pthreads variant (run with one
+  # thread); without it they run on whatever libblas.so.3 and liblapack.so.3
+  # the system provides.
+  set(CPACK_DEBIAN_PACKAGE_RECOMMENDS libopenblas0-pthread)
 endif()
 include(CPack)
 

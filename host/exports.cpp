@@ -22,9 +22,9 @@ namespace {
 constexpr int32_t kReal = QDM_TYPE_DOUBLE;
 constexpr int32_t kCx = QDM_TYPE_COMPLEX;
 
-// Output lengths are computed only from arguments that passed their checks;
-// after a failed check nothing is resized, so the length does not matter.
-int32_t LengthIf(StatusCode check, int32_t length) { return check == status::kOk ? length : 0; }
+// Output lengths are computed only from arguments that passed their checks
+// (p + 1 overflows for p = INT_MAX); after a failed check nothing is resized,
+// so the length does not matter.
 
 // Flags arrive as a pointer to one host byte; its value goes on zero-extended.
 int32_t FlagValue(const uint8_t* flag) { return static_cast<int32_t>(*flag); }
@@ -53,9 +53,9 @@ template <typename Estimate>
 int32_t ArEntry(QdmArrayHandle data, int32_t type, int32_t n, StatusCode check, int32_t p,
                 QdmArrayHandle coefficients, QdmArrayHandle second,
                 std::span<const OutDouble> outDoubles, const Estimate& estimate) {
-  const OutputArray outputs[] = {{second, kCx, LengthIf(check, p), CountSource::kLength},
-                                 {coefficients, type, LengthIf(check, p + 1),
-                                  CountSource::kLength}};
+  const bool sized = check == status::kOk;
+  const OutputArray outputs[] = {{second, kCx, sized ? p : 0, CountSource::kLength},
+                                 {coefficients, type, sized ? p + 1 : 0, CountSource::kLength}};
   return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles}, estimate);
 }
 
@@ -112,7 +112,7 @@ int32_t CovSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t m
                          const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
   const StatusCode check = checks::CovSpectrum(n, p, m, rate);
-  const int32_t N = LengthIf(check, SpectrumLength(m));
+  const int32_t N = check == status::kOk ? SpectrumLength(m) : 0;
   const OutputArray outputs[] = {{spectrum, kReal, N, CountSource::kLength}};
   const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
                                   {df, OutDoubleRole::kSpectrumDf},
@@ -132,7 +132,7 @@ int32_t PcarSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t 
                           const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
   const StatusCode check = checks::PcarSpectrum(n, p, k, m, rate);
-  const int32_t N = LengthIf(check, SpectrumLength(m));
+  const int32_t N = check == status::kOk ? SpectrumLength(m) : 0;
   const OutputArray outputs[] = {{amp, kReal, k, CountSource::kModes},
                                  {phase, kReal, k, CountSource::kModes},
                                  {freq, kReal, k, CountSource::kModes},

@@ -177,6 +177,13 @@ StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T*
     std::memcpy(static_cast<void*>(y + int64_t{j} * n), Wb + int64_t{j} * ld,
                 static_cast<size_t>(n) * sizeof(T));
   }
+  // Finite A and B of extreme magnitude can overflow in the reflectors. The
+  // drivers that take R next must never see a NaN or an infinity (LAPACK's own
+  // scaling then reports an illegal argument, and the reference xerbla ends
+  // the process), so such a fold is refused like such an input.
+  if (HasNonFinite(R, int64_t{n} * n) != 0 || HasNonFinite(y, int64_t{n} * nrhs) != 0) {
+    return status::kNonFinite;
+  }
   return status::kOk;
 }
 

@@ -72,30 +72,32 @@ StatusCode Svd(const T* A, int32_t m, int32_t n, T* U, double* S, T* V, int32_t 
   return status::kOk;
 }
 
-// The leading `count` singular triplets only, by the same reading of the
-// row-major array as A^T: U (m-by-count) is the right factor of A^T read
-// row-major, V (n-by-count) the conjugate of its left factor.
+// The leading `count` singular triplets: the economy decomposition, of which
+// the first `count` columns of U and V and values of S are kept. (The
+// selective driver gesvdx would compute only those, but on records whose
+// singular values tie its bisection step writes past its arrays.)
 template <typename T>
 StatusCode SvdLeading(const T* A, int32_t m, int32_t n, int32_t count, T* U, double* S, T* V) {
   if (m < 1 || n < 1 || count < 1 || count > std::min(m, n)) return status::kBadSize;
-  const int64_t mn = int64_t{m} * n;
-  if (HasNonFinite(A, mn) != 0) return status::kNonFinite;
-  const int64_t right_count = int64_t{count} * m;
-  const int64_t left_count = int64_t{count} * n;
-  const int32_t k = std::min(m, n);  // the driver's S has room for all of them
-  WorkArray<T> block = AllocWorkUninit<T>(static_cast<size_t>(mn + right_count + left_count + k));
-  if (!block) return status::kNoMemory;
-  T* at = block.get();
-  T* right = at + mn;
-  T* left = right + right_count;
-  double* sv = reinterpret_cast<double*>(left + left_count);
-  std::memcpy(static_cast<void*>(at), A, static_cast<size_t>(mn) * sizeof(T));
-  StatusCode st = lapack::Gesvdx(n, m, at, n, count, sv, left, n, right, count);
+  const int32_t k = std::min(m, n);
+  const int64_t uk = int64_t{m} * k;
+  const int64_t vk = int64_t{n} * k;
+  WorkArray<T> block = AllocWorkUninit<T>(static_cast<size_t>(uk + vk));
+  WorkArray<double> sv = AllocWorkUninit<double>(static_cast<size_t>(k));
+  if (!block || !sv) return status::kNoMemory;
+  T* u = block.get();
+  T* v = u + uk;
+  const StatusCode st = Svd<T>(A, m, n, u, sv.get(), v, 0);
   if (st != status::kOk) return st;
-  std::memcpy(S, sv, static_cast<size_t>(count) * sizeof(double));
-  st = AdjointInto(left, count, n, V);
-  if (st != status::kOk) return st;
-  std::memcpy(static_cast<void*>(U), right, static_cast<size_t>(right_count) * sizeof(T));
+  std::memcpy(S, sv.get(), static_cast<size_t>(count) * sizeof(double));
+  for (int32_t i = 0; i < m; ++i) {
+    std::memcpy(static_cast<void*>(U + int64_t{i} * count), u + int64_t{i} * k,
+                static_cast<size_t>(count) * sizeof(T));
+  }
+  for (int32_t i = 0; i < n; ++i) {
+    std::memcpy(static_cast<void*>(V + int64_t{i} * count), v + int64_t{i} * k,
+                static_cast<size_t>(count) * sizeof(T));
+  }
   return status::kOk;
 }
 

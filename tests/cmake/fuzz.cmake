@@ -3,8 +3,9 @@
 # ever made it fail (tests/fuzz/regressions), so a fixed crash stays fixed.
 # tools/fuzz_campaign.sh runs long campaigns; scripts/test.sh a short one.
 if(QDM_FUZZ)
-  add_executable(fuzz_exports ${CMAKE_SOURCE_DIR}/tests/fuzz/fuzz_exports.cpp)
-  target_include_directories(fuzz_exports PRIVATE ${CMAKE_SOURCE_DIR}/tests)
+  add_executable(fuzz_exports ${CMAKE_SOURCE_DIR}/tests/fuzz/fuzz_exports.cpp ${QDM_API_SOURCES})
+  target_include_directories(fuzz_exports PRIVATE ${CMAKE_SOURCE_DIR}/tests ${QDM_GENERATED_INCLUDE})
+  target_compile_definitions(fuzz_exports PRIVATE QDM_BUILDING_API)
   target_link_libraries(fuzz_exports PRIVATE qdm_core gfrtemu ${QDM_LINALG_LIBS}
                         Threads::Threads ${CMAKE_DL_LIBS})
   target_link_options(fuzz_exports PRIVATE -fsanitize=fuzzer)

@@ -2,9 +2,10 @@
 // internal objects and the emulated host run-time, built with ASan and UBSan.
 //
 // Input, read front to back (missing bytes read as zero):
-//   face (1 byte: 0 host; further faces take the next values), export (1 byte),
+//   face (1 byte: even the host face, odd the plain C API), export (1 byte),
 //   flags (1 byte: bit 0 the real-signal flag, bit 1 fail a work allocation,
-//   bit 2 from then on, bit 3 fail a host resize), the three integer arguments
+//   bit 2 from then on, bit 3 fail a host resize, bit 4 make a LAPACK call
+//   report INFO, bit 5 its sign), the three integer arguments
 //   (each a selector byte, maybe four more), n (2 bytes, up to 256), the
 //   sampling rate, the fault position (2 bytes), then the n data values (two per
 //   complex element). A value is a selector byte, maybe followed by its bits:
@@ -15,7 +16,9 @@
 // as the failure path does; and a call with an injected allocation failure
 // gives the clean call's result bit for bit or -20001 (the exports that ignore
 // a least-squares solve's status on purpose may also succeed differently). A
-// broken check aborts, which libFuzzer reports as a crash.
+// broken check aborts, which libFuzzer reports as a crash. On the plain face
+// nothing is exempt: a faulted call gives the clean result bit for bit or an
+// error with zero-filled outputs.
 #include <cfloat>
 #include <cmath>
 #include <cstdint>
@@ -27,9 +30,11 @@
 #include <vector>
 
 #include "emuhost.h"
+#include "numeric/lapack_boundary.h"
 #include "numeric/work.h"
 #include "qdm.h"
 #include "support/export_table.h"
+#include "support/plain_table.h"
 
 namespace {
 
@@ -122,11 +127,73 @@ const QdmApi& HostApi() {
   return api;
 }
 
-using FaceCall = int32_t (*)(const Export&, Call&, const Scalars&);
-const FaceCall kFaces[] = {
-    [](const Export& x, Call& c, const Scalars& s) { return x.invoke(HostApi(), c, s); },
+int32_t HostFace(const Export& x, Call& c, const Scalars& s) { return x.invoke(HostApi(), c, s); }
+
+// ---- the plain face ------------------------------------------------------------------------
+const std::set<int32_t> kPlainStatuses = {
+#define QDM_FUZZ_STATUS(name, code, text) code,
+    QDM_STATUS_TABLE(QDM_FUZZ_STATUS)
+#undef QDM_FUZZ_STATUS
 };
-constexpr size_t kFaceCount = sizeof(kFaces) / sizeof(kFaces[0]);
+
+bool Zeroed(const PlainCall& c) {
+  for (const auto& out : c.out) {
+    for (double v : out) {
+      if (v != 0.0 || std::signbit(v)) return false;
+    }
+  }
+  return true;
+}
+
+bool Same(const PlainCall& a, const PlainCall& b) {
+  for (int i = 0; i < 4; ++i) {
+    if (a.out[i].size() != b.out[i].size() ||
+        std::memcmp(a.out[i].data(), b.out[i].data(), a.out[i].size() * sizeof(double)) != 0) {
+      return false;
+    }
+  }
+  return std::memcmp(a.d, b.d, sizeof a.d) == 0 && a.count == b.count;
+}
+
+void Arm(uint8_t flags, uint16_t at) {
+  if (flags & 16) {
+    LapackFailAt(at % 64 + 1, (flags & 32) ? -1 : 1, false);
+  } else {
+    NumAllocFailAt(at % 1024 + 1, (flags & 4) != 0);
+  }
+}
+
+void Disarm() {
+  LapackFailAt(0, 0, false);
+  NumAllocFailAt(0, false);
+}
+
+int PlainFace(const Export& x, const Scalars& s, const std::vector<double>& values,
+              uint8_t flags, uint16_t faultAt) {
+  const PlainFn& plain = PlainFunctions().at(x.name);
+  const double none = 0.0;
+  const double* data = values.empty() ? &none : values.data();
+  PlainCall clean;
+  const int32_t cleanStatus = plain(data, s, clean);
+  Require(kPlainStatuses.count(cleanStatus) != 0, "undocumented plain status", x, cleanStatus);
+  Require(NumAllocOutstanding() == 0, "work memory left allocated", x, cleanStatus);
+  if (cleanStatus < 0 && cleanStatus > -42400) {
+    Require(Zeroed(clean), "failed plain call did not zero its outputs", x, cleanStatus);
+  }
+  if ((flags & 18) == 0) return 0;
+  PlainCall faulted;
+  Arm(flags, faultAt);
+  const int32_t st = plain(data, s, faulted);
+  Disarm();
+  Require(NumAllocOutstanding() == 0, "work memory left allocated after a fault", x, st);
+  Require(kPlainStatuses.count(st) != 0, "undocumented plain status after a fault", x, st);
+  if (st >= 0) {
+    Require(st == cleanStatus && Same(clean, faulted), "plain success after a fault", x, st);
+  } else if (st > -42400) {
+    Require(Zeroed(faulted), "failed plain call did not zero its outputs", x, st);
+  }
+  return 0;
+}
 
 Call Prepare(const Export& x, const Scalars& s, const std::vector<double>& values, bool flag) {
   Call c{x.complexData ? HostArray::Complex(std::span<const std::complex<double>>(
@@ -148,7 +215,7 @@ bool Emptied(const Export& x, const Call& c) {
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   Reader r(data, size);
-  const FaceCall face = kFaces[r.Byte() % kFaceCount];
+  const bool plainFace = (r.Byte() & 1) != 0;
   const std::vector<Export>& exports = Exports();
   const Export& x = exports[r.Byte() % exports.size()];
   const uint8_t flags = r.Byte();
@@ -164,6 +231,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const uint16_t faultAt = r.Bits<uint16_t>();
   std::vector<double> values(static_cast<size_t>(s.n) * (x.complexData ? 2 : 1));
   for (double& v : values) v = Value(r);
+  if (plainFace) return PlainFace(x, s, values, flags, faultAt);
+  const auto face = HostFace;
 
   // The clean call.
   Call clean = Prepare(x, s, values, flags & 1);
