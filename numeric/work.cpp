@@ -13,6 +13,12 @@ std::atomic<bool> g_fail_persistent{false};
 std::atomic<int64_t> g_attempts{0};
 std::atomic<int64_t> g_outstanding{0};
 
+// Every block gets this much slack past its end. Some optimized BLAS kernels
+// (OpenBLAS's complex gemv among them) read a vector's last element as part of
+// a wider load, up to 16 bytes past its end; when a block ends at the end of a
+// mapped page, that read would fault. The slack keeps it inside the block.
+constexpr size_t kSlack = 64;
+
 bool InjectFailure() {
   const int64_t attempt = g_attempts.fetch_add(1, std::memory_order_relaxed) + 1;
   const int64_t k = g_fail_at.load(std::memory_order_relaxed);
@@ -22,7 +28,7 @@ bool InjectFailure() {
 }  // namespace
 
 StatusCode NumAlloc(void** slot, size_t bytes) {
-  void* p = InjectFailure() ? nullptr : std::malloc(bytes == 0 ? 1 : bytes);
+  void* p = InjectFailure() ? nullptr : std::malloc(bytes + kSlack);
   *slot = p;
   if (p == nullptr) {
     call_record::Note(status::kNoMemory);
@@ -42,7 +48,7 @@ StatusCode NumFree(void* ptr) {
 
 StatusCode NumRealloc(void** slot, size_t bytes) {
   void* old = *slot;
-  void* p = InjectFailure() ? nullptr : std::realloc(old, bytes == 0 ? 1 : bytes);
+  void* p = InjectFailure() ? nullptr : std::realloc(old, bytes + kSlack);
   if (p == nullptr) {
     (void)NumFree(old);
     *slot = nullptr;
