@@ -65,7 +65,8 @@ void ExpectSameResults(const Export& x, const Call& host, const PlainCall& plain
       for (auto z : host.out[i].Complexes()) h.insert(h.end(), {z.real(), z.imag()});
     }
     ASSERT_LE(h.size(), plain.out[i].size()) << where << " out" << i;
-    EXPECT_EQ(0, std::memcmp(h.data(), plain.out[i].data(), h.size() * sizeof(double)))
+    EXPECT_TRUE(h.empty() ||
+                std::memcmp(h.data(), plain.out[i].data(), h.size() * sizeof(double)) == 0)
         << where << " out" << i << " (" << count << " elements)";
     if (Modes(x.family) && !(x.family == Family::kPcarSpectrum && i == 3)) {
       EXPECT_EQ(count, plain.count) << where;

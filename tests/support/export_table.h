@@ -116,28 +116,28 @@ inline const std::vector<Export>& Exports() {
          return q.QdmReCovarianceH(c.data, s.a, c.out[1], c.out[0], &c.d[0]);
        },
        [](const Scalars& s) {
-         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kR, 1, size_t(s.a + 1)}};
+         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kR, 1, size_t(int64_t{s.a} + 1)}};
        }},
       {"QdmCxCovarianceH", Family::kCovariance, true, 2, 1, -1, false,
        [](const QdmApi& q, Call& c, const Scalars& s) {
          return q.QdmCxCovarianceH(c.data, s.a, c.out[1], c.out[0], &c.d[0]);
        },
        [](const Scalars& s) {
-         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kC, 1, size_t(s.a + 1)}};
+         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kC, 1, size_t(int64_t{s.a} + 1)}};
        }},
       {"QdmRePCARH", Family::kPcar, false, 2, 0, -1, false,
        [](const QdmApi& q, Call& c, const Scalars& s) {
          return q.QdmRePCARH(c.data, s.a, s.b, c.out[1], c.out[0]);
        },
        [](const Scalars& s) {
-         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kR, 1, size_t(s.a + 1)}};
+         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kR, 1, size_t(int64_t{s.a} + 1)}};
        }},
       {"QdmCxPCARH", Family::kPcar, true, 2, 0, -1, false,
        [](const QdmApi& q, Call& c, const Scalars& s) {
          return q.QdmCxPCARH(c.data, s.a, s.b, c.out[1], c.out[0]);
        },
        [](const Scalars& s) {
-         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kC, 1, size_t(s.a + 1)}};
+         return std::vector<ResizeCall>{{kC, 1, size_t(s.a)}, {kC, 1, size_t(int64_t{s.a} + 1)}};
        }},
       {"QdmReMatrixPencilH", Family::kPencil, false, 4, 1, -1, false,
        [](const QdmApi& q, Call& c, const Scalars& s) {
