@@ -267,9 +267,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   }
   if (resize) {
     Require(st == -42400 - kResizeError, "resize failure not reported", x, st);
-  } else if (st == 0) {
-    Require(kSolveStatusIgnored.count(x.name) != 0, "success after a fault, clean call failed",
-            x, st);
+  } else if (kSolveStatusIgnored.count(x.name) != 0) {
+    // These go on past a failed solve with whatever it left, so a fault inside
+    // it may end in success or in a later step's documented failure.
+    return 0;
   } else {
     Require(st == -20001, "a fault gave neither the clean status nor -20001", x, st);
   }
