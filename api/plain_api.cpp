@@ -148,6 +148,40 @@ int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles,
       });
 }
 
+template <typename T>
+int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, T* a, qdm_complex* roots) {
+  constexpr bool cx = std::is_same_v<T, Complex>;
+  const StatusCode check = checks::Pcar(n, order, components);
+  const size_t e = cx ? kCx : kReal;
+  const int32_t p = check == status::kOk ? order : 0;
+  return RunPlain({check, {x, n, cx}, {a, roots}, LinearPredictionWork(n, p, e, 8), nullptr,
+                   {{a, Bytes(p + int64_t{1}, e)}, {roots, Bytes(p, kCx)}}, {}, nullptr},
+                  [&] {
+                    if constexpr (cx) {
+                      return PcarEstimateComplex(x, n, p, components, a, AsComplex(roots));
+                    } else {
+                      return PcarEstimateReal(x, n, p, components, a, AsComplex(roots));
+                    }
+                  });
+}
+
+// On an error after the checks the order is 0, as on the host face.
+template <typename T>
+int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t* order) {
+  constexpr bool cx = std::is_same_v<T, Complex>;
+  const StatusCode check = checks::Mdl(n, max_order, min_order);
+  const int32_t L = check == status::kOk ? max_order : 0;
+  return RunPlain({check, {x, n, cx}, {order}, PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L),
+                   nullptr, {}, {}, order},
+                  [&] {
+                    if constexpr (cx) {
+                      return MdlOrderComplex(x, n, L, min_order, order);
+                    } else {
+                      return MdlOrderReal(x, n, L, min_order, order);
+                    }
+                  });
+}
+
 }  // namespace
 
 // ================================ the API ================================
@@ -191,27 +225,13 @@ QDM_PLAIN_API int32_t qdm_covariance_complex(const qdm_complex* x, int32_t n, in
 QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order,
                                     int32_t components, double* coefficients,
                                     qdm_complex* roots) {
-  const StatusCode check = checks::Pcar(n, order, components);
-  const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check, {x, n, false}, {coefficients, roots},
-                   LinearPredictionWork(n, p, kReal, 8), nullptr,
-                   {{coefficients, Bytes(p + int64_t{1}, kReal)}, {roots, Bytes(p, kCx)}}, {},
-                   nullptr},
-                  [&] { return PcarEstimateReal(x, n, p, components, coefficients, AsComplex(roots)); });
+  return Pcar(x, n, order, components, coefficients, roots);
 }
 
 QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t order,
                                        int32_t components, qdm_complex* coefficients,
                                        qdm_complex* roots) {
-  const StatusCode check = checks::Pcar(n, order, components);
-  const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check, {x, n, true}, {coefficients, roots}, LinearPredictionWork(n, p, kCx, 8),
-                   nullptr, {{coefficients, Bytes(p + int64_t{1}, kCx)}, {roots, Bytes(p, kCx)}},
-                   {}, nullptr},
-                  [&] {
-                    return PcarEstimateComplex(AsComplex(x), n, p, components,
-                                               AsComplex(coefficients), AsComplex(roots));
-                  });
+  return Pcar(AsComplex(x), n, order, components, AsComplex(coefficients), roots);
 }
 
 // ---- Prony --------------------------------------------------------------------------------
@@ -287,24 +307,15 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_complex(const qdm_complex* x, int32_t n,
 }
 
 // ---- MDL ----------------------------------------------------------------------------------
-// On an error after the checks the order is 0, as on the host face.
 
 QDM_PLAIN_API int32_t qdm_mdl_order_real(const double* x, int32_t n, int32_t max_order,
                                          int32_t min_order, int32_t* order) {
-  const StatusCode check = checks::Mdl(n, max_order, min_order);
-  const int32_t L = check == status::kOk ? max_order : 0;
-  return RunPlain({check, {x, n, false}, {order}, PencilWork(n, L, kReal) + ModeFitWork(n, L),
-                   nullptr, {}, {}, order},
-                  [&] { return MdlOrderReal(x, n, L, min_order, order); });
+  return Mdl(x, n, max_order, min_order, order);
 }
 
 QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int32_t max_order,
                                             int32_t min_order, int32_t* order) {
-  const StatusCode check = checks::Mdl(n, max_order, min_order);
-  const int32_t L = check == status::kOk ? max_order : 0;
-  return RunPlain({check, {x, n, true}, {order}, PencilWork(n, L, kCx) + ModeFitWork(n, L),
-                   nullptr, {}, {}, order},
-                  [&] { return MdlOrderComplex(AsComplex(x), n, L, min_order, order); });
+  return Mdl(AsComplex(x), n, max_order, min_order, order);
 }
 
 // ---- spectra ------------------------------------------------------------------------------
