@@ -42,10 +42,9 @@ StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K) {
   auto s = AllocWorkUninit<double>(static_cast<size_t>(mr));
   auto V = AllocWorkUninit<T>(static_cast<size_t>(L) * static_cast<size_t>(mr));
   auto Uh = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(q));
-  auto Ur = AllocWorkUninit<T>(tall ? static_cast<size_t>(L) * static_cast<size_t>(mr) : 0);
   auto T1 = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(L));
   auto full = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(mr));
-  if (!y1 || !y2 || !rhs || !reduced || !U || !s || !V || !Uh || !Ur || !T1 || !full) {
+  if (!y1 || !y2 || !rhs || !reduced || !U || !s || !V || !Uh || !T1 || !full) {
     return status::kNoMemory;
   }
 
@@ -64,7 +63,7 @@ StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K) {
     T* R = reduced.get();
     st = QrReduce(y1.get(), q, L, rhs.get(), 1, R, R + LL);
     if (st != status::kOk) return st;
-    st = SvdLeading(R, L, L, mr, Ur.get(), s.get(), V.get());
+    st = SvdLeadingRight(R, L, L, mr, s.get(), V.get());
     if (st != status::kOk) return st;
     st = MatMul(y1.get(), V.get(), q, L, mr, U.get());
     if (st != status::kOk) return st;

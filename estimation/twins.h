@@ -49,6 +49,14 @@ inline StatusCode SvdLeading(const Complex* A, int32_t m, int32_t n, int32_t cou
                              double* S, Complex* V) {
   return SvdLeadingComplex(A, m, n, count, U, S, V);
 }
+inline StatusCode SvdLeadingRight(const double* A, int32_t m, int32_t n, int32_t count,
+                                  double* S, double* V) {
+  return SvdLeadingRightReal(A, m, n, count, S, V);
+}
+inline StatusCode SvdLeadingRight(const Complex* A, int32_t m, int32_t n, int32_t count,
+                                  double* S, Complex* V) {
+  return SvdLeadingRightComplex(A, m, n, count, S, V);
+}
 // Pseudo-inverse with tolerance tol, over A's own storage.
 inline StatusCode PseudoInverse(double* A, int32_t m, int32_t n, double tol) {
   return PseudoInverseReal(A, m, n, tol, nullptr);

@@ -24,7 +24,7 @@
 
 namespace {
 
-enum class Driver { kGesdd, kGesvdx, kGelsd, kGeqrf, kUnmqr, kGeev, kSyevd };
+enum class Driver { kGesdd, kGelsd, kGeqrf, kUnmqr, kGeev, kSyevd };
 
 // ---- injection ------------------------------------------------------------------------
 std::atomic<int64_t> g_fail_at{0};
@@ -45,7 +45,6 @@ bool Injected(lapack_int* info) {
 StatusCode Mapped(Driver driver, lapack_int info) {
   switch (driver) {
     case Driver::kGesdd:
-    case Driver::kGesvdx:
       return status::kNoConvergence;
     case Driver::kGelsd:
       return info > 0 ? status::kNoConvergence : status::kOk;
@@ -149,52 +148,115 @@ StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, Complex* a, lapack_int l
   return Done(Driver::kGesdd, info);
 }
 
-// ---- gesvdx ---------------------------------------------------------------------------
-// IWORK: 12 min(m, n); ZGESVDX's RWORK: min(m, n) (min(m, n) 2 + 15 min(m, n)).
-StatusCode Gesvdx(lapack_int m, lapack_int n, double* a, lapack_int lda, lapack_int count,
-                  double* s, double* u, lapack_int ldu, double* vt, lapack_int ldvt) {
+// ---- leading singular triplets ---------------------------------------------------------
+// gesdd's own route for a matrix that is not much taller than wide, with only
+// `count` left vectors carried back: scale into range as gesdd does, reduce to
+// bidiagonal B = Q^H a P (gebrd), take B's SVD by divide and conquer (dbdsdc,
+// real also for complex data), and apply Q to the first `count` left vectors
+// of B alone. Q applied to all of them, and P to any, is most of gesdd's cost.
+namespace {
+void Gebrd(lapack_int m, lapack_int n, double* a, lapack_int lda, double* d, double* e,
+           double* tauq, double* taup, double* work, lapack_int lwork, lapack_int* info) {
+  LAPACK_dgebrd(&m, &n, a, &lda, d, e, tauq, taup, work, &lwork, info);
+}
+void Gebrd(lapack_int m, lapack_int n, Complex* a, lapack_int lda, double* d, double* e,
+           Complex* tauq, Complex* taup, Complex* work, lapack_int lwork, lapack_int* info) {
+  LAPACK_zgebrd(&m, &n, a, &lda, d, e, tauq, taup, work, &lwork, info);
+}
+// C (m-by-ncol) replaced by Q C, Q from Gebrd of an m-by-k matrix.
+void ApplyQ(lapack_int m, lapack_int ncol, lapack_int k, const double* a, lapack_int lda,
+            const double* tau, double* c, lapack_int ldc, double* work, lapack_int lwork,
+            lapack_int* info) {
+  const char vect = 'Q', side = 'L', trans = 'N';
+  LAPACK_dormbr(&vect, &side, &trans, &m, &ncol, &k, a, &lda, tau, c, &ldc, work, &lwork, info);
+}
+void ApplyQ(lapack_int m, lapack_int ncol, lapack_int k, const Complex* a, lapack_int lda,
+            const Complex* tau, Complex* c, lapack_int ldc, Complex* work, lapack_int lwork,
+            lapack_int* info) {
+  const char vect = 'Q', side = 'L', trans = 'N';
+  LAPACK_zunmbr(&vect, &side, &trans, &m, &ncol, &k, a, &lda, tau, c, &ldc, work, &lwork, info);
+}
+double MaxAbs(lapack_int m, lapack_int n, const double* a, lapack_int lda) {
+  double unused = 0.0;
+  return LAPACK_dlange("M", &m, &n, a, &lda, &unused);
+}
+double MaxAbs(lapack_int m, lapack_int n, const Complex* a, lapack_int lda) {
+  double unused = 0.0;
+  return LAPACK_zlange("M", &m, &n, a, &lda, &unused);
+}
+void Rescale(double from, double to, lapack_int m, lapack_int n, double* a, lapack_int lda) {
+  const lapack_int zero = 0;
   lapack_int info = 0;
-  if (Injected(&info)) return Failed(Driver::kGesvdx, info);
-  const int64_t k = std::min(m, n);
-  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(12 * k));
-  if (!iwork) return status::kNoMemory;
-  const char job = 'V', range = 'I';
-  const double vl = 0.0, vu = 0.0;
-  const lapack_int il = 1;
-  lapack_int ns = 0;
-  double query = 0.0;
-  lapack_int lwork = -1;
-  LAPACK_dgesvdx(&job, &job, &range, &m, &n, a, &lda, &vl, &vu, &il, &count, &ns, s, u, &ldu, vt,
-                 &ldvt, &query, &lwork, iwork.get(), &info);
-  WorkArray<double> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  LAPACK_dgesvdx(&job, &job, &range, &m, &n, a, &lda, &vl, &vu, &il, &count, &ns, s, u, &ldu, vt,
-                 &ldvt, work.get(), &lwork, iwork.get(), &info);
-  return Done(Driver::kGesvdx, info);
+  LAPACK_dlascl("G", &zero, &zero, &from, &to, &m, &n, a, &lda, &info);
+}
+void Rescale(double from, double to, lapack_int m, lapack_int n, Complex* a, lapack_int lda) {
+  const lapack_int zero = 0;
+  lapack_int info = 0;
+  LAPACK_zlascl("G", &zero, &zero, &from, &to, &m, &n, a, &lda, &info);
 }
 
-StatusCode Gesvdx(lapack_int m, lapack_int n, Complex* a, lapack_int lda, lapack_int count,
-                  double* s, Complex* u, lapack_int ldu, Complex* vt, lapack_int ldvt) {
+template <typename T>
+StatusCode LeadingLeft(lapack_int m, lapack_int n, T* a, lapack_int lda, lapack_int count,
+                       double* s, T* u, lapack_int ldu) {
   lapack_int info = 0;
-  if (Injected(&info)) return Failed(Driver::kGesvdx, info);
-  const int64_t k = std::min(m, n);
-  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(12 * k));
-  WorkArray<double> rwork = AllocWorkUninit<double>(static_cast<size_t>(k * (k * 2 + 15 * k)));
-  if (!iwork || !rwork) return status::kNoMemory;
-  const char job = 'V', range = 'I';
-  const double vl = 0.0, vu = 0.0;
-  const lapack_int il = 1;
-  lapack_int ns = 0;
-  Complex query;
+  if (Injected(&info)) return Failed(Driver::kGesdd, info);
+  const lapack_int k = std::min(m, n);
+  const int64_t kk = int64_t{k} * k;
+  // d, e, B's left and right vectors, dbdsdc's workspace (3k^2 + 4k), and
+  // IWORK (8k); the reflectors' scalars.
+  WorkArray<double> real = AllocWorkUninit<double>(static_cast<size_t>(5 * kk + 6 * int64_t{k}));
+  WorkArray<T> taus = AllocWorkUninit<T>(static_cast<size_t>(2 * k));
+  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(8 * k));
+  if (!real || !taus || !iwork) return status::kNoMemory;
+  double* d = real.get();
+  double* e = d + k;
+  double* ub = e + k;
+  double* vtb = ub + kk;
+  double* bwork = vtb + kk;
+  T* tauq = taus.get();
+  T* taup = tauq + k;
+
+  // gesdd's range: max |a_ij| brought into [small, 1/small].
+  const double small =
+      std::sqrt(std::numeric_limits<double>::min()) / std::numeric_limits<double>::epsilon();
+  const double anrm = MaxAbs(m, n, a, lda);
+  double scaled = 0.0;
+  if (anrm > 0.0 && anrm < small) scaled = small;
+  if (anrm > 1.0 / small) scaled = 1.0 / small;
+  if (scaled != 0.0) Rescale(anrm, scaled, m, n, a, lda);
+
+  T query{};
   lapack_int lwork = -1;
-  LAPACK_zgesvdx(&job, &job, &range, &m, &n, a, &lda, &vl, &vu, &il, &count, &ns, s, u, &ldu, vt,
-                 &ldvt, &query, &lwork, rwork.get(), iwork.get(), &info);
-  WorkArray<Complex> work = QueriedWork(query, &lwork);
+  Gebrd(m, n, a, lda, d, e, tauq, taup, &query, lwork, &info);
+  WorkArray<T> work = QueriedWork(query, &lwork);
   if (!work) return status::kNoMemory;
-  LAPACK_zgesvdx(&job, &job, &range, &m, &n, a, &lda, &vl, &vu, &il, &count, &ns, s, u, &ldu, vt,
-                 &ldvt, work.get(), &lwork, rwork.get(), iwork.get(), &info);
-  return Done(Driver::kGesvdx, info);
+  Gebrd(m, n, a, lda, d, e, tauq, taup, work.get(), lwork, &info);
+  if (info != 0) return Failed(Driver::kGesdd, info);
+
+  const char uplo = m >= n ? 'U' : 'L';
+  double q_unused = 0.0;
+  lapack_int iq_unused = 0;
+  LAPACK_dbdsdc(&uplo, "I", &k, d, e, ub, &k, vtb, &k, &q_unused, &iq_unused, bwork, iwork.get(),
+                &info);
+  if (info != 0) return Failed(Driver::kGesdd, info);
+
+  for (lapack_int j = 0; j < count; ++j) {
+    T* col = u + int64_t{j} * ldu;
+    for (lapack_int i = 0; i < k; ++i) col[i] = ub[i + int64_t{j} * k];
+    for (lapack_int i = k; i < m; ++i) col[i] = T{};
+  }
+  lwork = -1;
+  ApplyQ(m, count, n, a, lda, tauq, u, ldu, &query, lwork, &info);
+  work = QueriedWork(query, &lwork);
+  if (!work) return status::kNoMemory;
+  ApplyQ(m, count, n, a, lda, tauq, u, ldu, work.get(), lwork, &info);
+  if (info != 0) return Failed(Driver::kGesdd, info);
+
+  if (scaled != 0.0) Rescale(scaled, anrm, k, 1, d, k);
+  std::copy(d, d + count, s);
+  return status::kOk;
 }
+}  // namespace
 
 // ---- gelsd ----------------------------------------------------------------------------
 // IWORK: (3 depth + 14) k with depth = floor(log2 k), k = min(m, n): enough for
@@ -339,6 +401,15 @@ StatusCode Syevd(char jobz, lapack_int n, Complex* a, double* w) {
   LAPACK_zheevd(&jobz, &uplo, &n, a, &n, w, work.get(), &lw, rwork.get(), &lrw, iwork.get(), &liw,
                 &info);
   return Done(Driver::kSyevd, info);
+}
+
+StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, double* a, lapack_int lda,
+                          lapack_int count, double* s, double* u, lapack_int ldu) {
+  return LeadingLeft<double>(m, n, a, lda, count, s, u, ldu);
+}
+StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
+                          lapack_int count, double* s, Complex* u, lapack_int ldu) {
+  return LeadingLeft<Complex>(m, n, a, lda, count, s, u, ldu);
 }
 
 }  // namespace lapack

@@ -54,15 +54,13 @@ inline void Gemm(int32_t m, int32_t n, int32_t k, const Complex* A, const Comple
                                double* s, Complex* u, lapack_int ldu, Complex* vt,
                                lapack_int ldvt);
 
-// The `count` largest singular values (decreasing) and their vectors (jobu =
-// jobvt = 'V', range 'I', IL = 1, IU = count): u (m-by-count, ldu), vt
-// (count-by-n, ldvt).
-[[nodiscard]] StatusCode Gesvdx(lapack_int m, lapack_int n, double* a, lapack_int lda,
-                                lapack_int count, double* s, double* u, lapack_int ldu,
-                                double* vt, lapack_int ldvt);
-[[nodiscard]] StatusCode Gesvdx(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
-                                lapack_int count, double* s, Complex* u, lapack_int ldu,
-                                Complex* vt, lapack_int ldvt);
+// The `count` largest singular values (decreasing) of the m-by-n a and their
+// left singular vectors, u (m-by-count, ldu), as gesdd finds them; a is
+// overwritten. One driver call, mapped as gesdd.
+[[nodiscard]] StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, double* a, lapack_int lda,
+                                        lapack_int count, double* s, double* u, lapack_int ldu);
+[[nodiscard]] StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
+                                        lapack_int count, double* s, Complex* u, lapack_int ldu);
 
 // Minimum-norm least squares by divide and conquer (real only); *rank as
 // LAPACK leaves it.

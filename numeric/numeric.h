@@ -43,6 +43,11 @@ int32_t HasNonFiniteComplex(const Complex* x, int64_t n);
                                         double* U, double* S, double* V);
 [[nodiscard]] StatusCode SvdLeadingComplex(const Complex* A, int32_t m, int32_t n, int32_t count,
                                            Complex* U, double* S, Complex* V);
+// The same S and V without U, at a fraction of the cost for a square A.
+[[nodiscard]] StatusCode SvdLeadingRightReal(const double* A, int32_t m, int32_t n, int32_t count,
+                                             double* S, double* V);
+[[nodiscard]] StatusCode SvdLeadingRightComplex(const Complex* A, int32_t m, int32_t n,
+                                                int32_t count, double* S, Complex* V);
 
 // ---- least squares and pseudo-inverse ------------------------------------------
 // X (n-by-nrhs) minimising ||A X - B||, minimum norm; 20001 when rank deficient.

@@ -101,7 +101,34 @@ StatusCode SvdLeading(const T* A, int32_t m, int32_t n, int32_t count, T* U, dou
   return status::kOk;
 }
 
+// The leading `count` singular values and right vectors alone. The row-major A
+// reads as the column-major A^T, whose left singular vectors are conj(V).
+template <typename T>
+StatusCode SvdLeadingRight(const T* A, int32_t m, int32_t n, int32_t count, double* S, T* V) {
+  if (m < 1 || n < 1 || count < 1 || count > std::min(m, n)) return status::kBadSize;
+  const int64_t mn = int64_t{m} * n;
+  if (HasNonFinite(A, mn) != 0) return status::kNonFinite;
+  WorkArray<T> at = AllocWorkUninit<T>(static_cast<size_t>(mn));
+  WorkArray<T> left = AllocWorkUninit<T>(static_cast<size_t>(int64_t{n} * count));
+  if (!at || !left) return status::kNoMemory;
+  std::memcpy(static_cast<void*>(at.get()), A, static_cast<size_t>(mn) * sizeof(T));
+  const StatusCode st = lapack::LeadingLeftSvd(n, m, at.get(), n, count, S, left.get(), n);
+  if (st != status::kOk) return st;
+  // The column-major n-by-count left factor reads row-major as count-by-n.
+  return AdjointInto(left.get(), count, n, V);
+}
+
 }  // namespace
+
+StatusCode SvdLeadingRightReal(const double* A, int32_t m, int32_t n, int32_t count, double* S,
+                               double* V) {
+  return SvdLeadingRight<double>(A, m, n, count, S, V);
+}
+
+StatusCode SvdLeadingRightComplex(const Complex* A, int32_t m, int32_t n, int32_t count,
+                                  double* S, Complex* V) {
+  return SvdLeadingRight<Complex>(A, m, n, count, S, V);
+}
 
 StatusCode SvdLeadingReal(const double* A, int32_t m, int32_t n, int32_t count, double* U,
                           double* S, double* V) {
