@@ -18,10 +18,6 @@
                                        int32_t n, Complex* C);
 [[nodiscard]] StatusCode DotReal(const double* x, const double* y, int32_t n, double* result);
 [[nodiscard]] StatusCode VecSubReal(const double* a, const double* b, int32_t n, double* out);
-[[nodiscard]] StatusCode VecCopyReal(const double* src, int32_t n, double* dst);
-[[nodiscard]] StatusCode VecZeroReal(double* x, int32_t n);
-// out may be null: negate in place.
-[[nodiscard]] StatusCode VecNegateReal(double* x, int32_t n, double* out);
 // 1 if some value is NaN, infinite, == DBL_MAX or <= -1.7976931348623e308; else 0.
 int32_t HasNonFiniteReal(const double* x, int64_t n);
 int32_t HasNonFiniteComplex(const Complex* x, int64_t n);

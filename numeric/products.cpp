@@ -136,26 +136,6 @@ StatusCode VecSubReal(const double* a, const double* b, int32_t n, double* out) 
   return status::kOk;
 }
 
-StatusCode VecCopyReal(const double* src, int32_t n, double* dst) {
-  if (n < 1) return status::kBadSize;
-  std::memcpy(dst, src, static_cast<size_t>(n) * sizeof(double));
-  return status::kOk;
-}
-
-StatusCode VecZeroReal(double* x, int32_t n) {
-  if (n < 1) return status::kBadSize;
-  std::memset(x, 0, static_cast<size_t>(n) * sizeof(double));
-  return status::kOk;
-}
-
-// Sign-bit flip: +0.0 becomes -0.0 and a NaN keeps its payload.
-StatusCode VecNegateReal(double* x, int32_t n, double* out) {
-  if (n < 1) return status::kBadSize;
-  double* dst = out != nullptr ? out : x;
-  for (int32_t i = 0; i < n; ++i) dst[i] = FlipSign(x[i]);
-  return status::kOk;
-}
-
 // ---- finiteness screen ---------------------------------------------------------------
 
 int32_t HasNonFiniteReal(const double* x, int64_t n) {
