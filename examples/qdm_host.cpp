@@ -20,12 +20,6 @@
 // Exit status: 0 success, 1 bad input, 2 a non-zero library status.
 //
 // For everyday fits use the qdm tool (cli/), which calls the plain C API.
-#if defined(_WIN32)
-#include <windows.h>
-#else
-#include <dlfcn.h>
-#endif
-
 #include <charconv>
 #include <cstdint>
 #include <cstdio>
@@ -35,9 +29,8 @@
 #include <string>
 #include <vector>
 
-#include "emuhost.h"
 #include "example_signal.h"
-#include "qdm.h"
+#include "host_loader.h"
 #include "qdm_status.h"
 
 namespace {
@@ -56,88 +49,7 @@ const char* StatusText(int32_t status) {
   return status <= -42400 && status > -42500 ? "host array resize failed" : "unknown status";
 }
 
-// ---- loading the library ---------------------------------------------------------
-
-#define QDM_EXPORTS(X)                                                                   \
-  X(SetGFRTModule) X(QdmReCovarianceH) X(QdmCxCovarianceH) X(QdmRePCARH) X(QdmCxPCARH) \
-  X(QdmRePronyH) X(QdmCxPronyH) X(QdmReMatrixPencilH) X(QdmCxMatrixPencilH)             \
-  X(QdmReMinDescriptLenH) X(QdmCxMinDescriptLenH) X(QdmReCovPowerSpectrH)               \
-  X(QdmCxCovPowerSpectrH) X(QdmRePCARPowerSpectrumH) X(QdmCxPCARPowerSpectrumH)
-
-// One function pointer per export, named as the export.
-struct Exports {
-#define QDM_EXPORT_FIELD(name) decltype(&::name) name;
-  QDM_EXPORTS(QDM_EXPORT_FIELD)
-#undef QDM_EXPORT_FIELD
-};
-
-// The module of the run-time: the one that holds our NumericArrayResize.
-void* RuntimeModule() {
-  void* address = reinterpret_cast<void*>(&NumericArrayResize);
-#if defined(_WIN32)
-  HMODULE module = nullptr;
-  GetModuleHandleExA(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
-                         GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
-                     static_cast<LPCSTR>(address), &module);
-  return reinterpret_cast<void*>(module);
-#else
-  Dl_info info{};
-  if (dladdr(address, &info) == 0 || info.dli_fname == nullptr) return nullptr;
-  return dlopen(info.dli_fname, RTLD_LAZY | RTLD_NOLOAD);
-#endif
-}
-
-Exports LoadLibraryExports(const std::string& path) {
-#if defined(_WIN32)
-  HMODULE library = LoadLibraryA(path.c_str());
-  if (library == nullptr)
-    Fail(1, "cannot load the library " + path + ": error " + std::to_string(GetLastError()));
-  auto find = [&](const char* name) {
-    return reinterpret_cast<void*>(GetProcAddress(library, name));
-  };
-#else
-  void* library = dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
-  if (library == nullptr) Fail(1, std::string("cannot load the library: ") + dlerror());
-  auto find = [&](const char* name) { return dlsym(library, name); };
-#endif
-  Exports e{};
-#define QDM_EXPORT_BIND(name)                                        \
-  e.name = reinterpret_cast<decltype(e.name)>(find(#name));         \
-  if (e.name == nullptr) Fail(1, path + " does not export " #name);
-  QDM_EXPORTS(QDM_EXPORT_BIND)
-#undef QDM_EXPORT_BIND
-  // Name the run-time module explicitly, as a host embedding the library would.
-  if (void* runtime = RuntimeModule()) e.SetGFRTModule(runtime);
-  return e;
-}
-
-// ---- host arrays -------------------------------------------------------------------
-
-// An array handle owned by the run-time; the library resizes and fills outputs.
-class Handle {
- public:
-  explicit Handle(int32_t type, const std::vector<double>& values = {}, int32_t count = 0)
-      : type_(type), handle_(EmuMakeHandle(type, count, values.empty() ? nullptr : values.data())) {
-    if (handle_ == nullptr) Fail(1, "out of memory making a host array");
-  }
-  ~Handle() { EmuFreeHandle(handle_); }
-  Handle(const Handle&) = delete;
-  Handle& operator=(const Handle&) = delete;
-  operator QdmArrayHandle() const { return handle_; }
-
-  // The elements as doubles; complex ones as (re, im) pairs. The block's
-  // elements sit at byte 4, so they are copied out, never read in place.
-  std::vector<double> Values() const {
-    const int32_t count = EmuCount(handle_);
-    std::vector<double> v(count > 0 ? count * (type_ == QDM_TYPE_COMPLEX ? 2 : 1) : 0);
-    if (!v.empty()) EmuRead(handle_, v.data(), v.size());
-    return v;
-  }
-
- private:
-  int32_t type_;
-  QdmArrayHandle handle_;
-};
+using qdmhost::HostArray;
 
 // ---- input and output --------------------------------------------------------------
 
@@ -191,9 +103,9 @@ void Member(std::string& to, const char* key, const std::string& value) {
   to += std::string(to.empty() ? "" : ", ") + "\"" + key + "\": " + value;
 }
 void Member(std::string& to, const char* key, double value) { Member(to, key, Number(value)); }
-void Member(std::string& to, const char* key, const Handle& h) {
+void Member(std::string& to, const char* key, const HostArray& h) {
   std::string list;
-  for (const double v : h.Values()) list += (list.empty() ? "" : ", ") + Number(v);
+  for (const double v : h.Doubles()) list += (list.empty() ? "" : ", ") + Number(v);
   Member(to, key, "[" + list + "]");
 }
 
@@ -246,16 +158,26 @@ int main(int argc, char** argv) {
     s.n = qdm_example::kLength;
   }
   const char* env = std::getenv("QDM_LIBRARY");
-  const Exports e = LoadLibraryExports(!options["--library"].empty() ? options["--library"]
-                                       : env != nullptr && *env    ? env
-                                                                   : QDM_DEFAULT_LIBRARY);
+  const std::string library = !options["--library"].empty() ? options["--library"]
+                              : env != nullptr && *env      ? env
+                                                            : QDM_DEFAULT_LIBRARY;
+  // The exports found by name, and the run-time named, as a host embedding the
+  // library does.
+  qdmhost::QdmApi e;
+  try {
+    e = qdmhost::LoadQdm(library, qdmhost::RuntimeModule());
+  } catch (const std::exception& error) {
+    Fail(1, error.what());
+  }
 
   // The data handle, output handles, and one call of the real or complex export.
   const bool cx = s.complex;
-  const Handle data(cx ? QDM_TYPE_COMPLEX : QDM_TYPE_DOUBLE, s.values, s.n);
-  const Handle coefficients(cx ? QDM_TYPE_COMPLEX : QDM_TYPE_DOUBLE), poles(QDM_TYPE_COMPLEX),
-      amplitude(QDM_TYPE_DOUBLE), phase(QDM_TYPE_DOUBLE), damping(QDM_TYPE_DOUBLE),
-      frequency(QDM_TYPE_DOUBLE), spectrum(QDM_TYPE_DOUBLE);
+  const int32_t R = QDM_TYPE_DOUBLE, C = QDM_TYPE_COMPLEX;
+  const HostArray data = HostArray::FromDoubles(cx ? C : R, s.values);
+  const HostArray coefficients = HostArray::Empty(cx ? C : R), poles = HostArray::Empty(C),
+                  amplitude = HostArray::Empty(R), phase = HostArray::Empty(R),
+                  damping = HostArray::Empty(R), frequency = HostArray::Empty(R),
+                  spectrum = HostArray::Empty(R);
   const double rate = number("--rate", file.empty() ? qdm_example::kRate : 1.0);
   const uint8_t realSignal = options["--real-signal"].empty() ? 0 : 1;
   const int32_t p = integer("--order", method == "prony" ? 6 : 12);

@@ -120,7 +120,7 @@ const QdmApi& HostApi() {
   static const QdmApi api = [] {
     QdmApi a;
 #define QDM_FUZZ_BIND(name) a.name = &::name;
-    QDM_TEST_EXPORTS(QDM_FUZZ_BIND)
+    QDM_HOST_EXPORTS(QDM_FUZZ_BIND)
 #undef QDM_FUZZ_BIND
     return a;
   }();
