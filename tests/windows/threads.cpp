@@ -2,139 +2,67 @@
 // across unload and reload: the plan-list mutex is created when the DLL is
 // attached and closed when it is detached, so a reloaded DLL must serve
 // concurrent callers again. Every concurrent result must equal, bit for bit,
-// the same call made alone.
-//
-// Each test loads and frees the DLL itself, so that FreeLibrary really
-// unloads it.
+// the same call made alone. Each load is the test's own, so that FreeLibrary
+// really unloads the DLL.
 #include <gtest/gtest.h>
 #include <windows.h>
 
-#include <cmath>
-#include <complex>
-#include <cstdint>
-#include <cstring>
 #include <vector>
 
-#include "support/qdm_host.h"
+#include "support/export_table.h"
 
 namespace {
 
-using qdmtest::HostArray;
-using qdmtest::QdmApi;
+using namespace qdmtest;
 
 constexpr int kThreads = 6;
 
-std::vector<double> RealSignal(int n) {
-  std::vector<double> x(static_cast<size_t>(n));
-  for (int t = 0; t < n; ++t)
-    x[static_cast<size_t>(t)] = std::cos(0.61 * t) + 0.4 * std::sin(1.9 * t + 0.3) +
-                                0.05 * std::cos(0.37 * t * t);
-  return x;
-}
-
-std::vector<std::complex<double>> ComplexSignal(int n) {
-  std::vector<std::complex<double>> x(static_cast<size_t>(n));
-  for (int t = 0; t < n; ++t)
-    x[static_cast<size_t>(t)] = std::polar(std::pow(0.99, t), 0.8 * t) +
-                                0.6 * std::polar(1.0, -2.2 * t) +
-                                0.05 * std::complex<double>(std::cos(0.3 * t * t), 0.0);
-  return x;
-}
-
-// Everything one call leaves behind, doubles as bit patterns.
-struct Outcome {
-  int32_t status = 0;
-  std::vector<uint64_t> bits;
-  bool operator==(const Outcome&) const = default;
+struct MixedCall {
+  const Export* x;
+  Scalars s;
 };
 
-void Add(Outcome& o, double v) {
-  uint64_t b;
-  std::memcpy(&b, &v, sizeof b);
-  o.bits.push_back(b);
-}
-void Add(Outcome& o, const std::vector<double>& values) {
-  o.bits.push_back(values.size());
-  for (double v : values) Add(o, v);
+// Every export with every argument set of its family: FFT lengths 2 to 4096.
+std::vector<MixedCall> Mix() {
+  std::vector<MixedCall> mix;
+  for (const Export& x : Exports())
+    for (const Scalars& s : ArgumentSets(x.family)) mix.push_back({&x, s});
+  return mix;
 }
 
-// Call `kind` of a fixed set: spectra of several lengths, real and complex (the
-// plan list under the mutex), and a model fit.
-constexpr int kKinds = 6;
-Outcome CallKind(const QdmApi& qdm, int kind) {
-  Outcome o;
-  double f0 = 0, df = 0, extra = 0;
-  HostArray spectrum = HostArray::Empty(QDM_TYPE_DOUBLE);
-  switch (kind) {
-    case 0:
-    case 1: {
-      HostArray x = HostArray::Real(RealSignal(200));
-      o.status = qdm.QdmReCovPowerSpectrH(x, 8, kind == 0 ? 300 : 1000, 1000.0, &f0, &df,
-                                          spectrum, &extra);
-      break;
-    }
-    case 2:
-    case 3: {
-      HostArray x = HostArray::Complex(ComplexSignal(160));
-      o.status = qdm.QdmCxCovPowerSpectrH(x, 6, kind == 2 ? 100 : 2000, 50.0, &f0, &df,
-                                          spectrum, &extra);
-      break;
-    }
-    case 4: {
-      HostArray x = HostArray::Complex(ComplexSignal(120));
-      HostArray a = HostArray::Empty(QDM_TYPE_DOUBLE), p = HostArray::Empty(QDM_TYPE_DOUBLE),
-                f = HostArray::Empty(QDM_TYPE_DOUBLE);
-      o.status = qdm.QdmCxPCARPowerSpectrumH(x, 10, 700, 2, 1.0, a, p, f, &f0, &df, spectrum,
-                                             &extra);
-      Add(o, a.Reals());
-      Add(o, p.Reals());
-      Add(o, f.Reals());
-      break;
-    }
-    default: {
-      HostArray x = HostArray::Real(RealSignal(90));
-      HostArray a = HostArray::Empty(QDM_TYPE_DOUBLE), r = HostArray::Empty(QDM_TYPE_COMPLEX);
-      o.status = qdm.QdmReCovarianceH(x, 7, a, r, &extra);
-      Add(o, a.Reals());
-      for (const std::complex<double>& z : r.Complexes()) {
-        Add(o, z.real());
-        Add(o, z.imag());
-      }
-      break;
-    }
-  }
-  Add(o, spectrum.Reals());
-  Add(o, f0);
-  Add(o, df);
-  Add(o, extra);
-  return o;
+std::vector<uint64_t> CallOnce(const QdmApi& qdm, const MixedCall& m) {
+  Call c = MakeCall(*m.x, m.s);
+  std::vector<uint64_t> bits = {static_cast<uint64_t>(m.x->invoke(qdm, c, m.s))};
+  for (uint64_t b : Leftovers(*m.x, c, m.s)) bits.push_back(b);
+  return bits;
 }
 
 struct Worker {
   const QdmApi* qdm;
+  const std::vector<MixedCall>* mix;
   HANDLE start;  // manual-reset event: all workers begin together
   int index;
-  std::vector<Outcome> outcomes;
+  std::vector<std::vector<uint64_t>> outcomes;
 };
 
 DWORD WINAPI WorkerMain(LPVOID argument) {
   Worker& w = *static_cast<Worker*>(argument);
   WaitForSingleObject(w.start, INFINITE);
-  for (int round = 0; round < 3; ++round)
-    for (int i = 0; i < kKinds; ++i) w.outcomes.push_back(CallKind(*w.qdm, (i + w.index) % kKinds));
+  for (size_t i = 0; i < w.mix->size(); ++i)
+    w.outcomes.push_back(CallOnce(*w.qdm, (*w.mix)[(i + w.index) % w.mix->size()]));
   return 0;
 }
 
-// Runs kThreads Windows threads over every call kind and checks each result
-// against `alone`.
-void RunConcurrently(const QdmApi& qdm, const std::vector<Outcome>& alone) {
+// kThreads Windows threads over the whole mix, each from its own starting call.
+void RunConcurrently(const QdmApi& qdm) {
+  const std::vector<MixedCall> mix = Mix();
   HANDLE start = CreateEventA(nullptr, TRUE, FALSE, nullptr);
   ASSERT_NE(start, nullptr);
   std::vector<Worker> workers(kThreads);
   std::vector<HANDLE> threads;
   for (int t = 0; t < kThreads; ++t) {
-    workers[static_cast<size_t>(t)] = Worker{&qdm, start, t, {}};
-    HANDLE h = CreateThread(nullptr, 0, WorkerMain, &workers[static_cast<size_t>(t)], 0, nullptr);
+    workers[t] = Worker{&qdm, &mix, start, t, {}};
+    HANDLE h = CreateThread(nullptr, 0, WorkerMain, &workers[t], 0, nullptr);
     ASSERT_NE(h, nullptr);
     threads.push_back(h);
   }
@@ -145,36 +73,21 @@ void RunConcurrently(const QdmApi& qdm, const std::vector<Outcome>& alone) {
   for (HANDLE h : threads) CloseHandle(h);
   CloseHandle(start);
   for (const Worker& w : workers) {
-    ASSERT_EQ(w.outcomes.size(), static_cast<size_t>(3 * kKinds));
-    for (size_t k = 0; k < w.outcomes.size(); ++k) {
-      const int kind = (static_cast<int>(k % kKinds) + w.index) % kKinds;
-      EXPECT_EQ(w.outcomes[k], alone[static_cast<size_t>(kind)])
-          << "call kind " << kind << ", thread " << w.index << ", call " << k;
+    ASSERT_EQ(w.outcomes.size(), mix.size());
+    for (size_t i = 0; i < mix.size(); ++i) {
+      const MixedCall& m = mix[(i + w.index) % mix.size()];
+      EXPECT_EQ(w.outcomes[i], CallOnce(qdm, m)) << m.x->name << " n=" << m.s.n << " thread "
+                                                 << w.index;
     }
   }
 }
 
-std::vector<Outcome> CallsAlone(const QdmApi& qdm) {
-  std::vector<Outcome> alone;
-  for (int kind = 0; kind < kKinds; ++kind) alone.push_back(CallKind(qdm, kind));
-  return alone;
-}
-
-TEST(WindowsThreads, ConcurrentCallsMatchCallsMadeAlone) {
-  const QdmApi qdm = qdmtest::LoadQdm(QDM_LIBRARY_PATH);
-  const std::vector<Outcome> alone = CallsAlone(qdm);
-  for (const Outcome& o : alone) EXPECT_EQ(o.status, 0);
-  RunConcurrently(qdm, alone);
-  EXPECT_TRUE(FreeLibrary(static_cast<HMODULE>(qdm.module)));
-}
-
 TEST(WindowsThreads, ReloadedLibraryServesConcurrentCallersAgain) {
-  std::vector<Outcome> first;
   for (int cycle = 0; cycle < 3; ++cycle) {
-    const QdmApi qdm = qdmtest::LoadQdm(QDM_LIBRARY_PATH);
     // The first calls after each load go through a fresh attach: new mutex,
     // unresolved host function, empty plan list.
-    RunConcurrently(qdm, cycle == 0 ? (first = CallsAlone(qdm)) : first);
+    const QdmApi qdm = LoadQdm(QDM_LIBRARY_PATH);
+    RunConcurrently(qdm);
     ASSERT_TRUE(FreeLibrary(static_cast<HMODULE>(qdm.module)));
     EXPECT_EQ(GetModuleHandleA("qdm.dll"), nullptr) << "the DLL stayed loaded, cycle " << cycle;
   }
