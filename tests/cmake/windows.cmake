@@ -14,16 +14,6 @@ if(WIN32)
                    -DEXPORTS=${exports_arg} -P ${CMAKE_SOURCE_DIR}/tools/check_dll_tables.cmake)
 endif()
 
-# GetProcAddress on the executable sees only the executable's own exports, not
-# those of the DLLs it imports. The entry-frame unit test relies on the
-# library finding the host run-time through the executable, so on Windows the
-# emulated run-time is compiled into that program, which then exports
-# NumericArrayResize and gGFRTVersion itself.
-if(WIN32 AND TARGET unit_entry_frame)
-  target_sources(unit_entry_frame PRIVATE ${CMAKE_SOURCE_DIR}/emuhost/emuhost.cpp)
-  target_compile_definitions(unit_entry_frame PRIVATE EMUHOST_BUILDING)
-endif()
-
 # The Windows build computes what the Linux build computes, to rounding: the
 # example host of each runs every method on the same signals and the JSON
 # outputs are compared number by number (relative tolerance 1e-9). Needs the

@@ -5,7 +5,6 @@
 #include <cmath>
 #include <complex>
 #include <cstdint>
-#include <limits>
 #include <vector>
 
 namespace damped_modes {
@@ -64,28 +63,6 @@ inline std::vector<double> Noise(int n, double a, uint32_t seed) {
     e = a * (2.0 * static_cast<double>(s >> 11) / 9007199254740992.0 - 1.0);
   }
   return v;
-}
-
-// Index of the estimated mode (freq[], damp[]) nearest to m, -1 if none.
-inline int Nearest(const Mode& m, const double* freq, const double* damp, int count) {
-  int best = -1;
-  double bestDist = std::numeric_limits<double>::infinity();
-  for (int i = 0; i < count; ++i) {
-    const double d = std::hypot(freq[i] - m.freq, damp[i] - m.damp);
-    if (d < bestDist) {
-      bestDist = d;
-      best = i;
-    }
-  }
-  return best;
-}
-
-// Smallest distance from z to any of roots[0..count-1].
-inline double DistanceToNearest(std::complex<double> z, const std::complex<double>* roots,
-                                int count) {
-  double best = std::numeric_limits<double>::infinity();
-  for (int i = 0; i < count; ++i) best = std::fmin(best, std::abs(roots[i] - z));
-  return best;
 }
 
 // Wraps a phase difference into (-pi, pi].
