@@ -1,10 +1,3 @@
-# The entry-frame unit test runs the real resize path against the emulated host
-# run-time, which the library's host lookup finds in the executable's scope.
-if(TARGET unit_entry_frame)
-  target_link_libraries(unit_entry_frame PRIVATE gfrtemu)
-  target_include_directories(unit_entry_frame PRIVATE ${CMAKE_SOURCE_DIR}/emuhost)
-endif()
-
 # Child processes and modules for the run-time binding test (e2e_host_binding).
 set(QDM_CHILD_SRC ${CMAKE_SOURCE_DIR}/tests/helpers/host_child.cpp)
 
