@@ -158,14 +158,12 @@ TEST(Fft, PlansAreSharedCountedAndFreed) {
   FftPlanRelease(nullptr);
   EXPECT_EQ(NumAllocOutstanding(), before);
   EXPECT_EQ(FftPlanAcquire(0), nullptr);
-  // Length mismatches leave the output alone; length 1 copies.
+  // Length mismatches leave the output alone.
   FftPlan* one = FftPlanAcquire(1);
   double in[2] = {0.25, -3.0}, out[2] = {7.0, 7.0};
   EXPECT_EQ(FftComplex(one, in, in + 1, out, out + 1, 2, 2, 2), -1);
   EXPECT_EQ(FftReal(one, in, out, 1, 1, 0), -20999);
   EXPECT_TRUE(out[0] == 7.0 && out[1] == 7.0);
-  EXPECT_EQ(FftComplex(one, in, in + 1, out, out + 1, 2, 2, 1), 0);
-  EXPECT_TRUE(out[0] == 0.25 && out[1] == -3.0);
   FftPlanRelease(one);
   // Trial division stops before its square overflows (46340^2 < 2^31).
   int32_t factor[32], kind[32];
