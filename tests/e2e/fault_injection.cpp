@@ -1,13 +1,8 @@
 // Every fault injected everywhere, through the exports of the fault-injection
-// build of the library (the same internal code as libqdm plus hooks on its work
-// memory). For every argument set of every export (real and complex data,
-// small and large records, spectrum sizes from 2 to 4096) the clean call is
-// made first; then each work allocation is failed in turn, once and from then
-// on, and each host resize likewise. A faulted call must give exactly the
-// clean call's result (bit for bit: counts, capacities, elements, out doubles)
-// or the failure status with its outputs as the failure path leaves them, and
-// must leave no work memory allocated. The one documented exception is
-// IgnoresSolveStatus.
+// build of the library (libqdm's code plus hooks on its work memory): for every
+// argument set of every export, each work allocation failed in turn, once and
+// from then on, and each host resize likewise. Each faulted call is judged by
+// FaultedHostCallIsRight against the clean call and leaves no work memory.
 #include <gtest/gtest.h>
 
 #include <cstdio>
@@ -15,21 +10,12 @@
 #include <vector>
 
 #include "support/export_table.h"
-#include "support/qdm_host.h"
 
 namespace {
 
 using namespace qdmtest;
 
 constexpr int32_t kResizeError = 3;  // a host memory error
-
-// Counts and out doubles as they were before the call.
-bool Untouched(const Export& x, const Call& c) {
-  bool ok = true;
-  for (int i = 0; i < x.outputs; ++i) ok = ok && c.out[i].Count() == kStaleCount;
-  for (int j = 0; j < x.doubles; ++j) ok = ok && c.d[j] == kStale;
-  return ok;
-}
 
 TEST(FaultInjection, EveryFaultGivesTheCleanResultOrTheFailure) {
   static const QdmApi qdm = LoadQdm(QDM_FAULTSIM_LIBRARY_PATH);
@@ -50,10 +36,8 @@ TEST(FaultInjection, EveryFaultGivesTheCleanResultOrTheFailure) {
       for (int fault = 0; fault < 4; ++fault) {  // allocation, resize; once, from then on
         const bool resize = fault >= 2, fromThenOn = fault % 2 == 1;
         for (int64_t k = 1;; ++k) {
-          const std::string where = std::string(x.name) + " n=" + std::to_string(s.n) + " (" +
-                                    std::to_string(s.a) + "," + std::to_string(s.b) + "," +
-                                    std::to_string(s.c) + ") fault " + std::to_string(fault) +
-                                    " k=" + std::to_string(k);
+          const std::string where =
+              Where(x, s) + " fault " + std::to_string(fault) + " k=" + std::to_string(k);
           ASSERT_LT(k, 100000) << where << ": no clean run within the limit";
           Call c = MakeCall(x, s);
           if (resize) {
@@ -67,20 +51,13 @@ TEST(FaultInjection, EveryFaultGivesTheCleanResultOrTheFailure) {
           EmuFailResize(0, 0);
           ++calls;
           EXPECT_EQ(outstanding(), 0) << where << ": work memory left allocated";
-          bool right;
           if (!reached) {
             EXPECT_TRUE(st == 0 && Leftovers(x, c, s) == clean) << where << ": status " << st;
             break;
-          } else if (resize) {  // real Prony and real PCAR spectrum return at once
-            right = st == HostCode(kResizeError) &&
-                    (x.failedResizeReturns ? Untouched(x, c)
-                                           : Emptied(x, c, false, /*countsOnly=*/fromThenOn));
-          } else if (st == kHostNoMemory) {
-            right = Emptied(x, c, true) && c.order == (x.family == Family::kMdl ? 0 : kStaleOrder);
-          } else {
-            right = st == 0 && (Leftovers(x, c, s) == clean || IgnoresSolveStatus(x));
-            absorbed += right && Leftovers(x, c, s) != clean;
           }
+          const bool right = FaultedHostCallIsRight(x, s, 0, clean, c, st,
+                                                    resize ? kResizeError : 0, fromThenOn);
+          absorbed += right && st == 0 && Leftovers(x, c, s) != clean;
           ++faults;
           failures += !right;
           EXPECT_TRUE(right) << where << ": status " << st

@@ -10,7 +10,6 @@
 #include <cmath>
 #include <complex>
 #include <cstdint>
-#include <cstring>
 #include <string>
 #include <vector>
 
@@ -35,10 +34,8 @@ struct Scalars {
 // The host-side state of one call: stale outputs, out doubles, the MDL result.
 struct Call {
   HostArray data;
-  HostArray out[4] = {HostArray::Filled(kR, kStaleCount, kStale),
-                      HostArray::Filled(kR, kStaleCount, kStale),
-                      HostArray::Filled(kR, kStaleCount, kStale),
-                      HostArray::Filled(kR, kStaleCount, kStale)};
+  static HostArray Stale() { return HostArray::Filled(kR, kStaleCount, kStale); }
+  HostArray out[4] = {Stale(), Stale(), Stale(), Stale()};
   double d[3] = {kStale, kStale, kStale};
   int32_t order = kStaleOrder;
   uint8_t flag = 1;
@@ -131,13 +128,11 @@ inline const std::vector<Export>& Exports() {
 #undef QDM_ROW
 #undef QDM_OUT4
 
-// n = 12 gives the order bound floor(24/3) = 8.
-inline Scalars Valid(Family f) {
-  constexpr Scalars kValid[] = {{12, 2, 0, 0, 1}, {12, 2, 0, 0, 1}, {12, 4, 2, 0, 1},
-                                {12, 4, 2, 0, 1}, {12, 4, 1, 0, 1}, {12, 2, 16, 0, 1},
-                                {12, 4, 16, 2, 1}};
-  return kValid[static_cast<int>(f)];
-}
+// By family; n = 12 gives the order bound floor(24/3) = 8.
+inline constexpr Scalars kValid[] = {{12, 2, 0, 0, 1}, {12, 2, 0, 0, 1},  {12, 4, 2, 0, 1},
+                                     {12, 4, 2, 0, 1}, {12, 4, 1, 0, 1},  {12, 2, 16, 0, 1},
+                                     {12, 4, 16, 2, 1}};
+inline Scalars Valid(Family f) { return kValid[static_cast<int>(f)]; }
 
 // Argument sets per family: the valid set and one on a longer record; for the
 // spectra, sizes including primes instead of the valid one: they round up to
@@ -146,10 +141,11 @@ inline std::vector<Scalars> ArgumentSets(Family f) {
   constexpr Scalars kLonger[] = {{64, 8, 0, 0, 2}, {64, 10, 0, 0, 1}, {64, 12, 4, 0, 1},
                                  {64, 20, 6, 0, 3}, {64, 12, 2, 0, 1}, {64, 10, 256, 0, 1},
                                  {64, 12, 256, 4, 1}};
-  std::vector<Scalars> sets = {Valid(f)};
+  const Scalars v = Valid(f);
+  std::vector<Scalars> sets = {v};
   if (f == Family::kCovSpectrum || f == Family::kPcarSpectrum) {
     sets.clear();
-    for (int32_t m : {2, 3, 5, 17, 53, 127, 1009, 4096}) sets.push_back({12, Valid(f).a, m, Valid(f).c, 1});
+    for (int32_t m : {2, 3, 5, 17, 53, 127, 1009, 4096}) sets.push_back({12, v.a, m, v.c, 1});
   }
   sets.push_back(kLonger[static_cast<int>(f)]);
   return sets;
@@ -157,10 +153,21 @@ inline std::vector<Scalars> ArgumentSets(Family f) {
 
 inline Call MakeCall(const Export& x, const Scalars& s) { return Call{Signal(x.complexData, s.n)}; }
 
-// Every output at count 0 and capacity 0 (counts only when `countsOnly`: a
-// resize failing from then on fails the emptying resizes too), every out
-// double but the amplitude-fit error zeroed. The amplitude-fit error is the
-// estimator's: it keeps its stale value unless the estimator may have run.
+// A host block of real data, or of complex data from interleaved doubles.
+inline HostArray Block(bool complexData, const std::vector<double>& v) {
+  if (!complexData) return HostArray::Real(v);
+  return HostArray::Complex(std::span<const std::complex<double>>(
+      reinterpret_cast<const std::complex<double>*>(v.data()), v.size() / 2));
+}
+
+inline std::string Where(const Export& x, const Scalars& s) {
+  return std::string(x.name) + " n=" + std::to_string(s.n) + " (" + std::to_string(s.a) + "," +
+         std::to_string(s.b) + "," + std::to_string(s.c) + ") fs=" + std::to_string(s.fs);
+}
+
+// Every output at count 0 and capacity 0 (or only the counts), every out double
+// zeroed but the amplitude-fit error: that one is the estimator's, and keeps
+// its stale value unless the estimator may have run.
 inline bool Emptied(const Export& x, const Call& c, bool estimatorMayHaveRun,
                     bool countsOnly = false) {
   bool ok = true;
@@ -195,6 +202,29 @@ inline std::vector<ResizeCall> EmptyingResizes(const Export& x, const Scalars& s
   std::vector<ResizeCall> r = x.resizes(s);
   for (ResizeCall& call : r) call.count = 0;
   return r;
+}
+
+// A call with an injected fault gives the clean call's status and result bit
+// for bit, or the failure: -20001 with its outputs emptied, or a failed
+// resize's error (resizeError, 0 for an allocation fault) with the outputs as
+// that path leaves them: real Prony and real PCAR spectrum return at once and
+// touch nothing; the others empty them, and when resizes fail from then on the
+// emptying ones fail too, so only the counts are certain. IgnoresSolveStatus.
+inline bool FaultedHostCallIsRight(const Export& x, const Scalars& s, int32_t cleanStatus,
+                                   const std::vector<uint64_t>& clean, const Call& c, int32_t st,
+                                   int32_t resizeError, bool fromThenOn) {
+  if (st == cleanStatus && (st != 0 || Leftovers(x, c, s) == clean)) return true;
+  if (resizeError != 0 && x.failedResizeReturns) {
+    bool untouched = st == HostCode(resizeError);
+    for (int i = 0; i < x.outputs; ++i) untouched = untouched && c.out[i].Count() == kStaleCount;
+    for (int j = 0; j < x.doubles; ++j) untouched = untouched && c.d[j] == kStale;
+    return untouched;
+  }
+  if (resizeError != 0) return st == HostCode(resizeError) && Emptied(x, c, false, fromThenOn);
+  if (st == kHostNoMemory) {
+    return Emptied(x, c, true) && c.order == (x.family == Family::kMdl ? 0 : kStaleOrder);
+  }
+  return st == 0 && IgnoresSolveStatus(x);
 }
 
 }  // namespace qdmtest
