@@ -6,7 +6,6 @@
 
 #include <atomic>
 #include <thread>
-#include <vector>
 
 #include "support/export_table.h"
 
@@ -40,25 +39,26 @@ TEST(Concurrency, SimultaneousFirstCallsMatchCallsMadeAlone) {
   // Each thread starts at a different call of the mix (every one begins with a
   // resize, so the first resolution of the host function races) and walks it
   // with its own stride, so that different sizes and FFT lengths overlap.
-  auto order = [&](int t, size_t i) { return (size_t(t) * 7 + i * (2 * size_t(t) + 1)) % mix.size(); };
+  auto order = [&](int t, size_t i) {
+    return (size_t(t) * 7 + i * (2 * size_t(t) + 1)) % mix.size();
+  };
   for (int t = 0; t < kThreads; ++t) {
     threads.emplace_back([&, t] {
       ready.fetch_add(1);
       while (ready.load() < kThreads) std::this_thread::yield();
       for (int r = 0; r < kRounds; ++r)
-        for (size_t i = 0; i < mix.size(); ++i) outcomes[size_t(t)].push_back(CallOnce(mix[order(t, i)]));
+        for (size_t i = 0; i < mix.size(); ++i)
+          outcomes[size_t(t)].push_back(CallOnce(mix[order(t, i)]));
     });
   }
   for (std::thread& th : threads) th.join();
   std::vector<std::vector<uint64_t>> alone;
   for (const MixedCall& m : mix) alone.push_back(CallOnce(m));
-  for (int t = 0; t < kThreads; ++t) {
-    for (size_t k = 0; k < outcomes[size_t(t)].size(); ++k) {
-      const MixedCall& m = mix[order(t, k % mix.size())];
-      EXPECT_EQ(outcomes[size_t(t)][k], alone[order(t, k % mix.size())])
-          << m.x->name << " n=" << m.s.n << " size " << m.s.b << " thread " << t;
+  for (int t = 0; t < kThreads; ++t)
+    for (size_t k = 0, i; k < outcomes[size_t(t)].size(); ++k) {
+      i = order(t, k % mix.size());
+      EXPECT_EQ(outcomes[size_t(t)][k], alone[i]) << Where(*mix[i].x, mix[i].s) << " thread " << t;
     }
-  }
 }
 
 }  // namespace

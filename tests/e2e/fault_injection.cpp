@@ -6,8 +6,6 @@
 #include <gtest/gtest.h>
 
 #include <cstdio>
-#include <string>
-#include <vector>
 
 #include "support/export_table.h"
 
@@ -55,8 +53,8 @@ TEST(FaultInjection, EveryFaultGivesTheCleanResultOrTheFailure) {
             EXPECT_TRUE(st == 0 && Leftovers(x, c, s) == clean) << where << ": status " << st;
             break;
           }
-          const bool right = FaultedHostCallIsRight(x, s, 0, clean, c, st,
-                                                    resize ? kResizeError : 0, fromThenOn);
+          const bool right =
+              FaultedHostCallIsRight(x, s, 0, clean, c, st, resize ? kResizeError : 0, fromThenOn);
           absorbed += right && st == 0 && Leftovers(x, c, s) != clean;
           ++faults;
           failures += !right;
@@ -67,11 +65,11 @@ TEST(FaultInjection, EveryFaultGivesTheCleanResultOrTheFailure) {
     }
   }
   // The figures quoted in the README.
-  std::printf("fault injection: %lld argument sets, %lld calls, %lld faults, %lld absorbed by an "
-              "ignored solve status, %lld failures\n",
-              static_cast<long long>(sets), static_cast<long long>(calls),
-              static_cast<long long>(faults), static_cast<long long>(absorbed),
-              static_cast<long long>(failures));
+  std::printf(
+      "fault injection: %lld argument sets, %lld calls, %lld faults, %lld absorbed by an "
+      "ignored solve status, %lld failures\n",
+      static_cast<long long>(sets), static_cast<long long>(calls), static_cast<long long>(faults),
+      static_cast<long long>(absorbed), static_cast<long long>(failures));
   RecordProperty("calls", std::to_string(calls));
   RecordProperty("faults", std::to_string(faults));
   RecordProperty("absorbed", std::to_string(absorbed));

@@ -9,8 +9,6 @@
 #include <cmath>
 #include <cstdio>
 #include <set>
-#include <string>
-#include <vector>
 
 #include "support/export_table.h"
 
@@ -23,8 +21,8 @@ using namespace qdmtest;
 struct Powers {
   int out[4], d[3];
 };
-constexpr Powers kPowers[] = {{{1, 0, 0, 0}, {}}, {{0, 0}, {2}},       {{0, 0}, {}},
-                              {{1, 0, 0, 0}, {2}}, {{}, {}},           {{0}, {0, 0, 2}},
+constexpr Powers kPowers[] = {{{1, 0, 0, 0}, {}},       {{0, 0}, {2}}, {{0, 0}, {}},
+                              {{1, 0, 0, 0}, {2}},      {{}, {}},      {{0}, {0, 0, 2}},
                               {{1, 0, 0, 0}, {0, 0, 2}}};
 
 // Orders and mode counts matched to the test signal (two modes in complex
@@ -32,15 +30,10 @@ constexpr Powers kPowers[] = {{{1, 0, 0, 0}, {}}, {{0, 0}, {2}},       {{0, 0}, 
 // poles, which the last bits of the data may move.
 Scalars ScalingSet(const Export& x) {
   const int32_t k = x.complexData ? 2 : 4;
-  const Scalars sets[] = {{64, k, 0, 0, 1},   {64, k, 0, 0, 1},   {64, 8, k, 0, 1},
-                          {64, 20, k, 0, 1},  {64, 12, 1, 0, 1},  {64, k, 256, 0, 1},
+  const Scalars sets[] = {{64, k, 0, 0, 1},  {64, k, 0, 0, 1},  {64, 8, k, 0, 1},
+                          {64, 20, k, 0, 1}, {64, 12, 1, 0, 1}, {64, k, 256, 0, 1},
                           {64, 8, 256, k, 1}};
   return sets[static_cast<int>(x.family)];
-}
-
-// Output i of a call as doubles (two per complex element).
-std::vector<double> Values(const Export& x, const Call& c, const Scalars& s, int i) {
-  return c.out[i].Reals(c.out[i].Count() * (x.resizes(s)[size_t(i)].typeCode == kC ? 2 : 1));
 }
 
 TEST(Scaling, FitsScaleAsTheirModelsDo) {
@@ -85,8 +78,8 @@ TEST(Scaling, FitsScaleAsTheirModelsDo) {
       }
     }
   }
-  std::printf("scaling sweep: %d scaled fits compared, %d ended in a documented status\n",
-              compared, statuses);
+  std::printf("scaling sweep: %d scaled fits compared, %d ended in a documented status\n", compared,
+              statuses);
   RecordProperty("compared", compared);
   RecordProperty("statuses", statuses);
 }

@@ -18,12 +18,10 @@
 // end in a later step's documented failure. A broken check aborts (a crash).
 #include <cfloat>
 #include <cmath>
-#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <set>
-#include <vector>
 
 #include "emuhost.h"
 #include "numeric/lapack_boundary.h"
@@ -56,7 +54,7 @@ int32_t IntegerArgument(Reader& r) {
 
 double Value(Reader& r) {
   const uint8_t s = r.Byte();
-  constexpr double kFixed[] = {NAN,       INFINITY, -INFINITY,     1e308, -1e308, DBL_MAX,
+  constexpr double kFixed[] = {NAN,      INFINITY, -INFINITY,    1e308, -1e308, DBL_MAX,
                                -DBL_MAX, 4.9e-324, -DBL_MIN / 4, 0.0,   -0.0};
   if (s % 16 < 11) return kFixed[s % 16];
   if (s % 16 == 11) return r.Bits<double>();
@@ -137,11 +135,12 @@ void HostFace(const Export& x, const Scalars& s, const std::vector<double>& valu
   EmuFailResize(0, 0);
   Require(NumAllocOutstanding() == 0, "work memory left allocated after a fault", x, st);
   Require(HostStatus(st), "undocumented status after a fault", x, st);
-  Require(FaultedHostCallIsRight(x, s, cleanStatus, cleanStatus == 0 ? Leftovers(x, clean, s)
-                                                                     : std::vector<uint64_t>{},
-                                 faulted, st, resize ? kResizeError : 0, false) ||
-              (!resize && IgnoresSolveStatus(x)),
-          "a fault gave neither the clean result nor the failure", x, st);
+  Require(
+      FaultedHostCallIsRight(x, s, cleanStatus,
+                             cleanStatus == 0 ? Leftovers(x, clean, s) : std::vector<uint64_t>{},
+                             faulted, st, resize ? kResizeError : 0, false) ||
+          (!resize && IgnoresSolveStatus(x)),
+      "a fault gave neither the clean result nor the failure", x, st);
 }
 
 }  // namespace
@@ -151,10 +150,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const bool plainFace = (r.Byte() & 1) != 0;
   const Export& x = Exports()[r.Byte() % Exports().size()];
   const uint8_t flags = r.Byte();
-  Scalars s{};
-  s.a = IntegerArgument(r);
-  s.b = IntegerArgument(r);
-  s.c = IntegerArgument(r);
+  Scalars s{0, IntegerArgument(r), IntegerArgument(r), IntegerArgument(r), 0};  // in order
   // Spectrum sizes between 8192 and 2^30 are valid but only cost time.
   const bool spectrum = x.family == Family::kCovSpectrum || x.family == Family::kPcarSpectrum;
   if (spectrum && s.b > 8192 && s.b <= (INT32_C(1) << 30)) s.b = 2 + s.b % 8191;
@@ -163,11 +159,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const uint16_t faultAt = r.Bits<uint16_t>();
   std::vector<double> values(static_cast<size_t>(s.n) * (x.complexData ? 2 : 1));
   for (double& v : values) v = Value(r);
-  const double none = 0.0;
-  if (plainFace) {
-    PlainFace(x, s, values.empty() ? &none : values.data(), flags, faultAt);
-  } else {
-    HostFace(x, s, values, flags, faultAt);
-  }
+  plainFace ? PlainFace(x, s, values.empty() ? &kStale : values.data(), flags, faultAt)
+            : HostFace(x, s, values, flags, faultAt);
   return 0;
 }

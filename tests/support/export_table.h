@@ -73,33 +73,31 @@ struct Export {
   // pencil out1..out4; covariance and PCAR the p roots, then the coefficients;
   // spectra out1..out3, then the spectrum.
   std::vector<ResizeCall> resizes(const Scalars& s) const {
-    auto many = [](int times, int32_t count) {
-      return std::vector<ResizeCall>(size_t(times), ResizeCall{kR, 1, size_t(count)});
-    };
     std::vector<ResizeCall> r;
-    switch (family) {
-      case Family::kProny: return many(4, s.a);
-      case Family::kPencil: return many(4, s.b);
-      case Family::kCovariance:
-      case Family::kPcar: return {{kC, 1, size_t(s.a)}, {complexData ? kC : kR, 1, size_t(s.a) + 1}};
-      case Family::kMdl: return {};
-      case Family::kCovSpectrum: return many(1, SpectrumN(s.b));
-      case Family::kPcarSpectrum: r = many(3, s.c); r.push_back({kR, 1, size_t(SpectrumN(s.b))});
-    }
+    auto add = [&r](int times, int32_t type, int64_t count) {
+      r.insert(r.end(), size_t(times), ResizeCall{type, 1, size_t(count)});
+    };
+    const Family f = family;
+    if (f == Family::kProny || f == Family::kPencil) add(4, kR, f == Family::kProny ? s.a : s.b);
+    if (f == Family::kCovariance || f == Family::kPcar) add(1, kC, s.a);
+    if (f == Family::kCovariance || f == Family::kPcar) add(1, complexData ? kC : kR, s.a + 1LL);
+    if (f == Family::kPcarSpectrum) add(3, kR, s.c);
+    if (f == Family::kCovSpectrum || f == Family::kPcarSpectrum) add(1, kR, SpectrumN(s.b));
     return r;
   }
 };
 
-// Exports that ignore the status of a least-squares solve on purpose (the
-// covariance estimator and the mode-amplitude fit): on the host face a fault
-// inside that solve may end in success with another result. The only exception
-// to "the clean result or the failure".
+// Exports that ignore a least-squares solve's status on purpose (covariance
+// estimator, mode-amplitude fit): a fault inside it may end in success with
+// another result, the one exception to "the clean result or the failure".
 inline bool IgnoresSolveStatus(const Export& x) { return x.family != Family::kPcar; }
 
-#define QDM_ROW(fn, family, cx, outputs, doubles, pass, returns, ...) \
-  {#fn, Family::family, cx, outputs, doubles, pass, returns,          \
-   [](const QdmApi& q, Call& c, const Scalars& s) { return q.fn(c.data, __VA_ARGS__); }}
+// clang-format off
+#define QDM_ROW(fn, family, cx, outputs, doubles, pass, returns, ...)                           \
+  Export{#fn, Family::family, cx, outputs, doubles, pass, returns,                              \
+         [](const QdmApi& q, Call& c, const Scalars& s) { return q.fn(c.data, __VA_ARGS__); }}
 #define QDM_OUT4 c.out[0], c.out[1], c.out[2], c.out[3]
+// clang-format on
 
 inline const std::vector<Export>& Exports() {
   static const std::vector<Export> exports = {
@@ -129,8 +127,8 @@ inline const std::vector<Export>& Exports() {
 #undef QDM_OUT4
 
 // By family; n = 12 gives the order bound floor(24/3) = 8.
-inline constexpr Scalars kValid[] = {{12, 2, 0, 0, 1}, {12, 2, 0, 0, 1},  {12, 4, 2, 0, 1},
-                                     {12, 4, 2, 0, 1}, {12, 4, 1, 0, 1},  {12, 2, 16, 0, 1},
+inline constexpr Scalars kValid[] = {{12, 2, 0, 0, 1}, {12, 2, 0, 0, 1}, {12, 4, 2, 0, 1},
+                                     {12, 4, 2, 0, 1}, {12, 4, 1, 0, 1}, {12, 2, 16, 0, 1},
                                      {12, 4, 16, 2, 1}};
 inline Scalars Valid(Family f) { return kValid[static_cast<int>(f)]; }
 
@@ -138,8 +136,8 @@ inline Scalars Valid(Family f) { return kValid[static_cast<int>(f)]; }
 // spectra, sizes including primes instead of the valid one: they round up to
 // the power-of-two grid, so FFT plans of every length from 2 to 4096 are built.
 inline std::vector<Scalars> ArgumentSets(Family f) {
-  constexpr Scalars kLonger[] = {{64, 8, 0, 0, 2}, {64, 10, 0, 0, 1}, {64, 12, 4, 0, 1},
-                                 {64, 20, 6, 0, 3}, {64, 12, 2, 0, 1}, {64, 10, 256, 0, 1},
+  constexpr Scalars kLonger[] = {{64, 8, 0, 0, 2},   {64, 10, 0, 0, 1}, {64, 12, 4, 0, 1},
+                                 {64, 20, 6, 0, 3},  {64, 12, 2, 0, 1}, {64, 10, 256, 0, 1},
                                  {64, 12, 256, 4, 1}};
   const Scalars v = Valid(f);
   std::vector<Scalars> sets = {v};
@@ -158,6 +156,11 @@ inline HostArray Block(bool complexData, const std::vector<double>& v) {
   if (!complexData) return HostArray::Real(v);
   return HostArray::Complex(std::span<const std::complex<double>>(
       reinterpret_cast<const std::complex<double>*>(v.data()), v.size() / 2));
+}
+
+// Output i of a call as doubles (two per complex element).
+inline std::vector<double> Values(const Export& x, const Call& c, const Scalars& s, int i) {
+  return c.out[i].Reals(c.out[i].Count() * (x.resizes(s)[size_t(i)].typeCode == kC ? 2 : 1));
 }
 
 inline std::string Where(const Export& x, const Scalars& s) {

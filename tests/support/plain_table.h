@@ -1,22 +1,17 @@
-// The plain C API's fourteen fits keyed by the host export they mirror, with
-// results in the host face's shape, and what a faulted plain call may give,
-// for tests that run both faces on the same calls (plain versus host, the fuzzer).
+// The plain C API's fourteen fits keyed by the host export they mirror, results
+// in the host face's shape, and what a faulted plain call may give.
 #pragma once
 
 #include <cmath>
-#include <cstdint>
 #include <cstring>
 #include <map>
-#include <string>
-#include <vector>
 
 #include "qdm_api.h"
 #include "support/export_table.h"
 
 namespace qdmtest {
 
-// Array outputs in the export table's resize order (complex ones interleaved),
-// out doubles in its order, and the mode count (or the MDL order).
+// Outputs in the export table's order (complex ones interleaved), the mode count or MDL order.
 struct PlainCall {
   std::vector<double> out[4];
   double d[3] = {kStale, kStale, kStale};
@@ -27,8 +22,10 @@ inline qdm_complex* Cx(std::vector<double>& v) { return reinterpret_cast<qdm_com
 inline const qdm_complex* Cx(const double* x) { return reinterpret_cast<const qdm_complex*>(x); }
 
 using PlainFn = int32_t (*)(const double* x, const Scalars& s, PlainCall& c);
-#define QDM_PLAIN(name, fn, ...) \
-  {name, [](const double* x, const Scalars& s, PlainCall& c) { return fn(__VA_ARGS__); }}
+#define QDM_PLAIN(name, fn, ...)                                                          \
+  {                                                                                       \
+    name, [](const double* x, const Scalars& s, PlainCall& c) { return fn(__VA_ARGS__); } \
+  }
 #define QDM_O4 c.out[0].data(), c.out[1].data(), c.out[2].data(), c.out[3].data()
 #define QDM_O3 c.out[0].data(), c.out[1].data(), c.out[2].data()
 
@@ -36,16 +33,16 @@ inline int32_t CallPlain(const Export& e, const double* data, const Scalars& sc,
   static const std::map<std::string, PlainFn> table = {
       QDM_PLAIN("QdmRePronyH", qdm_prony_real, x, s.n, s.a, s.fs, 1, QDM_O4, &c.count),
       QDM_PLAIN("QdmCxPronyH", qdm_prony_complex, Cx(x), s.n, s.a, s.fs, QDM_O4, &c.count),
-      QDM_PLAIN("QdmReCovarianceH", qdm_covariance_real, x, s.n, s.a, c.out[1].data(),
-                Cx(c.out[0]), c.d),
+      QDM_PLAIN("QdmReCovarianceH", qdm_covariance_real, x, s.n, s.a, c.out[1].data(), Cx(c.out[0]),
+                c.d),
       QDM_PLAIN("QdmCxCovarianceH", qdm_covariance_complex, Cx(x), s.n, s.a, Cx(c.out[1]),
                 Cx(c.out[0]), c.d),
       QDM_PLAIN("QdmRePCARH", qdm_pcar_real, x, s.n, s.a, s.b, c.out[1].data(), Cx(c.out[0])),
       QDM_PLAIN("QdmCxPCARH", qdm_pcar_complex, Cx(x), s.n, s.a, s.b, Cx(c.out[1]), Cx(c.out[0])),
       QDM_PLAIN("QdmReMatrixPencilH", qdm_matrix_pencil_real, x, s.n, s.a, s.b, s.fs, 1, QDM_O4,
                 &c.count, c.d),
-      QDM_PLAIN("QdmCxMatrixPencilH", qdm_matrix_pencil_complex, Cx(x), s.n, s.a, s.b, s.fs,
-                QDM_O4, &c.count, c.d),
+      QDM_PLAIN("QdmCxMatrixPencilH", qdm_matrix_pencil_complex, Cx(x), s.n, s.a, s.b, s.fs, QDM_O4,
+                &c.count, c.d),
       QDM_PLAIN("QdmReMinDescriptLenH", qdm_mdl_order_real, x, s.n, s.a, s.b, &c.count),
       QDM_PLAIN("QdmCxMinDescriptLenH", qdm_mdl_order_complex, Cx(x), s.n, s.a, s.b, &c.count),
       QDM_PLAIN("QdmReCovPowerSpectrH", qdm_covariance_psd_real, x, s.n, s.a, s.b, s.fs,
@@ -75,9 +72,8 @@ inline bool Modes(Family f) {
   return f == Family::kProny || f == Family::kPencil || f == Family::kPcarSpectrum;
 }
 
-// Doubles of the test signal the host block holds.
-inline std::vector<double> Samples(bool complexData, int32_t n) {
-  return Signal(complexData, n).Reals(n * (complexData ? 2 : 1));
+inline std::vector<double> Samples(bool cx, int32_t n) {
+  return Signal(cx, n).Reals(n * (cx ? 2 : 1));
 }
 
 // The plain face's failure path: every output +0.0, the out doubles and the count 0.
@@ -95,8 +91,8 @@ inline bool Zeroed(const Export& x, const PlainCall& c) {
 // with other numbers.
 inline bool FaultedPlainCallIsRight(const Export& x, int32_t cleanStatus, const PlainCall& clean,
                                     int32_t st, const PlainCall& c) {
-  bool same = st == cleanStatus && std::memcmp(clean.d, c.d, sizeof c.d) == 0 &&
-              clean.count == c.count;
+  bool same =
+      st == cleanStatus && std::memcmp(clean.d, c.d, sizeof c.d) == 0 && clean.count == c.count;
   for (int i = 0; i < 4; ++i)
     same = same && clean.out[i].size() == c.out[i].size() &&
            (c.out[i].empty() ||
