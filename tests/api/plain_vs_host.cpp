@@ -102,7 +102,9 @@ TEST(PlainApi, RefusesWhatTheHostFaceLetsThrough) {
 }
 
 // Each work allocation failed in turn, once and from then on, and each LAPACK
-// driver call made to report INFO > 0 and INFO < 0, on every argument set.
+// driver call made to report INFO > 0 (once, from then on) and INFO < 0, on
+// every argument set. The plain face turns every failure it hears of into an
+// error, so a call fails exactly when its fault was reached.
 TEST(PlainApi, NoFailureIsReportedAsSuccess) {
   int64_t faulted = 0;
   for (const Export& x : Exports()) {
@@ -111,19 +113,19 @@ TEST(PlainApi, NoFailureIsReportedAsSuccess) {
       PlainCall clean;
       const int32_t cleanStatus = CallPlain(x, data.data(), s, clean);
       ASSERT_GE(cleanStatus, 0) << Where(x, s);
-      for (int fault = 0; fault < 4; ++fault) {  // allocation once, from then on; INFO 1, -1
+      for (int fault = 0; fault < 5; ++fault) {  // allocation once, from; INFO 1, -1, 1 from
         for (int64_t k = 1;; ++k) {
           const std::string where =
               Where(x, s) + " fault " + std::to_string(fault) + " k=" + std::to_string(k);
           PlainCall p;
           if (fault < 2) NumAllocFailAt(k, fault == 1);
-          if (fault >= 2) LapackFailAt(k, fault == 2 ? 1 : -1, false);
+          if (fault >= 2) LapackFailAt(k, fault == 3 ? -1 : 1, fault == 4);
           const int32_t st = CallPlain(x, data.data(), s, p);
           const bool reached = (fault < 2 ? NumAllocAttempts() : LapackCalls()) >= k;
           NumAllocFailAt(0, false);
           LapackFailAt(0, 0, false);
           ASSERT_EQ(NumAllocOutstanding(), 0) << where;
-          EXPECT_TRUE(FaultedPlainCallIsRight(x, cleanStatus, clean, st, p))
+          EXPECT_TRUE(FaultedPlainCallIsRight(x, cleanStatus, clean, st, p) && reached == (st < 0))
               << where << ": status " << st;
           if (!reached) break;
           ++faulted;
