@@ -101,10 +101,9 @@ TEST(PlainApi, RefusesWhatTheHostFaceLetsThrough) {
   NumAllocFailAt(0, false);
 }
 
-// Each work allocation failed in turn, once and from then on, and each LAPACK
-// driver call made to report INFO > 0 (once, from then on) and INFO < 0, on
-// every argument set. The plain face turns every failure it hears of into an
-// error, so a call fails exactly when its fault was reached.
+// Each work allocation failed in turn (once, from then on), each LAPACK driver
+// call made to report INFO > 0 (once, from then on) and INFO < 0. The plain face
+// turns every failure it hears of into an error: a call fails iff its fault was reached.
 TEST(PlainApi, NoFailureIsReportedAsSuccess) {
   int64_t faulted = 0;
   for (const Export& x : Exports()) {
