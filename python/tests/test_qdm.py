@@ -2,8 +2,8 @@
 numpy oracles, and bad input as the right exception with the library's code."""
 import ctypes
 import os
-import threading
 import warnings
+from concurrent.futures import ThreadPoolExecutor
 
 import numpy as np
 import pytest
@@ -163,12 +163,6 @@ def test_rank_deficiency_is_a_warning_with_complete_results():
 
 def test_threads_get_the_single_thread_result():
     want = qdm.matrix_pencil(COMPLEX, modes=6)
-    got = []
-    threads = [threading.Thread(target=lambda: got.extend(
-        qdm.matrix_pencil(COMPLEX, modes=6) for _ in range(20))) for _ in range(8)]
-    for th in threads:
-        th.start()
-    for th in threads:
-        th.join()
-    assert len(got) == 160
+    with ThreadPoolExecutor(8) as pool:
+        got = list(pool.map(lambda _: qdm.matrix_pencil(COMPLEX, modes=6), range(160)))
     assert all(np.array_equal(r.frequency, want.frequency) and r.mse == want.mse for r in got)

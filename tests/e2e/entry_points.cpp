@@ -1,13 +1,8 @@
-// The argument checks of the fourteen analysis exports as the host sees them:
-// each row is one argument set and the internal code it must give (0: the
-// checks pass), each integer walked through 0, 1, the check limits, 2^30 and
-// the ends of the 32-bit range. A failing set gives its host code, resizes
-// only to empty the outputs, zeroes the out doubles, leaves the MDL result.
-// A passing set asks for the documented resizes; its last resize is failed
-// (host error 3), so the length is seen without being allocated and the
-// failed-resize path shows (two exports keep their outputs, the others empty
-// them). Under UBSan this also shows that no size is computed from an
-// argument before it is checked.
+// Each row is one argument set of the fourteen analysis exports and the internal code it
+// must give (0: the checks pass); integers walk 0, 1, the limits, 2^30 and the 32-bit ends.
+// A failing set gives its host code, only empties the outputs, zeroes the out doubles and
+// leaves the MDL result. A passing set asks for the documented resizes, the last one failed
+// (host error 3): two exports keep their outputs, the others empty them.
 #include <gtest/gtest.h>
 
 #include <climits>
@@ -23,8 +18,7 @@ namespace {
 
 using namespace qdmtest;
 
-constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
-constexpr double kInf = std::numeric_limits<double>::infinity();
+constexpr double kNaN = std::numeric_limits<double>::quiet_NaN(), kInf = INFINITY;
 constexpr int32_t kMin = INT32_MIN, kMax = INT32_MAX, k30 = INT32_C(1) << 30;
 
 struct Row {
@@ -38,40 +32,38 @@ constexpr Family P = Family::kProny, V = Family::kCovariance, R = Family::kPcar,
                  L = Family::kPencil, M = Family::kMdl, S = Family::kCovSpectrum,
                  Q = Family::kPcarSpectrum;
 
-// n = 12 bounds every order by floor(24/3) = 8; n = 13 keeps 8, n = 14 gives 9. The integers
-// in argument order: Prony, covariance n, p; PCAR n, p, components; pencil n, L, M; MDL n, L,
-// minOrder; spectra n, p, m (and k). p = 0 passes the covariance spectrum's checks (the
-// estimator refuses it).
+// n = 12 bounds every order by floor(24/3) = 8; n = 13 keeps 8, n = 14 gives 9. p = 0 passes
+// the covariance spectrum's checks (the estimator refuses it).
 const Row kRows[] = {
-    {P, 0, 2, 0, 0, 1, 1}, {P, 0, 0, 0, 0, 1, 1},
-    {P, 1, 1, 0, 0, 1, 12}, {P, 12, kMin, 0, 0, 1, 12}, {P, 12, 0, 0, 0, 1, 12},
-    {P, 12, 1, 0, 0, 1, 0}, {P, 12, 8, 0, 0, 1, 0}, {P, 12, 9, 0, 0, 1, 12},
-    {P, 13, 9, 0, 0, 1, 12}, {P, 14, 9, 0, 0, 1, 0}, {P, 12, kMax, 0, 0, 1, 12},
-    {P, 12, 2, 0, 0, 0, 18}, {P, 12, 2, 0, 0, -kInf, 18}, {P, 12, 0, 0, 0, 0, 12},
-    {P, 12, 2, 0, 0, kNaN, 0}, {P, 12, 2, 0, 0, kInf, 0}, {V, 0, 2, 0, 0, 1, 1},
-    {V, 1, 1, 0, 0, 1, 12}, {V, 12, kMin, 0, 0, 1, 12}, {V, 12, 0, 0, 0, 1, 12},
-    {V, 12, 1, 0, 0, 1, 0}, {V, 12, 8, 0, 0, 1, 0}, {V, 12, 9, 0, 0, 1, 12},
-    {V, 13, 9, 0, 0, 1, 12}, {V, 14, 9, 0, 0, 1, 0}, {V, 12, kMax, 0, 0, 1, 12},
-    {R, 0, 4, 2, 0, 1, 1}, {R, 1, 0, 1, 0, 1, 13}, {R, 1, 1, 1, 0, 1, 11},
-    {R, 12, kMin, 2, 0, 1, 11}, {R, 12, 0, 1, 0, 1, 13}, {R, 12, 0, 0, 0, 1, 12},
-    {R, 12, 8, 2, 0, 1, 0}, {R, 12, 9, 2, 0, 1, 11}, {R, 12, kMax, 2, 0, 1, 11},
-    {R, 12, 9, 0, 0, 1, 11}, {R, 12, 4, kMin, 0, 1, 12}, {R, 12, 4, 0, 0, 1, 12},
-    {R, 12, 4, 1, 0, 1, 0}, {R, 12, 4, 4, 0, 1, 0}, {R, 12, 4, 5, 0, 1, 13},
-    {R, 12, 4, kMax, 0, 1, 13}, {L, 0, 4, 2, 0, 1, 1}, {L, 1, 0, 1, 0, 1, 13},
-    {L, 12, kMin, 2, 0, 1, 11}, {L, 12, 0, 1, 0, 1, 13}, {L, 12, 8, 2, 0, 1, 0},
-    {L, 12, 9, 2, 0, 1, 11}, {L, 12, kMax, 2, 0, 1, 11}, {L, 12, 4, kMin, 0, 1, 12},
-    {L, 12, 4, 0, 0, 1, 12}, {L, 12, 4, 1, 0, 1, 0}, {L, 12, 4, 4, 0, 1, 0},
-    {L, 12, 4, 5, 0, 1, 13}, {L, 12, 4, kMax, 0, 1, 13}, {L, 12, 4, 2, 0, 0, 18},
-    {L, 12, 4, 5, 0, -1, 13}, {L, 12, 4, 2, 0, -kInf, 18}, {L, 12, 4, 2, 0, kNaN, 0},
-    {M, 0, 4, 1, 0, 1, 1}, {M, 1, 1, 1, 0, 1, 15}, {M, 12, 4, kMin, 0, 1, 14},
-    {M, 12, 4, 0, 0, 1, 14}, {M, 12, 0, 0, 0, 1, 14}, {M, 12, 1, 1, 0, 1, 15},
-    {M, 12, 2, 3, 0, 1, 15}, {M, 12, kMin, 1, 0, 1, 15}, {M, 12, 8, 1, 0, 1, 0},
-    {M, 12, 9, 1, 0, 1, 15}, {M, 12, kMax, 1, 0, 1, 15}, {M, 12, 8, 7, 0, 1, 0},
-    {M, 12, 8, 8, 0, 1, 15}, {M, 12, 4, kMax, 0, 1, 15}, {S, 0, 2, 16, 0, 1, 1},
-    {S, 1, 0, 16, 0, 1, 0}, {S, 1, 1, 16, 0, 1, 12}, {S, 12, kMin, 16, 0, 1, 12},
-    {S, 12, 0, 16, 0, 1, 0}, {S, 12, 8, 16, 0, 1, 0}, {S, 12, 9, 16, 0, 1, 12},
-    {S, 12, kMax, 16, 0, 1, 12}, {S, 12, 2, kMin, 0, 1, 17}, {S, 12, 2, 0, 0, 1, 17},
-    {S, 12, 2, 1, 0, 1, 17}, {S, 12, 2, 2, 0, 1, 0}, {S, 12, 2, 3, 0, 1, 0}, {S, 12, 2, 5, 0, 1, 0},
+    {P, 0, 2, 0, 0, 1, 1}, {P, 0, 0, 0, 0, 1, 1}, {P, 1, 1, 0, 0, 1, 12},
+    {P, 12, kMin, 0, 0, 1, 12}, {P, 12, 0, 0, 0, 1, 12}, {P, 12, 1, 0, 0, 1, 0},
+    {P, 12, 8, 0, 0, 1, 0}, {P, 12, 9, 0, 0, 1, 12}, {P, 13, 9, 0, 0, 1, 12},
+    {P, 14, 9, 0, 0, 1, 0}, {P, 12, kMax, 0, 0, 1, 12}, {P, 12, 2, 0, 0, 0, 18},
+    {P, 12, 2, 0, 0, -kInf, 18}, {P, 12, 0, 0, 0, 0, 12}, {P, 12, 2, 0, 0, kNaN, 0},
+    {P, 12, 2, 0, 0, kInf, 0}, {V, 0, 2, 0, 0, 1, 1}, {V, 1, 1, 0, 0, 1, 12},
+    {V, 12, kMin, 0, 0, 1, 12}, {V, 12, 0, 0, 0, 1, 12}, {V, 12, 1, 0, 0, 1, 0},
+    {V, 12, 8, 0, 0, 1, 0}, {V, 12, 9, 0, 0, 1, 12}, {V, 13, 9, 0, 0, 1, 12},
+    {V, 14, 9, 0, 0, 1, 0}, {V, 12, kMax, 0, 0, 1, 12}, {R, 0, 4, 2, 0, 1, 1},
+    {R, 1, 0, 1, 0, 1, 13}, {R, 1, 1, 1, 0, 1, 11}, {R, 12, kMin, 2, 0, 1, 11},
+    {R, 12, 0, 1, 0, 1, 13}, {R, 12, 0, 0, 0, 1, 12}, {R, 12, 8, 2, 0, 1, 0},
+    {R, 12, 9, 2, 0, 1, 11}, {R, 12, kMax, 2, 0, 1, 11}, {R, 12, 9, 0, 0, 1, 11},
+    {R, 12, 4, kMin, 0, 1, 12}, {R, 12, 4, 0, 0, 1, 12}, {R, 12, 4, 1, 0, 1, 0},
+    {R, 12, 4, 4, 0, 1, 0}, {R, 12, 4, 5, 0, 1, 13}, {R, 12, 4, kMax, 0, 1, 13},
+    {L, 0, 4, 2, 0, 1, 1}, {L, 1, 0, 1, 0, 1, 13}, {L, 12, kMin, 2, 0, 1, 11},
+    {L, 12, 0, 1, 0, 1, 13}, {L, 12, 8, 2, 0, 1, 0}, {L, 12, 9, 2, 0, 1, 11},
+    {L, 12, kMax, 2, 0, 1, 11}, {L, 12, 4, kMin, 0, 1, 12}, {L, 12, 4, 0, 0, 1, 12},
+    {L, 12, 4, 1, 0, 1, 0}, {L, 12, 4, 4, 0, 1, 0}, {L, 12, 4, 5, 0, 1, 13},
+    {L, 12, 4, kMax, 0, 1, 13}, {L, 12, 4, 2, 0, 0, 18}, {L, 12, 4, 5, 0, -1, 13},
+    {L, 12, 4, 2, 0, -kInf, 18}, {L, 12, 4, 2, 0, kNaN, 0}, {M, 0, 4, 1, 0, 1, 1},
+    {M, 1, 1, 1, 0, 1, 15}, {M, 12, 4, kMin, 0, 1, 14}, {M, 12, 4, 0, 0, 1, 14},
+    {M, 12, 0, 0, 0, 1, 14}, {M, 12, 1, 1, 0, 1, 15}, {M, 12, 2, 3, 0, 1, 15},
+    {M, 12, kMin, 1, 0, 1, 15}, {M, 12, 8, 1, 0, 1, 0}, {M, 12, 9, 1, 0, 1, 15},
+    {M, 12, kMax, 1, 0, 1, 15}, {M, 12, 8, 7, 0, 1, 0}, {M, 12, 8, 8, 0, 1, 15},
+    {M, 12, 4, kMax, 0, 1, 15}, {S, 0, 2, 16, 0, 1, 1}, {S, 1, 0, 16, 0, 1, 0},
+    {S, 1, 1, 16, 0, 1, 12}, {S, 12, kMin, 16, 0, 1, 12}, {S, 12, 0, 16, 0, 1, 0},
+    {S, 12, 8, 16, 0, 1, 0}, {S, 12, 9, 16, 0, 1, 12}, {S, 12, kMax, 16, 0, 1, 12},
+    {S, 12, 2, kMin, 0, 1, 17}, {S, 12, 2, 0, 0, 1, 17}, {S, 12, 2, 1, 0, 1, 17},
+    {S, 12, 2, 2, 0, 1, 0}, {S, 12, 2, 3, 0, 1, 0}, {S, 12, 2, 5, 0, 1, 0},
     {S, 12, 2, 512, 0, 1, 0}, {S, 12, 2, 513, 0, 1, 0}, {S, 12, 2, k30 - 1, 0, 1, 0},
     {S, 12, 2, k30, 0, 1, 0}, {S, 12, 2, k30 + 1, 0, 1, 17}, {S, 12, 2, kMax, 0, 1, 17},
     {S, 12, 2, 16, 0, 0, 18}, {S, 12, 2, 1, 0, 0, 17}, {S, 12, 9, 1, 0, 0, 12},
