@@ -307,25 +307,17 @@ TEST(Estimators, AnswersAgreeWithTheirOracles) {
       EXPECT_LE(best, k.tol) << z;
     }
     if (k.count >= 0) { EXPECT_EQ(int32_t(modes.size()), k.count); }
-    if (!k.modes.empty()) {
-      ASSERT_EQ(modes.size(), k.modes.size());
-      std::vector<bool> used(modes.size(), false);
-      for (size_t i = 0; i < k.modes.size(); ++i) {
-        const Mode& w = k.modes[i];
-        auto dist = [&](const Mode& g) {
-          return std::hypot(g.freq - w.freq, spectrum ? 0.0 : g.damp - w.damp);
-        };
-        size_t j = k.ordered ? i : modes.size();
-        for (size_t g = 0; !k.ordered && g < modes.size(); ++g) {  // nearest unused mode
-          if (!used[g] && (j == modes.size() || dist(modes[g]) < dist(modes[j]))) j = g;
-        }
-        used[j] = true;
-        const Mode& g = modes[j];
-        EXPECT_NEAR(g.amp, w.amp, k.tol * std::max(1.0, w.amp)) << "mode " << i;
-        EXPECT_NEAR(std::remainder(g.phase - w.phase, 2 * kPi), 0.0, k.tol) << "mode " << i;
-        if (!spectrum) { EXPECT_NEAR(g.damp, w.damp, k.tol) << "mode " << i; }
-        EXPECT_NEAR(g.freq, w.freq, k.tol * std::max(1.0, std::abs(w.freq))) << "mode " << i;
-      }
+    std::vector<Mode> want = k.modes;  // matched in order of frequency unless ordered
+    const auto byFreq = [](const Mode& u, const Mode& v) { return u.freq < v.freq; };
+    if (!k.ordered) std::sort(want.begin(), want.end(), byFreq);
+    if (!k.ordered) std::sort(modes.begin(), modes.end(), byFreq);
+    if (!want.empty()) { ASSERT_EQ(modes.size(), want.size()); }
+    for (size_t i = 0; i < want.size(); ++i) {
+      const Mode &g = modes[i], &w = want[i];
+      EXPECT_NEAR(g.amp, w.amp, k.tol * std::max(1.0, w.amp)) << "mode " << i;
+      EXPECT_NEAR(std::remainder(g.phase - w.phase, 2 * kPi), 0.0, k.tol) << "mode " << i;
+      if (!spectrum) { EXPECT_NEAR(g.damp, w.damp, k.tol) << "mode " << i; }
+      EXPECT_NEAR(g.freq, w.freq, k.tol * std::max(1.0, std::abs(w.freq))) << "mode " << i;
     }
     if (x.family == Family::kPencil && k.flag == 0) {  // mse: the modes' misfit to the record
       double sum = 0;

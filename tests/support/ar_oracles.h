@@ -70,15 +70,10 @@ inline std::vector<double> SpectrumDb(const std::vector<C>& a, int32_t L) {
   return db;
 }
 
-// Solves the square system G y = y in place (Gaussian elimination, partial pivoting).
+// Solves the Hermitian positive definite G y = y in place (elimination needs no pivots).
 inline void GaussSolve(std::vector<CL>& G, std::vector<CL>& y) {
   const int m = int(y.size());
   for (int c = 0; c < m; ++c) {
-    int piv = c;
-    for (int r = c + 1; r < m; ++r)
-      piv = std::abs(G[r * m + c]) > std::abs(G[piv * m + c]) ? r : piv;
-    for (int k = 0; k < m; ++k) std::swap(G[c * m + k], G[piv * m + k]);
-    std::swap(y[c], y[piv]);
     for (int r = c + 1; r < m; ++r) {
       const CL f = G[r * m + c] / G[c * m + c];
       for (int k = c; k < m; ++k) G[r * m + k] -= f * G[c * m + k];
