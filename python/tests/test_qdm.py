@@ -18,8 +18,7 @@ _t = np.arange(96)
 REAL = (np.cos(2 * np.pi * 0.12 * _t) * np.exp(-0.01 * _t) + 0.5 * np.cos(0.62 * np.pi * _t + 1)
         + 0.05 * np.random.default_rng(7).standard_normal(96))
 
-# A second handle with no declared prototypes: every argument is wrapped here
-# by hand, so a slip in the package's declarations shows as a mismatch.
+# A handle without prototypes, arguments wrapped by hand: a slip in the package's shows.
 RAW = ctypes.CDLL(qdm._lib.lib._name)
 
 
@@ -150,9 +149,7 @@ BAD = [  # call, exception, library code (None: refused before the library)
 
 @pytest.mark.parametrize("call,exc,code", BAD, ids=range(len(BAD)))
 def test_bad_input_raises_with_the_library_code_and_text(call, exc, code):
-    with pytest.raises(exc) as info:
-        call()
-    e = info.value
+    e = pytest.raises(exc, call).value
     assert isinstance(e, qdm.Error) and e.code == code
     if code is not None:
         assert isinstance(e, ValueError) and e.text == qdm.status_text(code)

@@ -22,8 +22,8 @@ constexpr double kNaN = NAN, kPi = 3.14159265358979323846;
 struct Case {
   std::string name;
   Family family;
-  bool cx;
-  std::vector<C> x;  // a real export takes the real parts
+  bool cx;           // complex export, else a real one on the real parts of x
+  std::vector<C> x;
   Scalars s;
   uint8_t flag = 0;
   int32_t status = 0;
@@ -32,11 +32,9 @@ struct Case {
   std::vector<Mode> modes;       // exactly these modes
   bool ordered = false;          // modes in this order, else matched by frequency and damping
   double tol = 1e-8;             // coefficients, poles, modes
-  double extra = kNaN;           // noise variance, mse or amplitude-fit error
-  double extraTol = 1e-20;
+  double extra = kNaN, extraTol = 1e-20;  // noise variance, mse or amplitude-fit error
   std::vector<C> spectrumOf;     // the AR vector whose spectrum is expected
-  int32_t count = -1;            // modes reported
-  int32_t orderLo = -1, orderHi = -1;  // MDL order range
+  int32_t count = -1, orderLo = -1, orderHi = -1;  // modes reported, MDL order range
 };
 
 std::vector<C> FromPredictor(std::vector<C> w) {
@@ -45,14 +43,13 @@ std::vector<C> FromPredictor(std::vector<C> w) {
 }
 
 double MeanSquaredResidual(const std::vector<C>& x, const std::vector<C>& a) {
-  const size_t p = a.size() - 1;
   double sum = 0;
-  for (size_t t = p; t < x.size(); ++t) {
+  for (size_t t = a.size() - 1; t < x.size(); ++t) {
     C e = 0;
-    for (size_t k = 0; k <= p; ++k) e += a[k] * x[t - k];
+    for (size_t k = 0; k < a.size(); ++k) e += a[k] * x[t - k];
     sum += std::norm(e);
   }
-  return sum / double(x.size() - p);
+  return sum / double(x.size() + 1 - a.size());
 }
 
 std::vector<C> Poles(const std::vector<Mode>& modes, double fs, bool pairs) {
@@ -87,12 +84,10 @@ std::vector<Case> Cases() {
                    kCovPsd = Family::kCovSpectrum, kPcarPsd = Family::kPcarSpectrum;
   V marple, marpleRe, A, b;
   std::ifstream in(std::filesystem::path(__FILE__).parent_path() / "../data/marple64.csv");
-  double re, im;
-  char comma;
-  while (in >> re >> comma >> im) marple.emplace_back(re, im), marpleRe.emplace_back(re);
+  double re, im;  // "re,im" rows
+  for (char comma; in >> re >> comma >> im;) marple.emplace_back(re, im), marpleRe.emplace_back(re);
   const double kFs = 1000.0;
 
-  // ---- covariance AR --------------------------------------------------------------------
   const V realPoles = {std::polar(0.97, 0.6), std::polar(0.97, -0.6), C(0.8)};
   const V cxPoles = {std::polar(.95, .3), std::polar(.7, -1.2), std::polar(.99, 2.5), {-.6, .1}};
   const V aReal = MonicFromRoots(realPoles), aCx = MonicFromRoots(cxPoles);
@@ -123,7 +118,6 @@ std::vector<Case> Cases() {
     }
   }
 
-  // ---- principal-component AR --------------------------------------------------------------
   // Noise-free, p = 9 above the rank: the signal poles are among the roots.
   const Modes cxUndamped = {{1.0, 0.4, 0.0, 60.0}, {0.7, -2.0, 0.0, -185.0}};
   const Modes cosUndamped = {{1.0, 0.2, 0.0, 75.0}, {0.5, -0.9, 0.0, 260.0}};
@@ -142,7 +136,6 @@ std::vector<Case> Cases() {
         {.coef = FromPredictor(LeastSquares(A, 116, 6, b)), .tol = 1e-9});
   }
 
-  // ---- Prony -----------------------------------------------------------------------------
   const Modes cx3 = {{1.0, 0.3, -0.01, 20.0}, {0.5, -2.0, -0.05, -55.0}, {2.0, 1.2, 0.0, 87.5}};
   const Modes tone = {{0.6, -0.9, 0.0, 1000.0}};
   const V toneX = Signal(tone, 48, 48000.0, true);
@@ -182,7 +175,6 @@ std::vector<Case> Cases() {
     add("noise, M > r", kPencil, cx, noise30, {30, 20, 14, 0, kFs}, {.count = 10});
   }
 
-  // ---- MDL -------------------------------------------------------------------------------
   V xc = Signal({{1.0, 0.5, -0.01, 50.0}, {0.6, -2.2, -0.03, -130.0}, {0.4, 1.3, 0, 275.0}}, 64,
                 kFs);
   V xr = Signal({{1.0, 0.3, -0.01, 70.0}, {0.7, 1.9, -0.02, 240.0}}, 64, kFs, true);
@@ -218,9 +210,8 @@ std::vector<Case> Cases() {
       {.extra = 0, .spectrumOf = aReal});
 
   // ---- PCAR spectra: modes nearest the unit circle, nearest first ------------------------
-  // With k = p the coefficients are exact, but the last pick repeats the first
-  // root (chosen roots are masked with the largest distance): spectrum only.
-  // With p above the rank the signal roots are exact and the nearest ones.
+  // k = p: exact coefficients, but the last pick repeats the first root (chosen roots are
+  // masked with the largest distance): spectrum only. p above the rank: exact signal roots.
   const Modes cx3u = {{1.0, 0.4, 0.0, 7.3}, {0.6, -1.2, 0.0, -21.9}, {0.3, 2.5, 0.0, 33.4}};
   const V cx3uX = Signal(cx3u, 64, 100.0);
   add("3 exponentials, k = p", kPcarPsd, true, cx3uX, {64, 3, 256, 3, 100.0},
@@ -273,10 +264,9 @@ TEST(Estimators, AnswersAgreeWithTheirOracles) {
         ASSERT_EQ(roots.size(), size_t(s.a));
         EXPECT_EQ(coef[0], C(1));
         for (const C& z : roots) {  // every root is a zero of the returned polynomial
-          C v = 0;
-          double scale = 0;
+          C v = 0, scale = 0;
           for (const C& a : coef) v = v * z + a, scale = scale * std::abs(z) + std::abs(a);
-          EXPECT_LE(std::abs(v), 1e-9 * scale) << z;
+          EXPECT_LE(std::abs(v), 1e-9 * scale.real()) << z;
         }
         break;
       case Family::kProny:
@@ -335,9 +325,8 @@ TEST(Estimators, AnswersAgreeWithTheirOracles) {
       EXPECT_TRUE(std::isnan(s.fs) ? std::isnan(c.d[0]) && std::isnan(c.d[1])
                                    : c.d[0] == -s.fs / 2 && c.d[1] == s.fs / N);
       EXPECT_NEAR(*std::max_element(db.begin(), db.end()), 0.0, 1e-12);
-      for (int j = 1; !x.complexData && j < N / 2; ++j) {  // real data: symmetric about DC at N/2
+      for (int j = 1; !x.complexData && j < N / 2; ++j)  // real data: symmetric about N/2
         EXPECT_NEAR(db[N / 2 - j], db[N / 2 + j], 1e-9) << j;
-      }
       if (!k.spectrumOf.empty()) {  // coefficients beyond N replace earlier ones in their slot
         std::vector<C> onGrid(std::min<size_t>(k.spectrumOf.size(), size_t(N)));
         for (size_t i = 0; i < k.spectrumOf.size(); ++i) onGrid[i % size_t(N)] = k.spectrumOf[i];
