@@ -15,8 +15,7 @@ using C = std::complex<double>;
 using CL = std::complex<long double>;
 constexpr long double kTwoPiL = 6.283185307179586476925286766559L;
 
-// x[t] += amp e^{i phase} z^t, z = e^{damp + i 2 pi freq / fs}; the real part
-// of a sum of modes is the sum of the damped cosines amp e^{damp t} cos(...).
+// x[t] += amp e^{i phase} z^t, z = e^{damp + i 2 pi freq / fs} (re: the damped cosines).
 struct Mode {
   double amp, phase, damp, freq;  // phase in radians, damp per sample, freq in Hz
 };
@@ -28,11 +27,9 @@ inline std::vector<C> Signal(const std::vector<Mode>& modes, int n, double fs, b
   for (const Mode& m : modes) {
     const CL z = std::exp(CL(m.damp, kTwoPiL * m.freq / fs)),
              c = std::polar<long double>(m.amp, m.phase);
-    for (int t = 0; t < n; ++t) {
-      const CL v = c * std::pow(z, (long double)t);
-      x[size_t(t)] += C(double(v.real()), re ? 0.0 : double(v.imag()));
-    }
+    for (int t = 0; t < n; ++t) x[size_t(t)] += C(c * std::pow(z, (long double)t));
   }
+  for (C& v : x) v = re ? C(v.real()) : v;
   return x;
 }
 
@@ -71,30 +68,9 @@ inline std::vector<double> SpectrumDb(const std::vector<C>& a, int32_t L) {
   return db;
 }
 
-// Solves the square system G y = y in place (Gaussian elimination, partial pivoting).
-inline void GaussSolve(std::vector<CL>& G, std::vector<CL>& y) {
-  const int m = int(y.size());
-  for (int c = 0; c < m; ++c) {
-    int piv = c;
-    for (int r = c + 1; r < m; ++r)
-      if (std::abs(G[r * m + c]) > std::abs(G[piv * m + c])) piv = r;
-    for (int k = 0; k < m; ++k) std::swap(G[c * m + k], G[piv * m + k]);
-    std::swap(y[c], y[piv]);
-    for (int r = c + 1; r < m; ++r) {
-      const CL f = G[r * m + c] / G[c * m + c];
-      for (int k = c; k < m; ++k) G[r * m + k] -= f * G[c * m + k];
-      y[r] -= f * y[c];
-    }
-  }
-  for (int r = m - 1; r >= 0; --r) {
-    for (int k = r + 1; k < m; ++k) y[r] -= G[r * m + k] * y[k];
-    y[r] /= G[r * m + r];
-  }
-}
-
-// Least squares of a full-rank A (row-major rows x cols) through B = A when
-// tall, B = A^H when wide: (B^H B) y = B^H b and w = y, or (B^H B) y = b and w = B y
-// (the minimum-norm solution).
+// Least squares of a full-rank A (rows x cols) with B = A when tall, A^H when wide:
+// (B^H B) y = B^H b and w = y, or (B^H B) y = b and w = B y (minimum norm). B^H B is
+// Hermitian positive definite: elimination needs no pivots.
 inline std::vector<C> LeastSquares(const std::vector<C>& A, int rows, int cols,
                                    const std::vector<C>& b) {
   const bool tall = rows >= cols;
@@ -108,7 +84,17 @@ inline std::vector<C> LeastSquares(const std::vector<C>& A, int rows, int cols,
     }
     if (!tall) y[i] = CL(b[i]);
   }
-  GaussSolve(G, y);
+  for (int c = 0; c < m; ++c) {
+    for (int r = c + 1; r < m; ++r) {
+      const CL f = G[r * m + c] / G[c * m + c];
+      for (int k = c; k < m; ++k) G[r * m + k] -= f * G[c * m + k];
+      y[r] -= f * y[c];
+    }
+  }
+  for (int r = m - 1; r >= 0; --r) {
+    for (int k = r + 1; k < m; ++k) y[r] -= G[r * m + k] * y[k];
+    y[r] /= G[r * m + r];
+  }
   std::vector<C> w(static_cast<size_t>(cols));
   for (int k = 0; k < cols; ++k) {
     CL s = tall ? y[k] : 0;

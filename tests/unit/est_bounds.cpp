@@ -1,9 +1,8 @@
-// What the exports cannot show: work memory carries slack, so a write one past
-// a block inside the library goes unseen end to end. Here the routines that
-// fill caller blocks write into exact blocks followed by sentinels; and the
-// window modes, which the drivers never select, are reached directly.
+// Work memory carries slack, so a write one past a block goes unseen end to end: here the
+// block fillers write into exact blocks before sentinels, and unused window modes are reached.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <vector>
 
 #include "estimation/estimation.h"
@@ -14,9 +13,7 @@ constexpr double kGuard = -777.0;
 
 template <typename T>
 bool GuardIntact(const std::vector<T>& v, size_t used) {
-  for (size_t i = used; i < v.size(); ++i)
-    if (v[i] != T(kGuard)) return false;
-  return true;
+  return std::all_of(v.begin() + used, v.end(), [](T e) { return e == T(kGuard); });
 }
 
 TEST(Bounds, PredictionBlocksAndRootSelectionWriteExactlyTheirCells) {
@@ -44,8 +41,7 @@ TEST(Bounds, PredictionBlocksAndRootSelectionWriteExactlyTheirCells) {
   }
 }
 
-// Modes 0, 1 and 2 window the coefficients before the transform; outside
-// 0..3 the evaluator refuses.
+// Modes 0, 1 and 2 window the coefficients; outside 0..3 the evaluator refuses.
 TEST(Bounds, EveryWindowModeIsAccepted) {
   for (int32_t mode = -1; mode <= 4; ++mode) {
     std::vector<double> a = {1.0, -0.5, 0.25}, values(8);
