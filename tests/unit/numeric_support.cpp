@@ -1,11 +1,6 @@
-// Numeric support against oracles that share no code with it, summed in long
-// double: A = U diag(S) V^H with orthonormal factors, the normal equations and
-// the row space of A for least squares (minimum norm), the Moore-Penrose
-// conditions, A^H A = R^H R for the QR fold, A V = V diag(w) for the
-// eigensolvers, plain loops for products and transposes, and the eigenvalues of
-// the companion matrix for the root finder. One table of shapes (tall, square,
-// wide, rank deficient) runs for real and complex data. Then sorting, extremes
-// and the complex scalars.
+// Oracles summed in long double that share no code with the library: A = U S V^H, normal
+// equations and row space (minimum norm), Moore-Penrose, A^H A = R^H R, A V = V diag(w),
+// plain loops, companion eigenvalues for the roots. One shape table, real and complex.
 
 #include <gtest/gtest.h>
 
@@ -14,10 +9,8 @@
 #include <cmath>
 #include <complex>
 #include <functional>
-#include <limits>
 #include <numbers>
 #include <random>
-#include <type_traits>
 #include <vector>
 
 #include "numeric/lapack_boundary.h"
@@ -28,15 +21,12 @@ namespace {
 
 using Cx = std::complex<double>;
 constexpr double kEps = 2.220446049250313e-16;
-template <typename T>
-constexpr bool kIsCx = !std::is_same_v<T, double>;
+template <typename T> constexpr bool kIsCx = !std::is_same_v<T, double>;
 
 long double Widen(double v) { return v; }
 std::complex<long double> Widen(Cx v) { return {v.real(), v.imag()}; }
-double Narrow(long double v) { return static_cast<double>(v); }
-Cx Narrow(std::complex<long double> v) {
-  return {static_cast<double>(v.real()), static_cast<double>(v.imag())};
-}
+double Narrow(long double v) { return double(v); }
+Cx Narrow(std::complex<long double> v) { return {double(v.real()), double(v.imag())}; }
 double Conj(double v) { return v; }
 Cx Conj(Cx v) { return std::conj(v); }
 
@@ -57,13 +47,12 @@ std::vector<T> Random(int64_t rows, int64_t cols, uint32_t seed) {
 template <typename T>
 std::vector<T> Prod(const T* A, const T* B, int64_t m, int64_t k, int64_t n) {
   std::vector<T> c(static_cast<size_t>(m * n));
-  for (int64_t i = 0; i < m; ++i) {
+  for (int64_t i = 0; i < m; ++i)
     for (int64_t j = 0; j < n; ++j) {
       decltype(Widen(T())) s = 0;
       for (int64_t l = 0; l < k; ++l) s += Widen(A[i * k + l]) * Widen(B[l * n + j]);
       c[static_cast<size_t>(i * n + j)] = Narrow(s);
     }
-  }
   return c;
 }
 
@@ -71,62 +60,47 @@ std::vector<T> Prod(const T* A, const T* B, int64_t m, int64_t k, int64_t n) {
 template <typename T>
 std::vector<T> Adj(const T* A, int64_t m, int64_t n) {
   std::vector<T> t(static_cast<size_t>(m * n));
-  for (int64_t i = 0; i < m; ++i) {
+  for (int64_t i = 0; i < m; ++i)
     for (int64_t j = 0; j < n; ++j) t[static_cast<size_t>(j * m + i)] = Conj(A[i * n + j]);
-  }
   return t;
 }
 
-template <typename T>
-double Norm(const std::vector<T>& a) {
-  long double s = 0;
-  for (const T& v : a) s += std::norm(Widen(v));
-  return static_cast<double>(std::sqrt(s));
-}
 template <typename T>
 double Diff(const std::vector<T>& a, const std::vector<T>& b) {
   long double s = 0;
   for (size_t i = 0; i < a.size(); ++i) s += std::norm(Widen(a[i]) - Widen(b[i]));
   return static_cast<double>(std::sqrt(s));
 }
+template <typename T>
+double Norm(const std::vector<T>& a) { return Diff(a, std::vector<T>(a.size())); }
 
 // ||Q^H Q - I||_F for the m-by-c Q.
 template <typename T>
 double OrthError(const T* Q, int64_t m, int64_t c) {
-  const auto qh = Adj(Q, m, c);
-  auto g = Prod(qh.data(), Q, c, m, c);
+  auto g = Prod(Adj(Q, m, c).data(), Q, c, m, c);
   for (int64_t i = 0; i < c; ++i) g[static_cast<size_t>(i * c + i)] -= T(1.0);
   return Norm(g);
 }
 
-struct Shape {
-  int32_t m, n, rank, nrhs;
-};
+struct Shape { int32_t m, n, rank, nrhs; };
 
 const Shape kShapes[] = {
     {1, 1, 1, 1},   {5, 5, 5, 2},  {6, 6, 3, 1},   {7, 5, 5, 2},   {10, 4, 4, 3},
     {5, 1, 1, 4},   {12, 5, 2, 2}, {1, 6, 1, 1},   {3, 7, 3, 2},   {8, 12, 3, 2},
     {22, 42, 22, 1}, {40, 22, 22, 2},
-    // several row blocks of the QR fold, full rank and deficient
-    {2000, 40, 40, 2}, {1500, 40, 12, 2},
+    {2000, 40, 40, 2}, {1500, 40, 12, 2},  // several row blocks of the QR fold
     // either side of the width where a real solve leaves DGELSD
     {1, 739, 1, 2}, {1, 740, 1, 2}, {2, 803, 2, 1},
 };
 
-::testing::Message Trace(const Shape& s) {
-  return ::testing::Message() << s.m << "x" << s.n << " rank " << s.rank << " nrhs " << s.nrhs;
-}
-
-// A = F Q of the shape's rank, the `rank` rows of Q orthonormal: they span the
-// row space of A.
-template <typename T>
-struct Problem { std::vector<T> A, Q; };
+// A = F Q, the `rank` rows of Q orthonormal (Gram-Schmidt): they span the row space of A.
+template <typename T> struct Problem { std::vector<T> A, Q; };
 template <typename T>
 Problem<T> MakeProblem(const Shape& s, uint32_t seed) {
   Problem<T> p{{}, Random<T>(s.rank, s.n, seed)};
   for (int32_t i = 0; i < s.rank; ++i) {
     T* qi = p.Q.data() + int64_t{i} * s.n;
-    for (int32_t j = 0; j < i; ++j) {  // Gram-Schmidt
+    for (int32_t j = 0; j < i; ++j) {
       const T* qj = p.Q.data() + int64_t{j} * s.n;
       decltype(Widen(T())) d = 0;
       for (int32_t l = 0; l < s.n; ++l) d += Widen(Conj(qj[l])) * Widen(qi[l]);
@@ -135,34 +109,10 @@ Problem<T> MakeProblem(const Shape& s, uint32_t seed) {
     const double norm = Norm(std::vector<T>(qi, qi + s.n));
     for (int32_t l = 0; l < s.n; ++l) qi[l] /= norm;
   }
-  const auto f = Random<T>(s.m, s.rank, seed + 1);
-  p.A = Prod(f.data(), p.Q.data(), s.m, s.rank, s.n);
+  p.A = Prod(Random<T>(s.m, s.rank, seed + 1).data(), p.Q.data(), s.m, s.rank, s.n);
   return p;
 }
 
-// ||A^H (A X - B)|| scaled by ||A|| (||A|| ||X|| + ||B||) max(m, n) eps.
-template <typename T>
-double NormalEquationError(const std::vector<T>& A, int32_t m, int32_t n, const std::vector<T>& B,
-                           int32_t nrhs, const std::vector<T>& X) {
-  auto r = Prod(A.data(), X.data(), m, n, nrhs);
-  for (size_t i = 0; i < r.size(); ++i) r[i] -= B[i];
-  const auto ah = Adj(A.data(), m, n);
-  const double na = Norm(A);
-  return Norm(Prod(ah.data(), r.data(), n, m, nrhs)) /
-         (na * (na * Norm(X) + Norm(B)) * std::max(m, n) * kEps);
-}
-
-// Relative distance of X (n-by-nrhs) from the row space of A: zero exactly for
-// the minimum-norm solution.
-template <typename T>
-double RowSpaceDistance(const Problem<T>& p, int32_t r, int32_t n, const std::vector<T>& X,
-                        int32_t nrhs) {
-  const auto qx = Prod(p.Q.data(), X.data(), r, n, nrhs);
-  const auto qh = Adj(p.Q.data(), r, n);
-  return Diff(Prod(qh.data(), qx.data(), n, r, nrhs), X) / std::max(Norm(X), 1e-300);
-}
-
-// The real or the complex twin, by the element type of the first argument.
 template <typename R, typename X, typename P, typename... Args>
 StatusCode Twin(R real, X complex, P* first, Args... rest) {
   if constexpr (kIsCx<std::remove_const_t<P>>) return complex(first, rest...);
@@ -171,62 +121,73 @@ StatusCode Twin(R real, X complex, P* first, Args... rest) {
 
 const auto Svd = [](auto... a) { return Twin(SvdReal, SvdComplex, a...); };
 const auto SvdLeading = [](auto... a) { return Twin(SvdLeadingReal, SvdLeadingComplex, a...); };
-const auto SvdLeadingRight = [](auto... a) {
-  return Twin(SvdLeadingRightReal, SvdLeadingRightComplex, a...);
-};
+const auto SvdRight = [](auto... a) {
+  return Twin(SvdLeadingRightReal, SvdLeadingRightComplex, a...); };
 const auto QrReduce = [](auto... a) { return Twin(QrReduceReal, QrReduceComplex, a...); };
 const auto Pinv = [](auto... a) { return Twin(PseudoInverseReal, PseudoInverseComplex, a...); };
 const auto MatMul = [](auto... a) { return Twin(MatMulReal, MatMulComplex, a...); };
 const auto Transpose = [](auto... a) { return Twin(TransposeReal, ConjTransposeComplex, a...); };
 
-// The solves: DGELSD (real only), the pseudo-inverse solve (LeastSquaresPinvReal,
-// LeastSquaresComplex) and the truncated solve.
+// DGELSD (real only), the pseudo-inverse solves and the truncated solve.
 enum { kGelsd, kPinv, kTruncated };
 template <typename T>
 StatusCode Solve(int solver, const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X,
                  double rcond, int32_t keep) {
-  if constexpr (kIsCx<T>) {
-    if (solver == kTruncated) return LeastSquaresTruncatedComplex(A, m, n, B, nrhs, X, keep);
-    return LeastSquaresComplex(A, m, n, B, nrhs, X, rcond);
-  } else {
-    if (solver == kTruncated) return LeastSquaresTruncatedReal(A, m, n, B, nrhs, X, keep);
-    if (solver == kPinv) return LeastSquaresPinvReal(A, m, n, B, nrhs, X, rcond);
-    return LeastSquaresReal(A, m, n, B, nrhs, X, rcond);
-  }
+  if constexpr (kIsCx<T>)
+    return solver == kTruncated ? LeastSquaresTruncatedComplex(A, m, n, B, nrhs, X, keep)
+                                : LeastSquaresComplex(A, m, n, B, nrhs, X, rcond);
+  else if (solver == kTruncated) return LeastSquaresTruncatedReal(A, m, n, B, nrhs, X, keep);
+  else if (solver == kPinv) return LeastSquaresPinvReal(A, m, n, B, nrhs, X, rcond);
+  else return LeastSquaresReal(A, m, n, B, nrhs, X, rcond);
 }
-template <typename T>
-constexpr int kFirstSolver = kIsCx<T> ? kPinv : kGelsd;
+template <typename T> constexpr int kFirstSolver = kIsCx<T> ? kPinv : kGelsd;
 
-template <typename T>
-class Dense : public ::testing::Test {};
+template <typename T> class Dense : public ::testing::Test {};
 using Scalars = ::testing::Types<double, Cx>;
 TYPED_TEST_SUITE(Dense, Scalars);
 
-// ---- singular value decomposition ----------------------------------------------------------
+// The largest Moore-Penrose residual, scaled by its terms' size and max(m, n) eps.
+template <typename T>
+double MoorePenroseError(const std::vector<T>& A, const std::vector<T>& P, int32_t m, int32_t n) {
+  const auto ap = Prod(A.data(), P.data(), m, n, m), pa = Prod(P.data(), A.data(), n, m, n);
+  const double na = Norm(A), np = Norm(P);
+  return std::max({Diff(Prod(ap.data(), A.data(), m, m, n), A) / (na * na * np),
+                   Diff(Prod(pa.data(), P.data(), n, n, m), P) / (np * np * na),
+                   Diff(Adj(ap.data(), m, m), ap) / (na * np),
+                   Diff(Adj(pa.data(), n, n), pa) / (na * np)}) / (std::max(m, n) * kEps);
+}
 
-TYPED_TEST(Dense, SvdReconstructsAWithOrthonormalFactors) {
+// SVD, pseudo-inverse, the solves and the QR fold over the shape table.
+TYPED_TEST(Dense, ShapeTableIdentities) {
   using T = TypeParam;
   for (const Shape& s : kShapes) {
-    SCOPED_TRACE(Trace(s));
+    SCOPED_TRACE(::testing::Message() << s.m << "x" << s.n << " rank " << s.rank);
     const int32_t k = std::min(s.m, s.n);
-    const auto a = MakeProblem<T>(s, 21).A;
+    const Problem<T> p = MakeProblem<T>(s, 31);
+    auto a = p.A;
+    if (int64_t{s.m} * s.n <= 2000) {  // Moore-Penrose, A kept, P over A when null
+      std::vector<T> pa(a.size(), T(-1.0));
+      ASSERT_EQ(Pinv(a.data(), s.m, s.n, -1.0, pa.data()), 0);
+      EXPECT_TRUE(a == p.A && MoorePenroseError(p.A, pa, s.m, s.n) < 30.0);
+      ASSERT_EQ(Pinv(a.data(), s.m, s.n, -1.0, static_cast<T*>(nullptr)), 0);
+      EXPECT_EQ(a, pa);
+      a = p.A;
+    }
     for (int32_t full : {0, 1}) {
       if (full != 0 && std::max(s.m, s.n) > 50) continue;
-      const int32_t p = full != 0 ? s.m : k, q = full != 0 ? s.n : k;
-      std::vector<T> u(size_t(s.m) * p, T(-7.0)), v(size_t(s.n) * q, T(-7.0));
+      const int32_t w = full != 0 ? s.m : k, q = full != 0 ? s.n : k;
+      std::vector<T> u(size_t(s.m) * w, T(-7.0)), v(size_t(s.n) * q, T(-7.0));
       std::vector<double> sv(k, -7.0);
       ASSERT_EQ(Svd(a.data(), s.m, s.n, u.data(), sv.data(), v.data(), full), 0);
       for (int32_t i = 0; i < k; ++i) EXPECT_GE(sv[i], i + 1 < k ? sv[i + 1] : 0.0);
       EXPECT_LT(s.rank < k ? sv[s.rank] : 0.0, 1e-12 * sv[0]);
       std::vector<T> us(size_t(s.m) * k), vk(size_t(s.n) * k);
-      for (int32_t i = 0; i < s.m; ++i)
-        for (int32_t j = 0; j < k; ++j) us[i * k + j] = u[i * p + j] * sv[j];
-      for (int32_t i = 0; i < s.n; ++i)
-        for (int32_t j = 0; j < k; ++j) vk[i * k + j] = v[i * q + j];
+      for (int32_t i = 0; i < s.m * k; ++i) us[i] = u[i / k * w + i % k] * sv[i % k];
+      for (int32_t i = 0; i < s.n * k; ++i) vk[i] = v[i / k * q + i % k];
       const auto vh = Adj(vk.data(), s.n, k);
       const double unit = Norm(a) * std::max(s.m, s.n) * kEps;
       EXPECT_LT(Diff(Prod(us.data(), vh.data(), s.m, k, s.n), a) / unit, 30.0);
-      EXPECT_LT(OrthError(u.data(), s.m, p) / (s.m * kEps), 30.0);
+      EXPECT_LT(OrthError(u.data(), s.m, w) / (s.m * kEps), 30.0);
       EXPECT_LT(OrthError(v.data(), s.n, q) / (s.n * kEps), 30.0);
       if (full != 0) continue;
       // The leading `rank` triplets: those of the economy decomposition.
@@ -236,10 +197,9 @@ TYPED_TEST(Dense, SvdReconstructsAWithOrthonormalFactors) {
       ASSERT_EQ(SvdLeading(a.data(), s.m, s.n, c, lu.data(), ls.data(), lv.data()), 0);
       for (int32_t i = 0; i < s.m; ++i) want_u.insert(want_u.end(), &u[i * k], &u[i * k] + c);
       for (int32_t i = 0; i < s.n; ++i) want_v.insert(want_v.end(), &v[i * k], &v[i * k] + c);
-      EXPECT_TRUE(lu == want_u && lv == want_v);
-      EXPECT_EQ(ls, std::vector<double>(sv.begin(), sv.begin() + c));
+      EXPECT_TRUE(lu == want_u && lv == want_v && ls == std::vector<double>(&sv[0], &sv[0] + c));
       // Without U: orthonormal V with |A v_j| = s_j are the leading right vectors.
-      ASSERT_EQ(SvdLeadingRight(a.data(), s.m, s.n, c, rs.data(), rv.data()), 0);
+      ASSERT_EQ(SvdRight(a.data(), s.m, s.n, c, rs.data(), rv.data()), 0);
       EXPECT_LT(OrthError(rv.data(), s.n, c) / (s.n * kEps), 30.0);
       const auto av = Prod(a.data(), rv.data(), s.m, s.n, c);
       for (int32_t j = 0; j < c; ++j) {
@@ -249,50 +209,41 @@ TYPED_TEST(Dense, SvdReconstructsAWithOrthonormalFactors) {
         EXPECT_NEAR(static_cast<double>(std::sqrt(col)), sv[j], 1e-12 * sv[0]);
       }
     }
-  }
-}
-
-// ---- least squares, the QR fold, pseudo-inverses ----------------------------------------------
-
-TYPED_TEST(Dense, SolvesGiveTheMinimumNormLeastSquaresSolution) {
-  using T = TypeParam;
-  for (const Shape& s : kShapes) {
-    SCOPED_TRACE(Trace(s));
-    const Problem<T> p = MakeProblem<T>(s, 31);
     const auto b = Random<T>(s.m, s.nrhs, 32);
-    const bool deficient = s.rank < std::min(s.m, s.n);
+    const auto ah = Adj(p.A.data(), s.m, s.n), qh = Adj(p.Q.data(), s.rank, s.n);
     for (int solver = kFirstSolver<T>; solver <= kTruncated; ++solver) {
       SCOPED_TRACE(solver);
-      std::vector<T> x(size_t(s.n) * s.nrhs, T(-5.0));
-      // The truncated solve keeping `rank` values reports no rank warning.
-      const StatusCode want = deficient && solver != kTruncated ? 20001 : 0;
-      ASSERT_EQ(Solve(solver, p.A.data(), s.m, s.n, b.data(), s.nrhs, x.data(), -1.0, s.rank),
-                want);
-      EXPECT_LT(NormalEquationError(p.A, s.m, s.n, b, s.nrhs, x), 100.0);
-      EXPECT_LT(RowSpaceDistance(p, s.rank, s.n, x, s.nrhs), 1e-10);
-      // Scaled to either end of the range, a system tall enough for the QR fold
-      // keeps its solution and rank decision: no overflow, no small values lost.
-      for (double scale : {1e150, 1e-150}) {
-        if (s.m < 600) break;
+      // The truncated solve keeping `rank` values reports no rank warning. Scaled to
+      // either end of the range, a system tall enough for the QR fold keeps its solution
+      // and rank decision: no overflow, no small values lost.
+      const StatusCode want = s.rank < k && solver != kTruncated ? 20001 : 0;
+      std::vector<T> x(size_t(s.n) * s.nrhs, T(-5.0)), x1;
+      for (double scale : {1.0, 1e150, 1e-150}) {
+        if (scale != 1.0 && s.m < 600) break;
         auto as = p.A, bs = b;
-        for (T& v : as) v *= scale;
-        for (T& v : bs) v *= scale;
-        std::vector<T> xs(x.size());
-        ASSERT_EQ(Solve(solver, as.data(), s.m, s.n, bs.data(), s.nrhs, xs.data(), -1.0, s.rank),
-                  want);
-        EXPECT_LT(Diff(xs, x), 1e-11 * Norm(x)) << scale;
+        for (auto* z : {&as, &bs}) for (T& v : *z) v *= scale;
+        ASSERT_EQ(Solve(solver, as.data(), s.m, s.n, bs.data(), s.nrhs, x.data(), -1.0, s.rank),
+                  want) << scale;
+        if (scale == 1.0) x1 = x;
+        EXPECT_LT(Diff(x, x1), 1e-11 * Norm(x1)) << scale;
       }
+      // ||A^H (A X - B)|| against ||A|| (||A|| ||X|| + ||B||) max(m, n) eps, and X in the row
+      // space of A (zero distance for the minimum-norm solution).
+      auto res = Prod(p.A.data(), x1.data(), s.m, s.n, s.nrhs);
+      for (size_t i = 0; i < res.size(); ++i) res[i] -= b[i];
+      const double na = Norm(p.A), ne = Norm(Prod(ah.data(), res.data(), s.n, s.m, s.nrhs));
+      EXPECT_LT(ne / (na * (na * Norm(x1) + Norm(b)) * std::max(s.m, s.n) * kEps), 100.0);
+      const auto qx = Prod(p.Q.data(), x1.data(), s.rank, s.n, s.nrhs);
+      EXPECT_LT(Diff(Prod(qh.data(), qx.data(), s.n, s.rank, s.nrhs), x1), 1e-10 * Norm(x1));
     }
     // A = QR with Q^H B carried along: A^H A = R^H R and A^H B = R^H Y.
     std::vector<T> r(size_t(s.n) * s.n, T(7.0)), y(size_t(s.n) * s.nrhs, T(7.0));
-    if (s.m < s.n) {
-      EXPECT_EQ(QrReduce(p.A.data(), s.m, s.n, b.data(), s.nrhs, r.data(), y.data()), -20003);
-      continue;
-    }
-    ASSERT_EQ(QrReduce(p.A.data(), s.m, s.n, b.data(), s.nrhs, r.data(), y.data()), 0);
+    ASSERT_EQ(QrReduce(p.A.data(), s.m, s.n, b.data(), s.nrhs, r.data(), y.data()),
+              s.m < s.n ? -20003 : 0);
+    if (s.m < s.n) continue;
     for (int32_t i = 0; i < s.n; ++i)
       for (int32_t j = 0; j < i; ++j) EXPECT_EQ(r[i * s.n + j], T(0.0));
-    const auto ah = Adj(p.A.data(), s.m, s.n), rh = Adj(r.data(), s.n, s.n);
+    const auto rh = Adj(r.data(), s.n, s.n);
     const double unit = Norm(p.A) * s.m * kEps;
     EXPECT_LT(Diff(Prod(ah.data(), p.A.data(), s.n, s.m, s.n),
                    Prod(rh.data(), r.data(), s.n, s.n, s.n)) / (unit * Norm(p.A)), 30.0);
@@ -301,49 +252,18 @@ TYPED_TEST(Dense, SolvesGiveTheMinimumNormLeastSquaresSolution) {
   }
 }
 
-// The largest of the four Moore-Penrose residuals, each scaled by the size of its
-// terms and max(m, n) eps.
-template <typename T>
-double MoorePenroseError(const std::vector<T>& A, const std::vector<T>& P, int32_t m, int32_t n) {
-  const auto ap = Prod(A.data(), P.data(), m, n, m), pa = Prod(P.data(), A.data(), n, m, n);
-  const double na = Norm(A), np = Norm(P);
-  const double e1 = Diff(Prod(ap.data(), A.data(), m, m, n), A) / (na * na * np);
-  const double e2 = Diff(Prod(pa.data(), P.data(), n, n, m), P) / (np * np * na);
-  const double e3 = Diff(Adj(ap.data(), m, m), ap) / (na * np);
-  const double e4 = Diff(Adj(pa.data(), n, n), pa) / (na * np);
-  return std::max({e1, e2, e3, e4}) / (std::max(m, n) * kEps);
-}
-
-TYPED_TEST(Dense, PseudoInverseMeetsTheMoorePenroseConditions) {
-  using T = TypeParam;
-  for (const Shape& s : kShapes) {
-    if (int64_t{s.m} * s.n > 2000) continue;
-    SCOPED_TRACE(Trace(s));
-    auto a = MakeProblem<T>(s, 71).A;
-    const auto a0 = a;
-    std::vector<T> p(a.size(), T(-1.0));
-    ASSERT_EQ(Pinv(a.data(), s.m, s.n, -1.0, p.data()), 0);
-    EXPECT_EQ(a, a0);
-    EXPECT_LT(MoorePenroseError(a0, p, s.m, s.n), 30.0);
-    ASSERT_EQ(Pinv(a.data(), s.m, s.n, -1.0, static_cast<T*>(nullptr)), 0);
-    EXPECT_EQ(a, p);
-  }
-}
-
 // Singular values 1 and 1e-20 exactly: which of them a threshold keeps, and the
 // rank warning that goes with it. An all-zero A keeps none.
 TYPED_TEST(Dense, ThresholdsAndRankDecisions) {
   using T = TypeParam;
-  const std::vector<T> a = {T(1.0), T(0.0), T(0.0), T(1e-20), T(0.0), T(0.0)}, zero(6, T(0.0));
-  const std::vector<T> b = {T(1.0), T(1e-20), T(1.0)};
-  // rcond is the truncated solve's keep; x1 is 1 when 1e-20 is kept, else 0.
+  const std::vector<T> a = {T(1.0), T(0.0), T(0.0), T(1e-20), T(0.0), T(0.0)}, zero(6, T(0.0)),
+                       b = {T(1.0), T(1e-20), T(1.0)};
+  // rcond: the truncated solve's keep; x1 is 1 when 1e-20 is kept. DGELSD gets max(m, n) rcond,
+  // or max(m, n) eps for a negative or NaN rcond; the pinv solves read zero as eps too.
   const struct { int solver; double rcond; StatusCode want; double x1; } cases[] = {
-      // DGELSD gets max(m, n) rcond, or max(m, n) eps for a negative or NaN rcond
-      {kGelsd, -1.0, 20001, 0.0},  {kGelsd, NAN, 20001, 0.0},  {kGelsd, 1e-25, 0, 1.0},
-      // the pseudo-inverse solves read zero as eps too; positive values as given
-      {kPinv, 0.0, 20001, 0.0},    {kPinv, -1.0, 20001, 0.0},  {kPinv, 1e-22, 0, 1.0},
-      {kTruncated, 1, 0, 0.0},     {kTruncated, 2, 0, 1.0},
-  };
+      {kGelsd, -1.0, 20001, 0.0}, {kGelsd, NAN, 20001, 0.0}, {kGelsd, 1e-25, 0, 1.0},
+      {kPinv, 0.0, 20001, 0.0},   {kPinv, -1.0, 20001, 0.0}, {kPinv, 1e-22, 0, 1.0},
+      {kTruncated, 1, 0, 0.0},    {kTruncated, 2, 0, 1.0}};
   for (const auto& c : cases) {
     if (kIsCx<T> && c.solver == kGelsd) continue;
     SCOPED_TRACE(::testing::Message() << c.solver << " " << c.rcond);
@@ -357,70 +277,53 @@ TYPED_TEST(Dense, ThresholdsAndRankDecisions) {
     EXPECT_EQ(x, std::vector<T>(2, T(0.0)));
   }
   // pinv tolerance: negative selects max(m, n) S[0] eps; any other used as given.
-  const struct { double tol, p00, p11; } tols[] = {{-1.0, 1.0, 0.0}, {0.0, 1.0, 1e20},
-      {1e-21, 1.0, 1e20}, {1e-20, 1.0, 0.0}, {1.0, 0.0, 0.0}, {NAN, 0.0, 0.0}};
-  for (const auto& c : tols) {
-    SCOPED_TRACE(c.tol);
+  for (auto [tol, p00, p11] : {std::tuple{-1.0, 1.0, 0.0}, {0.0, 1.0, 1e20}, {1e-21, 1.0, 1e20},
+                               {1e-20, 1.0, 0.0}, {1.0, 0.0, 0.0}, {NAN, 0.0, 0.0}}) {
     auto work = a;
     std::vector<T> p(6, T(7.0));
-    ASSERT_EQ(Pinv(work.data(), 3, 2, c.tol, p.data()), 0);
-    EXPECT_EQ(p[0], T(c.p00));
-    EXPECT_NEAR(std::abs(p[4] - T(c.p11)), 0.0, 1e-15 * c.p11);
-    for (int i : {1, 2, 3, 5}) EXPECT_EQ(p[i], T(0.0));
+    ASSERT_EQ(Pinv(work.data(), 3, 2, tol, p.data()), 0);
+    EXPECT_EQ(p, (std::vector<T>{T(p00), T(0.0), T(0.0), T(0.0), T(p11), T(0.0)})) << tol;
   }
   const double s[3] = {4.0, 2.0, 1.0};
   for (auto [keep, want] : {std::pair{1, 3.0}, {2, 1.5}, {3, 0.5}, {0, 0.0}, {4, 0.0}, {-1, 0.0}})
     EXPECT_EQ(TruncationThreshold(s, 3, keep), want) << keep;
 }
 
-// A real solve leaves DGELSD beyond a width that grows with the rows. An
-// injected INFO < 0 shows the way taken: DGELSD's is a rank-0 solve, an SVD's a
-// failure.
-TEST(LeastSquares, WideRealSystemsLeaveDgelsdPastTheirWidth) {
-  for (auto [m, widest] : {std::pair{1, 739}, {2, 802}, {3, 868}, {10, 1386}}) {
-    for (int32_t n : {widest, widest + 1}) {
-      const auto a = Random<double>(m, n, 43), b = Random<double>(m, 1, 44);
-      std::vector<double> x(n);
-      LapackFailAt(1, -3, false);
-      const StatusCode st = LeastSquaresReal(a.data(), m, n, b.data(), 1, x.data(), -1.0);
-      LapackFailAt(0, 0, false);
-      EXPECT_EQ(st, n == widest ? 20001 : -20062) << m << "x" << n;
-    }
-  }
-}
-
-// A driver failure injected at the boundary reaches each caller as the status
-// its driver's INFO maps to, with nothing written.
+// An injected driver failure reaches each caller as the status its INFO maps to, nothing
+// written. A real solve leaves DGELSD past a width that grows with the rows: an INFO < 0
+// shows the way, a rank-0 solve in DGELSD (its rank decides), a failure in an SVD.
 TEST(LapackBoundary, InjectedInfoMapsPerDriver) {
-  const auto a = Random<double>(6, 4, 5), b = Random<double>(6, 1, 6);
+  const auto a = Random<double>(10, 1387, 5), b = Random<double>(10, 1, 6);
   const std::vector<Cx> ac(a.begin(), a.end()), bc(b.begin(), b.end());
-  std::vector<double> u(24, 7.0), s(4, 7.0), v(16, 7.0), x(4, 7.0), sym(16, 1.0);
+  std::vector<double> u(24, 7.0), s(4, 7.0), v(16, 7.0), x(1387, 7.0), sym(16, 1.0);
   std::vector<Cx> w(4, Cx(7.0)), vec(16, Cx(7.0));
+  int32_t m = 0, n = 0;
   const std::function<StatusCode()> calls[] = {
       [&] { return SvdReal(a.data(), 6, 4, u.data(), s.data(), v.data(), 0); },
       [&] { return EigGeneralReal(a.data(), 4, 1, w.data(), vec.data()); },
-      [&] { return LeastSquaresReal(a.data(), 3, 4, b.data(), 1, x.data(), -1.0); },
+      [&] { return LeastSquaresReal(a.data(), m, n, b.data(), 1, x.data(), -1.0); },
       [&] { return LeastSquaresComplex(ac.data(), 6, 2, bc.data(), 1, w.data(), -1.0); },
       [&] { return EigSymReal(sym.data(), 4, 0, s.data(), nullptr); },
   };
-  const struct { int call; int32_t info; StatusCode want; bool persistent; } cases[] = {
-      {0, 3, -20062, false}, {0, -2, -20062, false}, {1, 1, -20062, false},
-      {1, -4, -20999, false}, {2, 2, -20062, false}, {2, -3, 20001, false},
-      {3, -1, -20999, false}, {4, 5, -20062, false}, {0, 1, -20062, true}};
+  // call, INFO, status; persistent (the failure stays armed), m, n for the real solve
+  const struct { int call; int32_t info; StatusCode want; int persistent, m, n; } cases[] = {
+      {0, 3, -20062, 0, 0, 0},   {0, -2, -20062, 0, 0, 0},    {1, 1, -20062, 0, 0, 0},
+      {1, -4, -20999, 0, 0, 0},  {3, -1, -20999, 0, 0, 0},    {4, 5, -20062, 0, 0, 0},
+      {0, 1, -20062, 1, 0, 0},   {2, 2, -20062, 0, 3, 4},     {2, -3, 20001, 0, 3, 4},
+      {2, -3, 20001, 0, 1, 739}, {2, -3, -20062, 0, 1, 740},  {2, -3, 20001, 0, 2, 802},
+      {2, -3, -20062, 0, 2, 803}, {2, -3, 20001, 0, 3, 868},  {2, -3, -20062, 0, 3, 869},
+      {2, -3, 20001, 0, 10, 1386}, {2, -3, -20062, 0, 10, 1387}};
   for (const auto& c : cases) {
-    SCOPED_TRACE(::testing::Message() << c.call << " INFO " << c.info);
-    u.assign(u.size(), 7.0);
-    x.assign(x.size(), 7.0);
-    LapackFailAt(1, c.info, c.persistent);
+    SCOPED_TRACE(::testing::Message() << c.call << " INFO " << c.info << " " << c.m << "x" << c.n);
+    u.assign(u.size(), 7.0), x.assign(x.size(), 7.0);
+    LapackFailAt(1, c.info, c.persistent != 0);
+    m = c.m, n = c.n;
     const StatusCode st = calls[c.call]();
     EXPECT_EQ(LapackCalls(), 1);
     LapackFailAt(0, 0, false);
     EXPECT_EQ(st, c.want);
-    if (c.want < 0) {  // gelsd's negative INFO is not an error: its rank (none) decides
-      for (double e : u) EXPECT_EQ(e, 7.0);
-      for (double e : x) EXPECT_EQ(e, 7.0);
-      for (const Cx& e : vec) EXPECT_EQ(e, Cx(7.0));
-    }
+    const bool untouched = u == std::vector<double>(24, 7.0) && vec == std::vector<Cx>(16, 7.0);
+    EXPECT_TRUE(c.want >= 0 || (untouched && x == std::vector<double>(x.size(), 7.0)));
   }
 }
 
@@ -434,9 +337,8 @@ TYPED_TEST(Dense, BadInputIsRefusedWithNothingWritten) {
       {-2, 3, 2, -1, -1, -20003, -20003}, {4, 3, 0, -1, -1, -20003, 0},
       {4, 3, -1, -1, -1, -20003, -20004}, {4, 3, 2, 5, -1, -20068, -20068},
       {4, 3, 2, -1, 7, -20068, -20068}};
-  const double bads[] = {DBL_MAX, NAN, -INFINITY, -1.7976931348623e308};
   for (const auto& c : cases) {
-    for (double bad : bads) {
+    for (double bad : {DBL_MAX, std::nan(""), -HUGE_VAL, -1.7976931348623e308}) {
       SCOPED_TRACE(::testing::Message() << c.m << "x" << c.n << " nrhs " << c.nrhs << " " << bad);
       std::vector<T> at(a.begin(), a.end()), bt(b.begin(), b.end());
       if (c.bad_a >= 0) {
@@ -454,15 +356,13 @@ TYPED_TEST(Dense, BadInputIsRefusedWithNothingWritten) {
       std::vector<T> u(16, T(7.0)), v(9, T(7.0)), p(12, T(7.0));
       std::vector<double> sv(3, 7.0);
       EXPECT_EQ(Svd(at.data(), c.m, c.n, u.data(), sv.data(), v.data(), 1), c.real);
-      EXPECT_EQ(SvdLeadingRight(at.data(), c.m, c.n, 1, sv.data(), v.data()), c.real);
+      EXPECT_EQ(SvdRight(at.data(), c.m, c.n, 1, sv.data(), v.data()), c.real);
       EXPECT_EQ(Pinv(at.data(), c.m, c.n, -1.0, p.data()), c.real);
       for (const auto* out : {&u, &v, &p}) EXPECT_EQ(*out, std::vector<T>(out->size(), T(7.0)));
       EXPECT_EQ(sv, std::vector<double>(3, 7.0));
     }
   }
 }
-
-// ---- products, transposes, the finiteness screen ----------------------------------------------
 
 TYPED_TEST(Dense, ProductsAndTransposesMatchLoops) {
   using T = TypeParam;
@@ -496,42 +396,24 @@ TYPED_TEST(Dense, ProductsAndTransposesMatchLoops) {
   EXPECT_EQ(NumAllocOutstanding(), 0);
 }
 
-TEST(FinitenessScreen, Bounds) {
-  // Rejected: NaN, infinities, DBL_MAX and everything at or below -1.7976931348623e308.
-  const struct { double v; int32_t rejected; } cases[] = {
-      {1.0, 0}, {DBL_MAX, 1}, {std::nextafter(DBL_MAX, 0.0), 0}, {-DBL_MAX, 1},
-      {-1.7976931348623e308, 1}, {std::nextafter(-1.7976931348623e308, 0.0), 0},
-      {INFINITY, 1}, {-INFINITY, 1}, {NAN, 1}, {std::numeric_limits<double>::denorm_min(), 0}};
-  for (const auto& c : cases) {
-    const double pair[2] = {1.0, c.v};
-    const Cx both[2] = {Cx(c.v, 0.5), Cx(0.5, c.v)};
-    EXPECT_EQ(HasNonFiniteReal(pair, 2) + HasNonFiniteReal(pair, 1), c.rejected) << c.v;
-    EXPECT_EQ(HasNonFiniteComplex(both, 1) + HasNonFiniteComplex(both + 1, 1), 2 * c.rejected);
-  }
-}
-
-// ---- eigenproblems ---------------------------------------------------------------------------
-
 // ||A V - V diag(w)||_F / (||A||_F n eps), all row-major n-by-n.
 double EigResidual(const std::vector<Cx>& A, const std::vector<Cx>& V, const std::vector<Cx>& w,
                    int n) {
   auto av = Prod(A.data(), V.data(), n, n, n);
-  for (int i = 0; i < n; ++i)
-    for (int j = 0; j < n; ++j) av[i * n + j] -= V[i * n + j] * w[j];
+  for (int i = 0; i < n * n; ++i) av[i] -= V[i] * w[i % n];
   return Norm(av) / (Norm(A) * n * kEps);
 }
-template <typename R>
-std::vector<Cx> ToCx(const std::vector<R>& x) { return {x.begin(), x.end()}; }
+template <typename R> std::vector<Cx> ToCx(const std::vector<R>& x) { return {x.begin(), x.end()}; }
 
-TEST(Eigen, ResidualsOrderAndWhereVectorsGo) {
+TEST(Eigen, ResidualsOrderWhereVectorsGoAndRefusals) {
   for (int n : {1, 2, 3, 5, 8, 13, 24}) {
     SCOPED_TRACE(n);
     const size_t nn = size_t(n) * n;
     const auto g = Random<double>(n, n, n), gt = Adj(g.data(), n, n);
     const auto gc = Random<Cx>(n, n, n + 100), gh = Adj(gc.data(), n, n);
-    std::vector<double> sym(nn);
-    std::vector<Cx> her(nn);
-    for (size_t i = 0; i < nn; ++i) sym[i] = g[i] + gt[i], her[i] = gc[i] + gh[i];
+    auto sym = g;
+    auto her = gc;
+    for (size_t i = 0; i < nn; ++i) sym[i] += gt[i], her[i] += gh[i];
     // General real: unit right vectors, conjugate pairs positive imaginary part first.
     std::vector<Cx> w(n), V(nn), w0(n);
     ASSERT_EQ(EigGeneralReal(g.data(), n, 1, w.data(), V.data()), 0);
@@ -539,12 +421,9 @@ TEST(Eigen, ResidualsOrderAndWhereVectorsGo) {
     const auto gram = Prod(Adj(V.data(), n, n).data(), V.data(), n, n, n);
     for (int j = 0; j < n; ++j) {
       EXPECT_NEAR(gram[j * n + j].real(), 1.0, 1e-13);
-      if (w[j].imag() > 0 && j + 1 < n) {
-        EXPECT_EQ(w[j + 1], std::conj(w[j]));
-        ++j;
-      } else {
-        EXPECT_EQ(w[j].imag(), 0.0);
-      }
+      const int pair = w[j].imag() > 0 && j + 1 < n;  // a conjugate pair, or a real value
+      EXPECT_EQ(w[j + pair], std::conj(w[j]));
+      j += pair;
     }
     ASSERT_EQ(EigGeneralReal(g.data(), n, 0, w0.data(), nullptr), 0);  // values alone
     EXPECT_LT(Diff(w0, w), 1e-10 * (1 + Norm(w)));
@@ -554,8 +433,7 @@ TEST(Eigen, ResidualsOrderAndWhereVectorsGo) {
     EXPECT_EQ(a, gc);
     EXPECT_LT(EigResidual(gc, V, w, n), 30.0);
     ASSERT_EQ(EigComplex(a.data(), n, 0, 1, w0.data(), nullptr), 0);
-    EXPECT_EQ(w0, w);
-    EXPECT_EQ(a, V);
+    EXPECT_TRUE(w0 == w && a == V);
     // Symmetric: ascending, orthonormal; vectors over A when null, A kept without.
     std::vector<double> ws(n), Vs(nn), as = sym;
     ASSERT_EQ(EigSymReal(as.data(), n, 1, ws.data(), Vs.data()), 0);
@@ -574,12 +452,9 @@ TEST(Eigen, ResidualsOrderAndWhereVectorsGo) {
     EXPECT_LT(EigResidual(her, Vh, ToCx(wh), n), 30.0);
     EXPECT_LT(OrthError(Vh.data(), n, n) / (n * kEps), 30.0);
     ASSERT_EQ(EigComplex(ah.data(), n, 1, 1, w.data(), nullptr), 0);
-    EXPECT_EQ(w, ToCx(wh));
-    EXPECT_EQ(ah, Vh);
+    EXPECT_TRUE(w == ToCx(wh) && ah == Vh);
   }
-}
-
-TEST(Eigen, SizeOptionAndNonFiniteChecks) {
+  // Sizes, the option flags and non-finite input, for every front end.
   double rd[4] = {1, 2, 2, 1}, rw[2], rv[4];
   Cx cd[4] = {1, 2, 2, 1}, cw[2], cv[4];
   const std::function<StatusCode(int32_t, int32_t)> calls[] = {
@@ -592,8 +467,7 @@ TEST(Eigen, SizeOptionAndNonFiniteChecks) {
   };
   for (size_t i = 0; i < std::size(calls); ++i) {
     SCOPED_TRACE(i);
-    EXPECT_EQ(calls[i](0, 0), -20003);
-    EXPECT_EQ(calls[i](-2, 1), -20003);
+    EXPECT_EQ(calls[i](0, 0) + calls[i](-2, 1), -40006);
     EXPECT_EQ(calls[i](2, 2), status::kBadOption);
     EXPECT_EQ(calls[i](2, 1), 0);
     rd[3] = NAN, cd[3] = Cx(1, INFINITY);
@@ -603,9 +477,7 @@ TEST(Eigen, SizeOptionAndNonFiniteChecks) {
   for (int flag : {-1, 2}) EXPECT_EQ(EigComplex(cd, 2, flag, 0, cw, nullptr), status::kBadOption);
 }
 
-// ---- polynomial roots -------------------------------------------------------------------
-
-constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
+const double kNaN = std::nan("");
 
 // Eigenvalues of the companion matrix of c[0] + ... + c[m] z^m.
 std::vector<Cx> CompanionRoots(const std::vector<Cx>& c) {
@@ -621,9 +493,8 @@ std::vector<Cx> CompanionRoots(const std::vector<Cx>& c) {
 void ExpectSameMultiset(std::vector<Cx> got, const std::vector<Cx>& want, double tol) {
   ASSERT_EQ(got.size(), want.size());
   for (const Cx& w : want) {
-    auto best = std::min_element(got.begin(), got.end(), [&](const Cx& x, const Cx& y) {
-      return std::abs(x - w) < std::abs(y - w);
-    });
+    const auto closer = [&](const Cx& x, const Cx& y) { return abs(x - w) < abs(y - w); };
+    const auto best = std::min_element(got.begin(), got.end(), closer);
     EXPECT_LT(std::abs(*best - w), tol * std::max(1.0, std::abs(w))) << "root " << w;
     got.erase(best);
   }
@@ -645,10 +516,10 @@ std::vector<Cx> FromRoots(const std::vector<Cx>& r) {
   return c;
 }
 
-TEST(PolyRoots, RandomPolynomialsMatchCompanionEigenvaluesWithSmallResiduals) {
+TEST(PolyRoots, CompanionEigenvaluesSmallResidualsClosedFormsAndRefusals) {
   std::mt19937_64 rng(20240611);
   std::normal_distribution<double> g;
-  for (int degree = 1; degree <= 40; ++degree) {
+  for (int degree = 1; degree <= 40; ++degree)
     for (int trial = 0; trial < 3; ++trial) {
       std::vector<Cx> c(degree + 1), roots;
       for (Cx& v : c) v = Cx(g(rng), g(rng));
@@ -661,54 +532,38 @@ TEST(PolyRoots, RandomPolynomialsMatchCompanionEigenvaluesWithSmallResiduals) {
         for (int k = degree; k >= 0; --k) p = p * z + c[k], scale = scale * abs(z) + abs(c[k]);
         EXPECT_LE(std::abs(p), 1e-10 * scale) << "degree " << degree << " root " << z;
       }
-      std::vector<Cx> inout = c;
-      ASSERT_EQ(PolyRootsComplex(inout.data(), degree + 1, 1000, inout.data()), 0);
-      EXPECT_EQ(std::vector<Cx>(inout.begin(), inout.end() - 1), roots);
-      EXPECT_EQ(inout.back(), c.back());  // past the roots: untouched
     }
-  }
   // Autoregressive polynomials: conjugate pairs of poles near the unit circle.
   std::uniform_real_distribution<double> radius(0.5, 0.999), angle(0.05, 3.0);
   for (int pairs = 2; pairs <= 12; ++pairs) {
     std::vector<Cx> poles, roots;
-    for (int i = 0; i < pairs; ++i) {
-      poles.push_back(std::polar(radius(rng), angle(rng)));
-      poles.push_back(std::conj(poles.back()));
-    }
+    for (int i = 0; i < pairs; ++i) poles.push_back(std::polar(radius(rng), angle(rng)));
+    for (int i = 0; i < pairs; ++i) poles.push_back(std::conj(poles[i]));
     ASSERT_EQ(Roots(FromRoots(poles), &roots), 0);
     ExpectSameMultiset(roots, poles, 1e-6);
   }
   // Multiple roots, to the accuracy their multiplicity allows.
-  for (auto [roots_in, tol] : {std::pair{std::vector<Cx>{1, 1, 1, -2}, 1e-4},
-                               {std::vector<Cx>{1, 1, 2, 2}, 1e-6},
-                               {std::vector<Cx>{Cx(0, 1), Cx(0, 1), Cx(0, 1), Cx(0, 1)}, 1e-3},
-                               {std::vector<Cx>(5, -0.5), 1e-2}}) {
+  for (auto [roots_in, tol] : {std::pair{std::vector<Cx>{1, 1, 1, -2}, 1e-4}, {{1, 1, 2, 2}, 1e-6},
+                               {{Cx(0, 1), Cx(0, 1), Cx(0, 1), Cx(0, 1)}, 1e-3},
+                               {{-.5, -.5, -.5, -.5, -.5}, 1e-2}}) {
     std::vector<Cx> roots;
     ASSERT_EQ(Roots(FromRoots(roots_in), &roots), 0);
     ExpectSameMultiset(roots, roots_in, tol);
   }
-}
-
-TEST(PolyRoots, ClosedFormsInTheirOrderAndRefusals) {
   // Roots exact and in their order; unwritten entries stay -99 - 99i.
+  // A zero leading coefficient (roots at infinity) and NaN are refused before any root.
+  const StatusCode bad = status::kBadPolynomial;
   const struct { std::vector<Cx> c; StatusCode status; std::vector<Cx> roots; } cases[] = {
-      {{0, 0, 1}, 0, {0, 0}},             {{-2, 1}, 0, {2}},          {{2, -3, 1}, 0, {2, 1}},
-      {{1, 0, 0}, status::kBadPolynomial, {}},  // roots at infinity are not reported
-      {{0, 0, 0, -2, 1, 0}, 0, {0, 0, 0, 2}},
-      {{0, 6, -5, 1}, 0, {0, 3, 2}},  // zero root, then the quadratic
-      {{Cx(0, 2), Cx(0, -2)}, 0, {1}},  // scaled division by an imaginary divisor
-      {{5}, status::kBadPolynomial, {}}, {{0, 0}, status::kBadPolynomial, {}}, {{0, 3}, 0, {0}},
-      {{4, 0, 1}, 0, {Cx(0, -2), Cx(0, 2)}},
-      {{0, 0, kNaN, 2, 3}, status::kBadPolynomial, {}},  // NaN refused before any root
-      {{0, 0, 1, Cx(0, kNaN), 3}, status::kBadPolynomial, {}},
-  };
-  for (const auto& tc : cases) {
+      {{0, 0, 1}, 0, {0, 0}}, {{-2, 1}, 0, {2}}, {{2, -3, 1}, 0, {2, 1}}, {{1, 0, 0}, bad, {}},
+      {{0, 0, 0, -2, 1, 0}, 0, {0, 0, 0, 2}}, {{0, 6, -5, 1}, 0, {0, 3, 2}}, {{5}, bad, {}},
+      {{Cx(0, 2), Cx(0, -2)}, 0, {1}}, {{0, 0}, bad, {}}, {{0, 3}, 0, {0}},
+      {{4, 0, 1}, 0, {Cx(0, -2), Cx(0, 2)}}, {{0, 0, kNaN, 2, 3}, bad, {}},
+      {{0, 0, 1, Cx(0, kNaN), 3}, bad, {}}};
+  for (auto [c, status, want] : cases) {
     std::vector<Cx> roots;
-    ASSERT_EQ(Roots(tc.c, &roots), tc.status) << tc.c.size();
-    for (size_t i = 0; i < roots.size(); ++i) {
-      const Cx want = i < tc.roots.size() ? tc.roots[i] : Cx(-99, -99);
-      EXPECT_NEAR(std::abs(roots[i] - want), 0.0, 1e-15) << tc.c.size() << " " << i;
-    }
+    ASSERT_EQ(Roots(c, &roots), status) << c.size();
+    want.resize(roots.size(), Cx(-99, -99));
+    EXPECT_LT(Diff(roots, want), 1e-15) << c.size();
   }
   EXPECT_EQ(PolyRootsComplex(nullptr, 0, 1000, nullptr), status::kBadSize);
   // Out of iterations; a derivative that overflows (3 c[3]) or is infinite.
@@ -726,8 +581,6 @@ TEST(PolyRoots, ClosedFormsInTheirOrderAndRefusals) {
   EXPECT_EQ(NumAllocOutstanding(), 0);
 }
 
-// ---- sorting and extremes --------------------------------------------------------------
-
 // Equal values compare equal; NaN matches NaN.
 void ExpectSameValues(const std::vector<double>& got, const std::vector<double>& want) {
   ASSERT_EQ(got.size(), want.size());
@@ -735,14 +588,13 @@ void ExpectSameValues(const std::vector<double>& got, const std::vector<double>&
     EXPECT_TRUE(got[i] == want[i] || (std::isnan(got[i]) && std::isnan(want[i]))) << "at " << i;
 }
 
-TEST(SortReal, NaNFirstThenOrderedInPlaceIntoOutAndOverItself) {
+TEST(SortAndExtremes, NaNFirstTiesAndInPlaceIntoOutAndOverItself) {
+  // Any non-zero desc sorts descending.
   const std::tuple<std::vector<double>, int32_t, std::vector<double>> cases[] = {
-      {{3, kNaN, 1, 2}, 0, {kNaN, 1, 2, 3}},  {{kNaN, kNaN}, 0, {kNaN, kNaN}},  {{kNaN}, 0, {kNaN}},
-      {{1, 2, kNaN, 0, kNaN, -5}, 7, {kNaN, kNaN, 2, 1, 0, -5}},  // any non-zero: descending
+      {{3, kNaN, 1, 2}, 0, {kNaN, 1, 2, 3}}, {{kNaN, kNaN}, 0, {kNaN, kNaN}}, {{kNaN}, 0, {kNaN}},
+      {{1, 2, kNaN, 0, kNaN, -5}, 7, {kNaN, kNaN, 2, 1, 0, -5}}, {{2, 2, 1, 2}, 1, {2, 2, 2, 1}},
       {{INFINITY, -INFINITY, 0, -0.0, 4}, 0, {-INFINITY, 0, 0, 4, INFINITY}},
-      {{2, 2, 1, 2}, 1, {2, 2, 2, 1}},
-      {{5, kNaN, -1, 5, kNaN, 0, -1, 3}, 1, {kNaN, kNaN, 5, 5, 3, 0, -1, -1}},
-  };
+      {{5, kNaN, -1, 5, kNaN, 0, -1, 3}, 1, {kNaN, kNaN, 5, 5, 3, 0, -1, -1}}};
   for (const auto& [in, desc, want] : cases) {
     for (int mode = 0; mode < 3; ++mode) {  // in place, into out, out == x
       std::vector<double> x = in, out(in.size(), 99.0);
@@ -756,21 +608,16 @@ TEST(SortReal, NaNFirstThenOrderedInPlaceIntoOutAndOverItself) {
   EXPECT_EQ(SortReal(x, 0, 0, out) + SortReal(x, -3, 1, nullptr), 2 * status::kBadSize);
   EXPECT_EQ(SortReal(x, 1, 0, out), 0);  // only the first n values are touched
   EXPECT_TRUE(std::isnan(out[0]) && out[1] == 6.0);
-}
-
-TEST(MinMaxReal, NaNSkippedAndTiesKeepTheFirstIndex) {
-  const struct { std::vector<double> in; double max_value; int32_t max_index;
-                 double min_value; int32_t min_index; } cases[] = {
-      {{kNaN, 2, 5, 5, -1, -1}, 5, 2, -1, 4}, {{kNaN, kNaN}, kNaN, -1, kNaN, -1},
-      {{4}, 4, 0, 4, 0},                      {{1, kNaN, 3, kNaN, 0}, 3, 2, 0, 4},
-      {{-2, -2, -2}, -2, 0, -2, 0},           {{kNaN, 7, kNaN}, 7, 1, 7, 1},
-  };
-  for (const auto& tc : cases) {
+  // MinMaxReal skips NaN, ties keep the first index: in, then max, its index, min, its index.
+  const std::pair<std::vector<double>, std::vector<double>> extremes[] = {
+      {{kNaN, 2, 5, 5, -1, -1}, {5, 2, -1, 4}}, {{kNaN, kNaN}, {kNaN, -1, kNaN, -1}},
+      {{4}, {4, 0, 4, 0}}, {{1, kNaN, 3, kNaN, 0}, {3, 2, 0, 4}}, {{-2, -2, -2}, {-2, 0, -2, 0}},
+      {{kNaN, 7, kNaN}, {7, 1, 7, 1}}};
+  for (const auto& [in, want] : extremes) {
     double mx = 123.0, mn = 456.0;
     int32_t imx = 77, imn = 88;
-    ASSERT_EQ(MinMaxReal(tc.in.data(), int32_t(tc.in.size()), &mx, &imx, &mn, &imn), 0);
-    ExpectSameValues({mx, mn, double(imx), double(imn)},
-                     {tc.max_value, tc.min_value, double(tc.max_index), double(tc.min_index)});
+    ASSERT_EQ(MinMaxReal(in.data(), int32_t(in.size()), &mx, &imx, &mn, &imn), 0);
+    ExpectSameValues({mx, double(imx), mn, double(imn)}, want);
   }
   double v = 1.0;
   int32_t i = 3;  // untouched on refusal
@@ -778,25 +625,31 @@ TEST(MinMaxReal, NaNSkippedAndTiesKeepTheFirstIndex) {
   EXPECT_EQ(i, 3);
 }
 
-// ---- complex scalar helpers ------------------------------------------------------------
-
-TEST(ComplexScalars, SqrtDivideAndPolar) {
+TEST(Scalars, SqrtDividePolarAndTheFinitenessScreen) {
   // op 0: sqrt(a + ib); 1: (a + ib) / (c + id); 2: |a + ib| and arg(a + ib).
+  // 1e300 in a division: no overflowing squares.
   const double pi = std::numbers::pi, cases[][7] = {
-      {0, -4, 0, 0, 0, 0, 2},  {0, 0, 0, 0, 0, 0, 0},        {0, 4, 0, 0, 0, 2, 0},
-      {0, 0, 2, 0, 0, 1, 1},   {0, 0, -2, 0, 0, 1, -1},      {0, -4, -0.0, 0, 0, 0, -2},
-      {0, 3, 4, 0, 0, 2, 1},   {0, -3, 4, 0, 0, 1, 2},       {1, 1, 0, 0, 1, 0, -1},
-      {1, 1, 1, 1, 1, 1, 0},   {1, 2, 4, 2, 0, 1, 2},        {1, 1, 2, 3, 4, 0.44, 0.08},
-      {1, 1e300, 1e300, 1e300, 1e300, 1, 0},  // no overflowing squares
-      {2, 0, 0, 0, 0, 0, 0},   {2, -1, 0, 0, 0, 1, pi},      {2, 0, 2, 0, 0, 2, pi / 2},
+      {0, -4, 0, 0, 0, 0, 2}, {0, 0, 0, 0, 0, 0, 0}, {0, 4, 0, 0, 0, 2, 0}, {0, 0, 2, 0, 0, 1, 1},
+      {0, 0, -2, 0, 0, 1, -1}, {0, -4, -0.0, 0, 0, 0, -2}, {0, 3, 4, 0, 0, 2, 1},
+      {0, -3, 4, 0, 0, 1, 2}, {1, 1, 0, 0, 1, 0, -1}, {1, 1, 1, 1, 1, 1, 0}, {1, 2, 4, 2, 0, 1, 2},
+      {1, 1, 2, 3, 4, 0.44, 0.08}, {1, 1e300, 1e300, 1e300, 1e300, 1, 0}, {2, 0, 0, 0, 0, 0, 0},
+      {2, -1, 0, 0, 0, 1, pi}, {2, 0, 2, 0, 0, 2, pi / 2},
       {2, 3, -4, 0, 0, 5, -0.9272952180016122}};
   for (const auto& c : cases) {
     double re = 9, im = 9;
-    const StatusCode st = c[0] == 0   ? ComplexSqrt(c[1], c[2], &re, &im)
-                          : c[0] == 1 ? ComplexDivide(c[1], c[2], c[3], c[4], &re, &im)
-                                      : ComplexToPolar(c[1], c[2], &re, &im);
-    EXPECT_EQ(st, 0);
+    EXPECT_EQ(c[0] == 0   ? ComplexSqrt(c[1], c[2], &re, &im)
+              : c[0] == 1 ? ComplexDivide(c[1], c[2], c[3], c[4], &re, &im)
+                          : ComplexToPolar(c[1], c[2], &re, &im), 0);
     EXPECT_NEAR(std::abs(Cx(re, im) - Cx(c[5], c[6])), 0.0, 3e-15) << c[0] << " " << c[1];
+  }
+  // Rejected: NaN, infinities, DBL_MAX and everything at or below -1.7976931348623e308.
+  for (auto [v, rejected] : {std::pair{1.0, 0}, {DBL_MAX, 1}, {std::nextafter(DBL_MAX, 0.0), 0},
+           {-DBL_MAX, 1}, {-1.7976931348623e308, 1}, {std::nextafter(-1.7976931348623e308, 0.0), 0},
+           {INFINITY, 1}, {-INFINITY, 1}, {NAN, 1}, {DBL_TRUE_MIN, 0}}) {
+    const double pair[2] = {1.0, v};
+    const Cx both[2] = {Cx(v, 0.5), Cx(0.5, v)};
+    EXPECT_EQ(HasNonFiniteReal(pair, 2) + HasNonFiniteReal(pair, 1), rejected) << v;
+    EXPECT_EQ(HasNonFiniteComplex(both, 1) + HasNonFiniteComplex(both + 1, 1), 2 * rejected);
   }
 }
 
