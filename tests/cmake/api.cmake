@@ -1,6 +1,5 @@
-# The plain C API against the host face. The plain face is linked in from the
-# same core objects (so the test reaches the allocation hook); the host face is
-# the built libqdm, loaded as the host loads it.
+# The plain face, linked from the core objects (the test reaches the allocation
+# hook), against the built libqdm loaded as the host loads it.
 if(TARGET qdm_api)
   add_executable(api_plain_vs_host ${CMAKE_SOURCE_DIR}/tests/api/plain_vs_host.cpp
                  $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})

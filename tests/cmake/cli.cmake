@@ -1,7 +1,5 @@
-# End-to-end runs of the installed qdm tool (Linux): the build is installed into
-# a prefix under the build tree with cmake --install, and tests/cmake/cli.sh
-# runs that copy: standard input and output, --jobs with a bad file among good
-# ones, every exit code, and plotting with and without gnuplot.
+# The installed qdm tool (Linux), run by tests/cmake/cli.sh from a prefix under
+# the build tree: stdin and stdout, --jobs, every exit code, plots.
 if(NOT TARGET qdm_cli)
   return()
 endif()

@@ -1,7 +1,5 @@
-# fuzz_exports: the libFuzzer target over the analysis exports (QDM_FUZZ=ON,
-# clang). fuzz.replay runs it once over the seed corpus and every input that
-# ever made it fail (tests/fuzz/regressions), so a fixed crash stays fixed.
-# tools/fuzz_campaign.sh runs long campaigns; scripts/test.sh a short one.
+# The libFuzzer target (QDM_FUZZ=ON, clang). fuzz.replay runs the seed corpus and
+# every input that ever failed (tests/fuzz/regressions): a fixed crash stays fixed.
 if(QDM_FUZZ)
   add_executable(fuzz_exports ${CMAKE_SOURCE_DIR}/tests/fuzz/fuzz_exports.cpp ${QDM_API_SOURCES})
   target_include_directories(fuzz_exports PRIVATE ${CMAKE_SOURCE_DIR}/tests ${QDM_GENERATED_INCLUDE})

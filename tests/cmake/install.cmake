@@ -1,7 +1,6 @@
-# The installed tree, used from outside as a user would (find_package,
-# pkg-config, and with QDM_TEST_DEB=1 as root the Debian package).
-# Not in sanitizer builds: the consumers are plain programs, which cannot load
-# an instrumented library.
+# The installed tree as a user uses it (find_package, pkg-config, and with
+# QDM_TEST_DEB=1 as root the Debian package); not in sanitizer builds, whose
+# library plain programs cannot load.
 if(TARGET qdm_api AND TARGET qdm_example AND NOT QDM_SANITIZE)
   add_test(NAME install.consumers
            COMMAND ${CMAKE_SOURCE_DIR}/tests/install/run.sh ${CMAKE_SOURCE_DIR} ${CMAKE_BINARY_DIR})
