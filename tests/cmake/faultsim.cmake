@@ -6,10 +6,7 @@ add_library(qdm_faultsim SHARED $<TARGET_OBJECTS:qdm_core>
 target_include_directories(qdm_faultsim PRIVATE ${CMAKE_SOURCE_DIR})
 target_link_libraries(qdm_faultsim PRIVATE ${QDM_LINALG_LIBS} Threads::Threads ${CMAKE_DL_LIBS})
 if(NOT WIN32)
-  target_link_options(qdm_faultsim PRIVATE
-      -Wl,--version-script=${CMAKE_SOURCE_DIR}/tests/helpers/faultsim.map -Wl,--no-undefined)
-  set_target_properties(qdm_faultsim PROPERTIES
-      LINK_DEPENDS ${CMAKE_SOURCE_DIR}/tests/helpers/faultsim.map)
+  target_link_options(qdm_faultsim PRIVATE -Wl,--no-undefined)
 endif()
 
 if(TARGET e2e_fault_injection)
