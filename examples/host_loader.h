@@ -181,8 +181,6 @@ class HostArray {
   // The count field, and the number of elements the last resize provided.
   int32_t Count() const { return EmuCount(handle_); }
   size_t Capacity() const { return EmuCapacity(handle_); }
-  // Byte address of the first element (for alignment checks only).
-  uintptr_t ElementAddress() const { return reinterpret_cast<uintptr_t>(EmuElements(handle_)); }
 
   // Every element as doubles, complex ones as (re, im) pairs, copied out.
   std::vector<double> Doubles() const {

@@ -12,7 +12,7 @@ using namespace qdmhost;
 #if defined(QDM_LIBRARY_PATH)
 // The built library, loaded on first use and kept for the life of the process.
 inline const QdmApi& Qdm() {
-  static const QdmApi api = LoadQdm(QDM_LIBRARY_PATH, EmulatedHostModule());
+  static const QdmApi api = LoadQdm(QDM_LIBRARY_PATH);
   return api;
 }
 #endif
