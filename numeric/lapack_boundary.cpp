@@ -2,15 +2,16 @@
 // driver, in one place.
 //
 // What INFO means, per driver:
-//   gesdd, gesvdx  any INFO != 0 (negative or positive alike)  -> -20062
+//   gesdd          any INFO != 0 (negative or positive alike)  -> -20062
 //   gelsd          INFO > 0 -> -20062; INFO < 0 is not treated separately: the
 //                  caller goes on with the rank LAPACK left
-//   geqrf, unmqr   INFO < 0 -> -20999 (they report nothing else)
+//   geqrf, geqrt,  INFO < 0 -> -20999 (they report nothing else)
+//   tpqrt
 //   geev, syevd,   INFO < 0 -> -20999, INFO > 0 -> -20062
 //   heevd
-// Workspace: gesdd, gesvdx, gelsd, geqrf and unmqr take the size their own query
-// (LWORK = -1) reports; the eigenvalue drivers are sized by fixed formulas and
-// never queried.
+// Workspace: gesdd, gelsd and geqrf take the size their own query (LWORK = -1)
+// reports; geqrt and tpqrt, which have no query, and the eigenvalue drivers are
+// sized by fixed formulas.
 
 #include "numeric/lapack_boundary.h"
 
@@ -24,7 +25,7 @@
 
 namespace {
 
-enum class Driver { kGesdd, kGelsd, kGeqrf, kUnmqr, kGeev, kSyevd };
+enum class Driver { kGesdd, kGelsd, kGeqrf, kGeev, kSyevd };
 
 // ---- injection ------------------------------------------------------------------------
 std::atomic<int64_t> g_fail_at{0};
@@ -49,7 +50,6 @@ StatusCode Mapped(Driver driver, lapack_int info) {
     case Driver::kGelsd:
       return info > 0 ? status::kNoConvergence : status::kOk;
     case Driver::kGeqrf:
-    case Driver::kUnmqr:
     case Driver::kGeev:
     case Driver::kSyevd:
       return info < 0 ? status::kIllegalArgument : status::kNoConvergence;
@@ -305,32 +305,37 @@ StatusCode Geqrf(lapack_int m, lapack_int n, Complex* a, lapack_int lda, Complex
   return Done(Driver::kGeqrf, info);
 }
 
-StatusCode ApplyQAdjoint(lapack_int m, lapack_int nrhs, lapack_int k, const double* a,
-                         lapack_int lda, const double* tau, double* c, lapack_int ldc) {
+// Compact-WY blocking: block reflectors of kQrBlock columns (32 above 64
+// columns), their triangular factors T kept in the workspace and dropped; only
+// R is wanted. T and the work array are both nb-by-n.
+namespace {
+lapack_int QrBlock(lapack_int m, lapack_int n) {
+  const lapack_int nb = n > 64 ? 32 : 8;
+  return std::max<lapack_int>(1, std::min({nb, m, n}));
+}
+}  // namespace
+
+StatusCode Geqrt(lapack_int m, lapack_int n, double* a, lapack_int lda) {
   lapack_int info = 0;
-  if (Injected(&info)) return Failed(Driver::kUnmqr, info);
-  const char side = 'L', trans = 'T';
-  double query = 0.0;
-  lapack_int lwork = -1;
-  LAPACK_dormqr(&side, &trans, &m, &nrhs, &k, a, &lda, tau, c, &ldc, &query, &lwork, &info);
-  WorkArray<double> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  LAPACK_dormqr(&side, &trans, &m, &nrhs, &k, a, &lda, tau, c, &ldc, work.get(), &lwork, &info);
-  return Done(Driver::kUnmqr, info);
+  if (Injected(&info)) return Failed(Driver::kGeqrf, info);
+  lapack_int nb = QrBlock(m, n);
+  WorkArray<double> tw = AllocWorkUninit<double>(static_cast<size_t>(2 * int64_t{nb} * n));
+  if (!tw) return status::kNoMemory;
+  LAPACK_dgeqrt(&m, &n, &nb, a, &lda, tw.get(), &nb, tw.get() + int64_t{nb} * n, &info);
+  return Done(Driver::kGeqrf, info);
 }
 
-StatusCode ApplyQAdjoint(lapack_int m, lapack_int nrhs, lapack_int k, const Complex* a,
-                         lapack_int lda, const Complex* tau, Complex* c, lapack_int ldc) {
+StatusCode Tpqrt(lapack_int m, lapack_int n, double* a, lapack_int lda, double* b,
+                 lapack_int ldb) {
   lapack_int info = 0;
-  if (Injected(&info)) return Failed(Driver::kUnmqr, info);
-  const char side = 'L', trans = 'C';
-  Complex query;
-  lapack_int lwork = -1;
-  LAPACK_zunmqr(&side, &trans, &m, &nrhs, &k, a, &lda, tau, c, &ldc, &query, &lwork, &info);
-  WorkArray<Complex> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  LAPACK_zunmqr(&side, &trans, &m, &nrhs, &k, a, &lda, tau, c, &ldc, work.get(), &lwork, &info);
-  return Done(Driver::kUnmqr, info);
+  if (Injected(&info)) return Failed(Driver::kGeqrf, info);
+  lapack_int nb = QrBlock(n, n);
+  const lapack_int l = 0;
+  WorkArray<double> tw = AllocWorkUninit<double>(static_cast<size_t>(2 * int64_t{nb} * n));
+  if (!tw) return status::kNoMemory;
+  LAPACK_dtpqrt(&m, &n, &l, &nb, a, &lda, b, &ldb, tw.get(), &nb, tw.get() + int64_t{nb} * n,
+                &info);
+  return Done(Driver::kGeqrf, info);
 }
 
 // ---- eigenproblems --------------------------------------------------------------------

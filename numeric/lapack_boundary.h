@@ -75,14 +75,15 @@ inline void Gemm(int32_t m, int32_t n, int32_t k, const Complex* A, const Comple
 [[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
                                Complex* tau);
 
-// C (m-by-nrhs, ldc) replaced by Q^H C, Q the m-by-m product of the k
-// reflectors Geqrf left in a and tau.
-[[nodiscard]] StatusCode ApplyQAdjoint(lapack_int m, lapack_int nrhs, lapack_int k,
-                                       const double* a, lapack_int lda, const double* tau,
-                                       double* c, lapack_int ldc);
-[[nodiscard]] StatusCode ApplyQAdjoint(lapack_int m, lapack_int nrhs, lapack_int k,
-                                       const Complex* a, lapack_int lda, const Complex* tau,
-                                       Complex* c, lapack_int ldc);
+// Householder QR of the m-by-n a in compact-WY blocks (real only): R in the
+// upper triangle of a, the reflectors below it.
+[[nodiscard]] StatusCode Geqrt(lapack_int m, lapack_int n, double* a, lapack_int lda);
+
+// QR of [a; b], a n-by-n upper triangular (its lower part never read) on top of
+// the m-by-n b (real only): R replaces a's upper triangle, the reflectors
+// replace b.
+[[nodiscard]] StatusCode Tpqrt(lapack_int m, lapack_int n, double* a, lapack_int lda, double* b,
+                               lapack_int ldb);
 
 // General eigenproblem, left vectors only (jobvl 'V' or 'N'). The workspace is
 // the caller's, of GeevWorkSize elements: it lives in the caller's own block.

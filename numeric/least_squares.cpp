@@ -123,58 +123,70 @@ int32_t HasNonFinite(const T* x, int64_t n) {
 // factorization first: the SVD is then taken of the small n-by-n R only.
 bool IsTall(int32_t m, int32_t n) { return int64_t{m} >= 2 * int64_t{n}; }
 
-// Rows of A per QR step of a tall solve: about 512 KiB of W = [R; block], and
-// at least 2n rows so that R's own rows stay a small part of each step; the
-// whole of A when it is no taller than that.
+// Rows of A per QR step of a tall solve: about 512 KiB of W = [R; block] for
+// N = n + nrhs columns, and at least 4N rows so that R's own rows stay a small
+// part of each step; the whole of A when it is no taller than that.
 template <typename T>
-int32_t BlockRows(int32_t m, int32_t n) {
-  const int64_t fit = (int64_t{512} * 1024 / static_cast<int64_t>(sizeof(T))) / n - n;
-  const int64_t c = std::max<int64_t>(fit, 2 * int64_t{n});
+int32_t BlockRows(int32_t m, int32_t N) {
+  const int64_t fit = (int64_t{512} * 1024 / static_cast<int64_t>(sizeof(T))) / N - N;
+  const int64_t c = std::max<int64_t>(fit, 4 * int64_t{N});
   return static_cast<int32_t>(std::min<int64_t>(c, m));
+}
+
+// One step of the fold: W (ld) holds R, `top` rows (none on the first step),
+// above h - top new rows, and is factored in place. The twins differ on
+// purpose: the real one runs the compact-WY kernels, and past the first step
+// the triangular-pentagonal one, which skips R's zeros; the complex ones run
+// slower than the unblocked geqrf on a few dozen columns, so the complex twin
+// clears R's lower part and factors the stacked block with geqrf.
+StatusCode FoldStep(double* W, int32_t ld, int32_t top, int32_t h, int32_t N, double*) {
+  if (top == 0) return lapack::Geqrt(h, N, W, ld);
+  return lapack::Tpqrt(h - top, N, W, ld, W + top, ld);
+}
+StatusCode FoldStep(Complex* W, int32_t ld, int32_t top, int32_t h, int32_t N, Complex* tau) {
+  for (int32_t j = 0; j < top; ++j) {
+    for (int32_t i = j + 1; i < top; ++i) W[int64_t{j} * ld + i] = Complex(0.0, 0.0);
+  }
+  return lapack::Geqrf(h, N, W, ld, tau);
 }
 
 // The tall A (m-by-n, m >= 2n) and B (m-by-nrhs) folded into R (n-by-n, upper
 // triangular with zeros below) and y = (Q^H B)[0:n] (n-by-nrhs), both
-// column-major with leading dimension n, where A = QR. Row blocks of A are
-// folded in one at a time: W holds [R; next block] column-major (ld = n + c)
-// and is factored by Householder QR, and the same reflectors are applied to
-// [y; next block of B] in Wb; R and y are then the leading n rows of W and Wb.
-// A block of c rows keeps W in cache, where the level-2 panel steps of the QR
-// run at full speed, and no column-major copy of the whole of A is made.
+// column-major with leading dimension n, where A = QR. B rides along as extra
+// columns: the QR of [A B] has R in its leading n columns and Q^H B in the
+// first n rows of the others, so no reflector is applied a second time. Row
+// blocks are folded in one at a time: W holds [R; next block] column-major
+// (ld = N + c) and is factored in place. A block of c rows keeps W in cache,
+// and no column-major copy of the whole of A is made. Many right-hand sides
+// make this costly (they are factored too); the solves here have one.
 template <typename T>
 StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* y) {
-  const int32_t c = BlockRows<T>(m, n);
-  const int32_t ld = n + c;
-  const int64_t w_count = int64_t{ld} * n;
-  const int64_t wb_count = int64_t{ld} * nrhs;
-  WorkArray<T> block = AllocWorkUninit<T>(static_cast<size_t>(w_count + n + wb_count));
+  const int32_t N = n + nrhs;
+  const int32_t c = BlockRows<T>(m, N);
+  const int32_t ld = N + c;
+  const int64_t w_count = int64_t{ld} * N;
+  WorkArray<T> block = AllocWorkUninit<T>(static_cast<size_t>(w_count + N));
   if (!block) return status::kNoMemory;
   T* W = block.get();
   T* tau = W + w_count;
-  T* Wb = tau + n;
   for (int32_t r0 = 0; r0 < m; r0 += c) {
-    const int32_t top = r0 == 0 ? 0 : n;  // rows of R above the block
+    // From the second step on, R's N rows sit above the block (c >= N).
+    const int32_t top = r0 == 0 ? 0 : N;
     const int32_t h = top + std::min(c, m - r0);
-    // R is the upper triangle the last step left; clear the reflectors below it.
-    for (int32_t j = 0; j < top; ++j) {
-      for (int32_t i = j + 1; i < top; ++i) W[int64_t{j} * ld + i] = T(0.0);
-    }
     for (int32_t i = top; i < h; ++i) {
       const T* a_row = A + int64_t{r0 + i - top} * n;
       for (int32_t j = 0; j < n; ++j) W[int64_t{j} * ld + i] = a_row[j];
       const T* b_row = B + int64_t{r0 + i - top} * nrhs;
-      for (int32_t j = 0; j < nrhs; ++j) Wb[int64_t{j} * ld + i] = b_row[j];
+      for (int32_t j = 0; j < nrhs; ++j) W[int64_t{n + j} * ld + i] = b_row[j];
     }
-    StatusCode st = lapack::Geqrf(h, n, W, ld, tau);
-    if (st != status::kOk) return st;
-    st = lapack::ApplyQAdjoint(h, nrhs, n, W, ld, tau, Wb, ld);
+    const StatusCode st = FoldStep(W, ld, top, h, N, tau);
     if (st != status::kOk) return st;
   }
   for (int32_t j = 0; j < n; ++j) {
     for (int32_t i = 0; i < n; ++i) R[int64_t{j} * n + i] = i > j ? T(0.0) : W[int64_t{j} * ld + i];
   }
   for (int32_t j = 0; j < nrhs; ++j) {
-    std::memcpy(static_cast<void*>(y + int64_t{j} * n), Wb + int64_t{j} * ld,
+    std::memcpy(static_cast<void*>(y + int64_t{j} * n), W + int64_t{n + j} * ld,
                 static_cast<size_t>(n) * sizeof(T));
   }
   // Finite A and B of extreme magnitude can overflow in the reflectors. The
