@@ -21,69 +21,102 @@ namespace {
 using namespace twin;
 
 // ---- reduced pencil ---------------------------------------------------------------------
+// Z = H V (rows-by-k, row-major) for the Hankel H[i][j] = x[i + cols - 1 - j]
+// (rows-by-cols, reading x[0 .. rows+cols-2]) and V (cols-by-k, row-major). H
+// is formed a block of rows at a time, each row a run of the reversed record.
+template <typename T>
+StatusCode HankelProduct(const T* x, int32_t rows, int32_t cols, const T* V, int32_t k, T* Z) {
+  const int32_t span = rows + cols - 1;
+  const int32_t block = rows < 256 ? rows : 256;
+  auto reversed = AllocWorkUninit<T>(static_cast<size_t>(span));
+  auto H = AllocWorkUninit<T>(static_cast<size_t>(block) * static_cast<size_t>(cols));
+  if (!reversed || !H) return status::kNoMemory;
+  for (int32_t t = 0; t < span; ++t) reversed[t] = x[span - 1 - t];
+  // H[i][j] = reversed[rows - 1 - i + j].
+  for (int32_t r0 = 0; r0 < rows; r0 += block) {
+    const int32_t h = rows - r0 < block ? rows - r0 : block;
+    for (int32_t i = 0; i < h; ++i) {
+      std::memcpy(static_cast<void*>(H.get() + static_cast<size_t>(i) * static_cast<size_t>(cols)),
+                  reversed.get() + (rows - 1 - r0 - i), static_cast<size_t>(cols) * sizeof(T));
+    }
+    const StatusCode st =
+        MatMul(H.get(), V, h, cols, k, Z + static_cast<size_t>(r0) * static_cast<size_t>(k));
+    if (st != status::kOk) return st;
+  }
+  return status::kOk;
+}
+
 // Only the leading mr x mr block of K is ever used (mr = min(M, r)), and each of
 // its elements depends only on the first mr singular triplets, so only those
-// are computed and only that block is formed: K_M = diag(1/s_M) U_M^H Y2 V_M. A tall Y1 (q >= 2L) is first
-// reduced to Y1 = Q R first; R (L x L) has Y1's singular values and right
-// singular vectors, and U_M = Y1 V_M diag(1/s_M), so no q x L factor is formed.
+// are computed and only that block is formed: K_M = diag(1/s_M) U_M^H Y2 V_M.
+//
+// A tall Y1 (q >= 2L) is never formed. Its R of Y1 = QR (L x L) has Y1's
+// singular values and right singular vectors, and both Y1 and Y2 are row
+// windows of the (q+1) x L Hankel H[i][j] = x[i+L-1-j]: with Z = H V_M,
+// Y1 V_M = Z[0:q] = U_M diag(s_M) and Y2 V_M = Z[1:q+1], so
+//   K_M = diag(1/s_M) diag(1/s_M) Z[0:q]^H Z[1:q+1].
+// Otherwise Y1 and Y2 are built and Y1's leading triplets taken directly.
 template <typename T>
 StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K) {
   const int32_t q = n - L;
   const int32_t r = q < L ? q : L;
   const int32_t mr = M < r ? M : r;
   const bool tall = int64_t{q} >= 2 * int64_t{L};
-  const size_t qL = static_cast<size_t>(q) * static_cast<size_t>(L);
-  const size_t LL = static_cast<size_t>(L) * static_cast<size_t>(L);
+  const size_t qL = tall ? 0 : static_cast<size_t>(q) * static_cast<size_t>(L);
+  const size_t LL = tall ? static_cast<size_t>(L) * static_cast<size_t>(L) : 0;
+  const size_t zq = static_cast<size_t>(tall ? q + 1 : q) * static_cast<size_t>(mr);
   auto y1 = AllocWorkUninit<T>(qL);
   auto y2 = AllocWorkUninit<T>(qL);
-  auto rhs = AllocWorkUninit<T>(static_cast<size_t>(q));
-  auto reduced = AllocWorkUninit<T>(tall ? LL + L + 1 : 0);  // R, Q^H b (unused)
-  auto U = AllocWorkUninit<T>(static_cast<size_t>(q) * static_cast<size_t>(mr));
+  auto rhs = AllocWorkUninit<T>(tall ? 0 : static_cast<size_t>(q));
+  auto R = AllocWorkUninit<T>(LL);
+  auto U = AllocWorkUninit<T>(zq);  // U, or Z = H V for a tall Y1
   auto s = AllocWorkUninit<double>(static_cast<size_t>(mr));
   auto V = AllocWorkUninit<T>(static_cast<size_t>(L) * static_cast<size_t>(mr));
   auto Uh = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(q));
-  auto T1 = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(L));
+  auto T1 = AllocWorkUninit<T>(tall ? 0 : static_cast<size_t>(mr) * static_cast<size_t>(L));
   auto full = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(mr));
-  if (!y1 || !y2 || !rhs || !reduced || !U || !s || !V || !Uh || !T1 || !full) {
+  if (!y1 || !y2 || !rhs || !R || !U || !s || !V || !Uh || !T1 || !full) {
     return status::kNoMemory;
   }
 
-  // Y1 is the forward prediction block; Y2 is Y1 advanced by one sample.
-  StatusCode st = BuildForward(x, n, L, rhs.get(), y1.get());
-  if (st != status::kOk) return st;
-  for (int32_t i = 0; i < q; ++i) {
-    T* row = y2.get() + static_cast<size_t>(i) * static_cast<size_t>(L);
-    for (int32_t j = 0; j < L; ++j) row[j] = x[i + L - j];
-  }
-
-  // The leading mr singular triplets: U q x mr, V L x mr.
+  StatusCode st = status::kOk;
   if (tall) {
-    // Y1 = Q R (Q not kept); R has Y1's singular values and right vectors,
-    // and the left ones follow from them: U_M = Y1 V_M diag(1/s_M).
-    T* R = reduced.get();
-    st = QrReduce(y1.get(), q, L, rhs.get(), 1, R, R + LL);
+    st = QrReduceHankel(x, q, L, R.get());
     if (st != status::kOk) return st;
-    st = SvdLeadingRight(R, L, L, mr, s.get(), V.get());
+    st = SvdLeadingRight(R.get(), L, L, mr, s.get(), V.get());
     if (st != status::kOk) return st;
-    st = MatMul(y1.get(), V.get(), q, L, mr, U.get());
+    st = HankelProduct(x, q + 1, L, V.get(), mr, U.get());
     if (st != status::kOk) return st;
+    // Z[0:q]^H Z[1:q+1], then each row by 1/s_i twice, unguarded: a zero
+    // singular value yields infinities.
     st = AdjointInto(U.get(), q, mr, Uh.get());
     if (st != status::kOk) return st;
-    st = ScaleRowsByInverse(Uh.get(), mr, q, s.get());
+    st = MatMul(Uh.get(), U.get() + mr, mr, q, mr, full.get());
+    if (st != status::kOk) return st;
+    st = ScaleRowsByInverse(full.get(), mr, mr, s.get());
+    if (st != status::kOk) return st;
+    st = ScaleRowsByInverse(full.get(), mr, mr, s.get());
+    if (st != status::kOk) return st;
   } else {
+    // Y1 is the forward prediction block; Y2 is Y1 advanced by one sample.
+    st = BuildForward(x, n, L, rhs.get(), y1.get());
+    if (st != status::kOk) return st;
+    for (int32_t i = 0; i < q; ++i) {
+      T* row = y2.get() + static_cast<size_t>(i) * static_cast<size_t>(L);
+      for (int32_t j = 0; j < L; ++j) row[j] = x[i + L - j];
+    }
     st = SvdLeading(y1.get(), q, L, mr, U.get(), s.get(), V.get());
     if (st != status::kOk) return st;
     st = AdjointInto(U.get(), q, mr, Uh.get());
+    if (st != status::kOk) return st;
+    // diag(1/s) U^H, unguarded: a zero singular value yields infinities.
+    st = ScaleRowsByInverse(Uh.get(), mr, q, s.get());
+    if (st != status::kOk) return st;
+    st = MatMul(Uh.get(), y2.get(), mr, q, L, T1.get());
+    if (st != status::kOk) return st;
+    st = MatMul(T1.get(), V.get(), mr, L, mr, full.get());
+    if (st != status::kOk) return st;
   }
-  if (st != status::kOk) return st;
-
-  // diag(1/s) U^H, unguarded: a zero singular value yields infinities.
-  st = ScaleRowsByInverse(Uh.get(), mr, q, s.get());
-  if (st != status::kOk) return st;
-  st = MatMul(Uh.get(), y2.get(), mr, q, L, T1.get());
-  if (st != status::kOk) return st;
-  st = MatMul(T1.get(), V.get(), mr, L, mr, full.get());
-  if (st != status::kOk) return st;
 
   if (r >= M) {
     // Leading M x M block, row stride M.

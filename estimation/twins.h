@@ -73,14 +73,12 @@ inline StatusCode TruncatedSolve(const Complex* A, int32_t m, int32_t n, const C
                                  Complex* X, int32_t keep) {
   return LeastSquaresTruncatedComplex(A, m, n, B, 1, X, keep);
 }
-// R and (Q^H B)[0:n] of A = QR.
-inline StatusCode QrReduce(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
-                           double* R, double* Y) {
-  return QrReduceReal(A, m, n, B, nrhs, R, Y);
+// R of the QR of the forward prediction block of x (m rows, n columns).
+inline StatusCode QrReduceHankel(const double* x, int32_t m, int32_t n, double* R) {
+  return QrReduceHankelReal(x, m, n, R);
 }
-inline StatusCode QrReduce(const Complex* A, int32_t m, int32_t n, const Complex* B,
-                           int32_t nrhs, Complex* R, Complex* Y) {
-  return QrReduceComplex(A, m, n, B, nrhs, R, Y);
+inline StatusCode QrReduceHankel(const Complex* x, int32_t m, int32_t n, Complex* R) {
+  return QrReduceHankelComplex(x, m, n, R);
 }
 // Eigenvalues only of a general matrix; the matrix is left as it is.
 inline StatusCode EigenvaluesOf(double* A, int32_t n, Complex* eigenvalues) {

@@ -150,17 +150,46 @@ StatusCode FoldStep(Complex* W, int32_t ld, int32_t top, int32_t h, int32_t N, C
   return lapack::Geqrf(h, N, W, ld, tau);
 }
 
-// The tall A (m-by-n, m >= 2n) and B (m-by-nrhs) folded into R (n-by-n, upper
-// triangular with zeros below) and y = (Q^H B)[0:n] (n-by-nrhs), both
-// column-major with leading dimension n, where A = QR. B rides along as extra
-// columns: the QR of [A B] has R in its leading n columns and Q^H B in the
-// first n rows of the others, so no reflector is applied a second time. Row
-// blocks are folded in one at a time: W holds [R; next block] column-major
-// (ld = N + c) and is factored in place. A block of c rows keeps W in cache,
-// and no column-major copy of the whole of A is made. Many right-hand sides
-// make this costly (they are factored too); the solves here have one.
+// Where the fold takes its rows from. Fill(W, ld, top, r0, h) writes rows
+// r0 .. r0+h-1 of [A B] into rows top .. top+h-1 of the column-major W.
 template <typename T>
-StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* y) {
+struct RowMajorRows {  // A (m-by-n) and B (m-by-nrhs), both row-major
+  const T* A;
+  const T* B;
+  int32_t n, nrhs;
+  void operator()(T* W, int32_t ld, int32_t top, int32_t r0, int32_t h) const {
+    for (int32_t i = 0; i < h; ++i) {
+      const T* a_row = A + int64_t{r0 + i} * n;
+      for (int32_t j = 0; j < n; ++j) W[int64_t{j} * ld + top + i] = a_row[j];
+      const T* b_row = B + int64_t{r0 + i} * nrhs;
+      for (int32_t j = 0; j < nrhs; ++j) W[int64_t{n + j} * ld + top + i] = b_row[j];
+    }
+  }
+};
+template <typename T>
+struct HankelRows {  // A[i][j] = x[i + n - 1 - j]: each column a run of x
+  const T* x;
+  int32_t n;
+  void operator()(T* W, int32_t ld, int32_t top, int32_t r0, int32_t h) const {
+    for (int32_t j = 0; j < n; ++j) {
+      std::memcpy(static_cast<void*>(W + int64_t{j} * ld + top), x + int64_t{r0} + n - 1 - j,
+                  static_cast<size_t>(h) * sizeof(T));
+    }
+  }
+};
+
+// The tall A (m-by-n, m >= 2n) and B (m-by-nrhs, nrhs >= 0) folded into R
+// (n-by-n, upper triangular with zeros below) and y = (Q^H B)[0:n]
+// (n-by-nrhs), both column-major with leading dimension n, where A = QR. B
+// rides along as extra columns: the QR of [A B] has R in its leading n columns
+// and Q^H B in the first n rows of the others, so no reflector is applied a
+// second time. Row blocks are folded in one at a time: W holds [R; next block]
+// column-major (ld = N + c) and is factored in place. A block of c rows keeps
+// W in cache, and no column-major copy of the whole of A is made. Many
+// right-hand sides make this costly (they are factored too); the solves here
+// have one.
+template <typename T, typename Rows>
+StatusCode FoldQr(const Rows& rows, int32_t m, int32_t n, int32_t nrhs, T* R, T* y) {
   const int32_t N = n + nrhs;
   const int32_t c = BlockRows<T>(m, N);
   const int32_t ld = N + c;
@@ -172,14 +201,9 @@ StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T*
   for (int32_t r0 = 0; r0 < m; r0 += c) {
     // From the second step on, R's N rows sit above the block (c >= N).
     const int32_t top = r0 == 0 ? 0 : N;
-    const int32_t h = top + std::min(c, m - r0);
-    for (int32_t i = top; i < h; ++i) {
-      const T* a_row = A + int64_t{r0 + i - top} * n;
-      for (int32_t j = 0; j < n; ++j) W[int64_t{j} * ld + i] = a_row[j];
-      const T* b_row = B + int64_t{r0 + i - top} * nrhs;
-      for (int32_t j = 0; j < nrhs; ++j) W[int64_t{n + j} * ld + i] = b_row[j];
-    }
-    const StatusCode st = FoldStep(W, ld, top, h, N, tau);
+    const int32_t h = std::min(c, m - r0);
+    rows(W, ld, top, r0, h);
+    const StatusCode st = FoldStep(W, ld, top, top + h, N, tau);
     if (st != status::kOk) return st;
   }
   for (int32_t j = 0; j < n; ++j) {
@@ -197,6 +221,11 @@ StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T*
     return status::kNonFinite;
   }
   return status::kOk;
+}
+
+template <typename T>
+StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* y) {
+  return FoldQr(RowMajorRows<T>{A, B, n, nrhs}, m, n, nrhs, R, y);
 }
 
 // Which singular values a solve keeps: those above max(m, n) S[0] e (relative),
@@ -436,27 +465,22 @@ double TruncationThreshold(const double* S, int32_t count, int32_t keep) {
 }
 
 template <typename T>
-StatusCode QrReduce(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* Y) {
-  if (m < 1 || n < 1 || nrhs < 1 || m < n) return status::kBadSize;
-  const int64_t nn = int64_t{n} * n;
-  const int64_t nr = int64_t{n} * nrhs;
-  WorkArray<T> col = AllocWorkUninit<T>(static_cast<size_t>(nn + nr));
+StatusCode QrReduceHankel(const T* x, int32_t m, int32_t n, T* R) {
+  if (m < 1 || n < 1 || m < n) return status::kBadSize;
+  WorkArray<T> col = AllocWorkUninit<T>(static_cast<size_t>(int64_t{n} * n));
   if (!col) return status::kNoMemory;
-  const StatusCode st = FoldQr(A, m, n, B, nrhs, col.get(), col.get() + nn);
+  const StatusCode st = FoldQr(HankelRows<T>{x, n}, m, n, 0, col.get(), static_cast<T*>(nullptr));
   if (st != status::kOk) return st;
   TransposeTo(col.get(), n, n, R, false);
-  TransposeTo(col.get() + nn, nrhs, n, Y, false);
   return status::kOk;
 }
 
-StatusCode QrReduceReal(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
-                        double* R, double* Y) {
-  return QrReduce<double>(A, m, n, B, nrhs, R, Y);
+StatusCode QrReduceHankelReal(const double* x, int32_t m, int32_t n, double* R) {
+  return QrReduceHankel<double>(x, m, n, R);
 }
 
-StatusCode QrReduceComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
-                           int32_t nrhs, Complex* R, Complex* Y) {
-  return QrReduce<Complex>(A, m, n, B, nrhs, R, Y);
+StatusCode QrReduceHankelComplex(const Complex* x, int32_t m, int32_t n, Complex* R) {
+  return QrReduceHankel<Complex>(x, m, n, R);
 }
 
 StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol, double* out) {

@@ -68,13 +68,13 @@ int32_t HasNonFiniteComplex(const Complex* x, int64_t n);
 // of range), so that exactly the keep strongest pass a strict "S > tau" test
 // unless values tie at the boundary.
 double TruncationThreshold(const double* S, int32_t count, int32_t keep);
-// A = QR for m >= n, with B carried along: R (n-by-n, upper triangular, zeros
-// below) and Y = (Q^H B)[0:n] (n-by-nrhs). Q itself is not kept. A and B are
-// not screened.
-[[nodiscard]] StatusCode QrReduceReal(const double* A, int32_t m, int32_t n, const double* B,
-                                      int32_t nrhs, double* R, double* Y);
-[[nodiscard]] StatusCode QrReduceComplex(const Complex* A, int32_t m, int32_t n,
-                                         const Complex* B, int32_t nrhs, Complex* R, Complex* Y);
+// R (n-by-n, row-major, upper triangular, zeros below) of A = QR for the
+// m-by-n Hankel matrix A[i][j] = x[i + n - 1 - j] (m >= n; reads x[0 .. m+n-2]),
+// the forward prediction block of x, which is never formed. Q is not kept and
+// x is not screened; a non-finite R is refused with -20068.
+[[nodiscard]] StatusCode QrReduceHankelReal(const double* x, int32_t m, int32_t n, double* R);
+[[nodiscard]] StatusCode QrReduceHankelComplex(const Complex* x, int32_t m, int32_t n,
+                                               Complex* R);
 // pinv(A), n-by-m, into out or over A when out is null.
 [[nodiscard]] StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol,
                                            double* out);
