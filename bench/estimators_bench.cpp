@@ -4,8 +4,9 @@
 // with the records, the outputs and the times. bench/estimators_bench.py runs
 // it, times numpy's equivalents on the same records and prints the table.
 //
-//   estimators_bench LIBQDM [--quick] [--only EXPORT:RECORD] [--extra] [--threads T]
+//   estimators_bench LIBQDM [--quick] [--only EXPORT:RECORD] [--untimed] [--extra] [--threads T]
 //
+// --untimed writes the outputs with no times.
 // --extra writes the outputs (no times) for records scaled by 1e150 and 1e-150
 // and for a noise-free record, to compare one build's answers with another's.
 //
@@ -323,7 +324,8 @@ int RunThreads(const qdmtest::QdmApi& q, int threads) {
 
 int main(int argc, char** argv) {
   if (argc < 2) {
-    std::fprintf(stderr, "usage: %s LIBQDM [--quick] [--records-only] [--threads T]\n", argv[0]);
+    std::fprintf(stderr, "usage: %s LIBQDM [--quick] [--untimed] [--records-only] [--threads T]\n",
+                 argv[0]);
     return 2;
   }
   bool records_only = false;
@@ -336,6 +338,8 @@ int main(int argc, char** argv) {
       g_batches = 2;
     } else if (std::strcmp(argv[i], "--extra") == 0) {
       extra = true;
+    } else if (std::strcmp(argv[i], "--untimed") == 0) {
+      g_batches = 0;
     } else if (std::strcmp(argv[i], "--records-only") == 0) {
       records_only = true;
     } else if (std::strcmp(argv[i], "--only") == 0 && i + 1 < argc) {

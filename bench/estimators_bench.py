@@ -1,18 +1,22 @@
 #!/usr/bin/python3
 """Estimators next to numpy, on the same records and the same BLAS, in one run.
 
-    estimators_bench.py run BENCH LIBQDM [--quick] [--json OUT]
+    estimators_bench.py run BENCH LIBQDM [--quick] [--rounds R] [--json OUT]
     estimators_bench.py compare OLD.json NEW.json
 
 `run` starts the C++ benchmark BENCH (bench/estimators_bench) on the library
-LIBQDM, which times every export through the host ABI and writes its records,
-outputs and times as JSON; then it times the cheapest numpy equivalent of each
-output on the same records and prints one row per case: both times (ms of
-process CPU time, best of several batches), their ratio (numpy / qdm, above 1
-means qdm is faster) and a check column, the largest relative difference
-between the two outputs (coefficients, poles, mode frequencies and amplitudes;
-spectra in dB). Run both under the same LD_LIBRARY_PATH so that numpy and
-libqdm load the same BLAS.
+LIBQDM, which calls every export through the host ABI and writes its records
+and outputs as JSON. Then, R rounds over (default 3), each case is timed twice
+back to back: by BENCH alone on that case (`--only`), then as the cheapest
+numpy equivalent of its output on the same record. Both times are ms of
+process CPU time, the best of several batches. One row per case gives the
+median of each time over the rounds, the median ratio numpy / qdm of the
+rounds (above 1 means qdm is faster) with the lowest and highest beside it,
+and a check column, the largest relative difference between the two outputs
+(coefficients, poles, mode frequencies and amplitudes; spectra in dB). Timing
+each pair back to back, and taking medians, keeps the drift of a shared
+machine out of the ratio. Run both under the same LD_LIBRARY_PATH so that
+numpy and libqdm load the same BLAS.
 
 `compare` prints, per case and output, the largest relative difference
 between two JSON documents written by `run --json` (or by BENCH itself): how
@@ -207,39 +211,55 @@ def equivalent(case, x):
     return None
 
 
-def run(bench, lib, quick, json_out):
-    cmd = [bench, lib] + (["--quick"] if quick else [])
+def qdm_seconds(bench, lib, case, quick):
+    cmd = [bench, lib, "--only", f"{case['name']}:{case['record']}"] + (["--quick"] if quick else [])
     doc = json.loads(subprocess.run(cmd, check=True, capture_output=True, text=True).stdout)
-    if json_out:
-        with open(json_out, "w") as f:
-            json.dump(doc, f)
+    return doc["cases"][0]["seconds"]
+
+
+def run(bench, lib, quick, rounds, json_out):
+    doc = json.loads(subprocess.run([bench, lib, "--untimed"], check=True, capture_output=True,
+                                    text=True).stdout)
     records = {}
     for key, flat in doc["records"].items():
         records[key] = cx(flat) if key.startswith("complex") else np.asarray(flat, float)
     print(f"libqdm BLAS: {doc['blas']}")
     print(f"numpy {np.__version__}, BLAS: {numpy_blas()}")
+    print(f"{rounds} rounds, each case timed back to back with its numpy equivalent")
     print()
-    print("| export | n | qdm ms | numpy ms | numpy/qdm | check | numpy lstsq alone ms |")
-    print("|---|---:|---:|---:|---:|---:|---:|")
+    print("| export | n | qdm ms | numpy ms | numpy/qdm | lowest–highest | check | numpy lstsq alone ms |")
+    print("|---|---:|---:|---:|---:|---:|---:|---:|")
     for case in doc["cases"]:
         x = records[case["record"]]
         n = len(x)
-        qdm_ms = 1e3 * case["seconds"]
         eq = equivalent(case, x)
+        qdm = []
+        peer = []
+        alone = []
+        for _ in range(rounds):
+            qdm.append(qdm_seconds(bench, lib, case, quick))
+            if eq is None or case["status"] != 0:
+                continue
+            peer.append(best_time(eq[0], quick))
+            if case["name"].endswith("CovarianceH"):
+                A, b = forward(x, int(case["params"]["p"]))
+                alone.append(best_time(lambda: np.linalg.lstsq(A, b, rcond=None), quick))
+        case["seconds"] = float(np.median(qdm))
+        qdm_ms = 1e3 * case["seconds"]
         if case["status"] != 0:
-            print(f"| {case['name']} | {n} | {qdm_ms:.3f} | | | status {case['status']} | |")
+            print(f"| {case['name']} | {n} | {qdm_ms:.3f} | | | | status {case['status']} | |")
             continue
         if eq is None:
-            print(f"| {case['name']} | {n} | {qdm_ms:.3f} | - | - | - | |")
+            print(f"| {case['name']} | {n} | {qdm_ms:.3f} | - | - | | - | |")
             continue
-        fn, check = eq
-        np_ms = 1e3 * best_time(fn, quick)
-        alone = ""
-        if case["name"].endswith("CovarianceH"):
-            A, b = forward(x, int(case["params"]["p"]))
-            alone = f"{1e3 * best_time(lambda: np.linalg.lstsq(A, b, rcond=None), quick):.3f}"
-        print(f"| {case['name']} | {n} | {qdm_ms:.3f} | {np_ms:.3f} | {np_ms / qdm_ms:.2f} "
-              f"| {check():.1e} | {alone} |")
+        ratios = [p / q for p, q in zip(peer, qdm)]
+        alone_ms = f"{1e3 * np.median(alone):.3f}" if alone else ""
+        print(f"| {case['name']} | {n} | {qdm_ms:.3f} | {1e3 * np.median(peer):.3f} "
+              f"| {np.median(ratios):.2f} | {min(ratios):.2f}–{max(ratios):.2f} "
+              f"| {eq[1]():.1e} | {alone_ms} |", flush=True)
+    if json_out:
+        with open(json_out, "w") as f:
+            json.dump(doc, f)
 
 
 def numpy_blas():
@@ -284,7 +304,8 @@ def compare(old_path, new_path):
 if __name__ == "__main__":
     if len(sys.argv) >= 4 and sys.argv[1] == "run":
         out = sys.argv[sys.argv.index("--json") + 1] if "--json" in sys.argv else None
-        run(sys.argv[2], sys.argv[3], "--quick" in sys.argv, out)
+        rounds = int(sys.argv[sys.argv.index("--rounds") + 1]) if "--rounds" in sys.argv else 3
+        run(sys.argv[2], sys.argv[3], "--quick" in sys.argv, rounds, out)
     elif len(sys.argv) == 4 and sys.argv[1] == "compare":
         compare(sys.argv[2], sys.argv[3])
     else:

@@ -157,12 +157,20 @@ struct RowMajorRows {  // A (m-by-n) and B (m-by-nrhs), both row-major
   const T* A;
   const T* B;
   int32_t n, nrhs;
+  // Tiles of kTile rows: a tile of A is read from cache once per column, and
+  // each column of W is written in runs of kTile.
   void operator()(T* W, int32_t ld, int32_t top, int32_t r0, int32_t h) const {
-    for (int32_t i = 0; i < h; ++i) {
-      const T* a_row = A + int64_t{r0 + i} * n;
-      for (int32_t j = 0; j < n; ++j) W[int64_t{j} * ld + top + i] = a_row[j];
-      const T* b_row = B + int64_t{r0 + i} * nrhs;
-      for (int32_t j = 0; j < nrhs; ++j) W[int64_t{n + j} * ld + top + i] = b_row[j];
+    constexpr int32_t kTile = 16;
+    for (int32_t i0 = 0; i0 < h; i0 += kTile) {
+      const int32_t i1 = std::min(h, i0 + kTile);
+      for (int32_t j = 0; j < n; ++j) {
+        T* col = W + int64_t{j} * ld + top;
+        for (int32_t i = i0; i < i1; ++i) col[i] = A[int64_t{r0 + i} * n + j];
+      }
+      for (int32_t j = 0; j < nrhs; ++j) {
+        T* col = W + int64_t{n + j} * ld + top;
+        for (int32_t i = i0; i < i1; ++i) col[i] = B[int64_t{r0 + i} * nrhs + j];
+      }
     }
   }
 };

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <bit>
 #include <cfloat>
+#include <cmath>
 #include <cstring>
 #include <limits>
 #include <type_traits>
@@ -33,9 +34,6 @@ static_assert(kLowerLimit == -1.7976931348623e308);
 inline double FlipSign(double v) {
   return std::bit_cast<double>(std::bit_cast<uint64_t>(v) ^ kSignBit);
 }
-
-// Accepted exactly when kLowerLimit < v < DBL_MAX; NaN fails both comparisons.
-inline bool Rejected(double v) { return !(v > kLowerLimit && v < DBL_MAX); }
 
 // The k = 0 fill; for complex elements both parts are NaN.
 template <typename T>
@@ -138,18 +136,28 @@ StatusCode VecSubReal(const double* a, const double* b, int32_t n, double* out) 
 
 // ---- finiteness screen ---------------------------------------------------------------
 
+// A value is accepted exactly when kLowerLimit < v < DBL_MAX; NaN fails both
+// comparisons. The test runs in chunks with no exit inside them, so that they
+// vectorize: the quiet comparisons (std::isgreater, std::isless) may be
+// evaluated together where ordered ones may not, and a rejected element turns
+// `accepted` to 0 without a branch.
 int32_t HasNonFiniteReal(const double* x, int64_t n) {
-  for (int64_t i = 0; i < n; ++i) {
-    if (Rejected(x[i])) return 1;
+  constexpr int64_t kChunk = 256;
+  for (int64_t i0 = 0; i0 < n; i0 += kChunk) {
+    const int64_t i1 = std::min(n, i0 + kChunk);
+    double accepted = 1.0;
+    for (int64_t i = i0; i < i1; ++i) {
+      const bool in_range = std::isgreater(x[i], kLowerLimit) & std::isless(x[i], DBL_MAX);
+      accepted = in_range ? accepted : 0.0;
+    }
+    if (accepted == 0.0) return 1;
   }
   return 0;
 }
 
+// A complex array is the array of its 2n parts, real part first.
 int32_t HasNonFiniteComplex(const Complex* x, int64_t n) {
-  for (int64_t i = 0; i < n; ++i) {
-    if (Rejected(x[i].real()) || Rejected(x[i].imag())) return 1;
-  }
-  return 0;
+  return HasNonFiniteReal(reinterpret_cast<const double*>(x), 2 * n);
 }
 
 // ---- transposes ----------------------------------------------------------------------

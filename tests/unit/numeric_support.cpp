@@ -651,6 +651,12 @@ TEST(Scalars, SqrtDividePolarAndTheFinitenessScreen) {
     EXPECT_EQ(HasNonFiniteReal(pair, 2) + HasNonFiniteReal(pair, 1), rejected) << v;
     EXPECT_EQ(HasNonFiniteComplex(both, 1) + HasNonFiniteComplex(both + 1, 1), 2 * rejected);
   }
+  // Past the first few hundred elements, and up to just before the rejected one.
+  std::vector<Cx> run(300, Cx(1.0, 1.0));
+  run[277] = Cx(1.0, NAN);
+  const double* parts = reinterpret_cast<const double*>(run.data());
+  EXPECT_EQ(HasNonFiniteReal(parts, 600) * 2 + HasNonFiniteReal(parts, 555), 2);
+  EXPECT_EQ(HasNonFiniteComplex(run.data(), 300) * 2 + HasNonFiniteComplex(run.data(), 277), 2);
 }
 
 }  // namespace
