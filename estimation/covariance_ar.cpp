@@ -30,10 +30,6 @@ StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, doub
   const size_t cols = static_cast<size_t>(p);
   const size_t terms = cols + 1;
 
-  WorkArray<T> b = AllocWorkUninit<T>(rows);
-  if (!b) return status::kNoMemory;
-  WorkArray<T> A = AllocWorkUninit<T>(rows * cols);
-  if (!A) return status::kNoMemory;
   WorkArray<T> w = AllocWork<T>(cols);
   if (!w) return status::kNoMemory;
   WorkArray<T> Aw = AllocWorkUninit<T>(rows);
@@ -50,25 +46,20 @@ StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, doub
   WorkArray<Complex> c = AllocWork<Complex>(terms);
   if (!c) return status::kNoMemory;
 
-  (void)BuildForward(x, n, p, b.get(), A.get());
-
-  // The solve's status is deliberately not examined: a rank-deficient (or
-  // failed) solve goes on with whatever w holds. rcond -1 selects machine
-  // precision. The real solve is the minimum-norm driver, the complex one the
+  // The forward prediction system: A[i][j] = x[i+p-1-j], b[i] = x[i+p]. The
+  // solve's status is deliberately not examined: a rank-deficient (or failed)
+  // solve goes on with whatever w holds. rcond -1 selects machine precision.
+  // The real solve is the minimum-norm driver, the complex one the
   // pseudo-inverse solve.
-  if constexpr (kIsComplex<T>) {
-    (void)LeastSquaresComplex(A.get(), M, p, b.get(), 1, w.get(), -1.0);
-  } else {
-    (void)LeastSquaresReal(A.get(), M, p, b.get(), 1, w.get(), -1.0);
-  }
+  (void)ForwardLeastSquares(x, n, p, w.get(), -1.0);
 
   // The coefficients are the caller's from here on, even if a later step fails.
   a[0] = T(1.0);
   for (size_t k = 0; k < cols; ++k) a[k + 1] = -w[k];
 
-  StatusCode st = MatMul(A.get(), w.get(), M, p, 1, Aw.get());
+  StatusCode st = HankelProduct(x, M, p, w.get(), 1, Aw.get());
   if (st != status::kOk) return st;
-  st = Difference(Aw.get(), b.get(), M, e.get());
+  st = Difference(Aw.get(), x + p, M, e.get());
   if (st != status::kOk) return st;
 
   double sum = 0.0;

@@ -21,31 +21,6 @@ namespace {
 using namespace twin;
 
 // ---- reduced pencil ---------------------------------------------------------------------
-// Z = H V (rows-by-k, row-major) for the Hankel H[i][j] = x[i + cols - 1 - j]
-// (rows-by-cols, reading x[0 .. rows+cols-2]) and V (cols-by-k, row-major). H
-// is formed a block of rows at a time, each row a run of the reversed record.
-template <typename T>
-StatusCode HankelProduct(const T* x, int32_t rows, int32_t cols, const T* V, int32_t k, T* Z) {
-  const int32_t span = rows + cols - 1;
-  const int32_t block = rows < 256 ? rows : 256;
-  auto reversed = AllocWorkUninit<T>(static_cast<size_t>(span));
-  auto H = AllocWorkUninit<T>(static_cast<size_t>(block) * static_cast<size_t>(cols));
-  if (!reversed || !H) return status::kNoMemory;
-  for (int32_t t = 0; t < span; ++t) reversed[t] = x[span - 1 - t];
-  // H[i][j] = reversed[rows - 1 - i + j].
-  for (int32_t r0 = 0; r0 < rows; r0 += block) {
-    const int32_t h = rows - r0 < block ? rows - r0 : block;
-    for (int32_t i = 0; i < h; ++i) {
-      std::memcpy(static_cast<void*>(H.get() + static_cast<size_t>(i) * static_cast<size_t>(cols)),
-                  reversed.get() + (rows - 1 - r0 - i), static_cast<size_t>(cols) * sizeof(T));
-    }
-    const StatusCode st =
-        MatMul(H.get(), V, h, cols, k, Z + static_cast<size_t>(r0) * static_cast<size_t>(k));
-    if (st != status::kOk) return st;
-  }
-  return status::kOk;
-}
-
 // Only the leading mr x mr block of K is ever used (mr = min(M, r)), and each of
 // its elements depends only on the first mr singular triplets, so only those
 // are computed and only that block is formed: K_M = diag(1/s_M) U_M^H Y2 V_M.

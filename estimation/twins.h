@@ -73,6 +73,22 @@ inline StatusCode TruncatedSolve(const Complex* A, int32_t m, int32_t n, const C
                                  Complex* X, int32_t keep) {
   return LeastSquaresTruncatedComplex(A, m, n, B, 1, X, keep);
 }
+inline StatusCode HankelProduct(const double* x, int32_t rows, int32_t cols, const double* V,
+                                int32_t k, double* Z) {
+  return HankelProductReal(x, rows, cols, V, k, Z);
+}
+inline StatusCode HankelProduct(const Complex* x, int32_t rows, int32_t cols, const Complex* V,
+                                int32_t k, Complex* Z) {
+  return HankelProductComplex(x, rows, cols, V, k, Z);
+}
+inline StatusCode ForwardLeastSquares(const double* x, int32_t n, int32_t p, double* w,
+                                      double rcond) {
+  return ForwardLeastSquaresReal(x, n, p, w, rcond);
+}
+inline StatusCode ForwardLeastSquares(const Complex* x, int32_t n, int32_t p, Complex* w,
+                                      double rcond) {
+  return ForwardLeastSquaresComplex(x, n, p, w, rcond);
+}
 // R of the QR of the forward prediction block of x (m rows, n columns).
 inline StatusCode QrReduceHankel(const double* x, int32_t m, int32_t n, double* R) {
   return QrReduceHankelReal(x, m, n, R);

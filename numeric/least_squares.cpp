@@ -150,13 +150,18 @@ StatusCode FoldStep(Complex* W, int32_t ld, int32_t top, int32_t h, int32_t N, C
   return lapack::Geqrf(h, N, W, ld, tau);
 }
 
-// Where the fold takes its rows from. Fill(W, ld, top, r0, h) writes rows
-// r0 .. r0+h-1 of [A B] into rows top .. top+h-1 of the column-major W.
+// Where a solve takes its system from. Fill(W, ld, top, r0, h) writes rows
+// r0 .. r0+h-1 of [A B] into rows top .. top+h-1 of the column-major W;
+// NonFiniteA(m) and NonFiniteB(m) screen A's and B's m rows; kDense says
+// whether A and B exist as arrays (a Hankel system is only ever folded).
 template <typename T>
 struct RowMajorRows {  // A (m-by-n) and B (m-by-nrhs), both row-major
+  static constexpr bool kDense = true;
   const T* A;
   const T* B;
   int32_t n, nrhs;
+  bool NonFiniteA(int32_t m) const { return HasNonFinite(A, int64_t{m} * n) != 0; }
+  bool NonFiniteB(int32_t m) const { return HasNonFinite(B, int64_t{m} * nrhs) != 0; }
   // Tiles of kTile rows: a tile of A is read from cache once per column, and
   // each column of W is written in runs of kTile.
   void operator()(T* W, int32_t ld, int32_t top, int32_t r0, int32_t h) const {
@@ -174,15 +179,22 @@ struct RowMajorRows {  // A (m-by-n) and B (m-by-nrhs), both row-major
     }
   }
 };
+// The forward prediction block of x, A[i][j] = x[i + n - 1 - j], each column a
+// run of x; with `rhs`, also b[i] = x[i + n], one more run.
 template <typename T>
-struct HankelRows {  // A[i][j] = x[i + n - 1 - j]: each column a run of x
+struct HankelRows {
+  static constexpr bool kDense = false;
   const T* x;
   int32_t n;
+  bool rhs;
+  bool NonFiniteA(int32_t m) const { return HasNonFinite(x, int64_t{m} + n - 1) != 0; }
+  bool NonFiniteB(int32_t m) const { return HasNonFinite(x + n, m) != 0; }
   void operator()(T* W, int32_t ld, int32_t top, int32_t r0, int32_t h) const {
+    const size_t bytes = static_cast<size_t>(h) * sizeof(T);
     for (int32_t j = 0; j < n; ++j) {
-      std::memcpy(static_cast<void*>(W + int64_t{j} * ld + top), x + int64_t{r0} + n - 1 - j,
-                  static_cast<size_t>(h) * sizeof(T));
+      std::memcpy(static_cast<void*>(W + int64_t{j} * ld + top), x + int64_t{r0} + n - 1 - j, bytes);
     }
+    if (rhs) std::memcpy(static_cast<void*>(W + int64_t{n} * ld + top), x + int64_t{r0} + n, bytes);
   }
 };
 
@@ -231,11 +243,6 @@ StatusCode FoldQr(const Rows& rows, int32_t m, int32_t n, int32_t nrhs, T* R, T*
   return status::kOk;
 }
 
-template <typename T>
-StatusCode FoldQr(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* R, T* y) {
-  return FoldQr(RowMajorRows<T>{A, B, n, nrhs}, m, n, nrhs, R, y);
-}
-
 // Which singular values a solve keeps: those above max(m, n) S[0] e (relative),
 // or those above the midpoint threshold of TruncationThreshold for `keep`
 // components (absolute, no warning).
@@ -252,22 +259,21 @@ struct Cut {
 // of the tall matrix nor the pseudo-inverse itself is ever formed. *kept is the
 // number of singular values kept. nrhs < 1 (possible from the complex solve
 // only) factors A for its statuses and writes nothing.
-template <typename T>
-StatusCode SvdSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X, Cut cut,
+template <typename T, typename Rows>
+StatusCode SvdSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, T* X, Cut cut,
                     int32_t* kept) {
   const int32_t k = std::min(m, n);
   const bool tall = IsTall(m, n) && nrhs > 0;
   const int32_t rows = tall ? n : m;  // rows of the matrix decomposed
-  const int64_t mn = int64_t{m} * n;
 
   Factors<T> f;
   if (!f.Allocate(rows, n, k)) return status::kNoMemory;
   WorkArray<T> qr;
   WorkArray<T> y;
-  const T* base = B;  // the right-hand sides U^H is applied to
+  const T* base = nullptr;  // the right-hand sides U^H is applied to
   StatusCode st = status::kOk;
   if (tall) {
-    if (HasNonFinite(A, mn) != 0) return status::kNonFinite;
+    if (system.NonFiniteA(m)) return status::kNonFinite;
     const int64_t nn = int64_t{n} * n;
     const int64_t nr = int64_t{n} * nrhs;
     qr = AllocWorkUninit<T>(static_cast<size_t>(2 * nn + nr));
@@ -276,14 +282,15 @@ StatusCode SvdSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, 
     T* r_col = qr.get();
     T* r = r_col + nn;
     T* y_col = r + nn;
-    st = FoldQr(A, m, n, B, nrhs, r_col, y_col);
+    st = FoldQr(system, m, n, nrhs, r_col, y_col);
     if (st != status::kOk) return st;
     TransposeTo(r_col, n, n, r, false);
     TransposeTo(y_col, nrhs, n, y.get(), false);
     st = SvdOf(r, n, n, f.U, f.S, f.V);
     base = y.get();
-  } else {
-    st = SvdOf(A, m, n, f.U, f.S, f.V);
+  } else if constexpr (Rows::kDense) {
+    st = SvdOf(system.A, m, n, f.U, f.S, f.V);
+    base = system.B;
   }
   if (st != status::kOk) return st;
 
@@ -313,24 +320,21 @@ StatusCode SvdSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, 
 
 // X = pinv(A) B, with singular values at or below max(m, n) S[0] e dropped,
 // e = rcond when positive, machine epsilon otherwise.
-template <typename T>
-StatusCode PinvSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X,
-                     double rcond) {
+template <typename T, typename Rows>
+StatusCode PinvSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, T* X, double rcond) {
   if constexpr (kIsComplex<T>) {
     // Deliberately narrower than the real twin: nrhs is not checked (a negative
     // count gives -20004 once A is factored), and only B is screened here; A
     // is screened by its factorization.
     if (m < 1 || n < 1) return status::kBadSize;
-    if (HasNonFiniteComplex(B, int64_t{m} * nrhs) != 0) return status::kNonFinite;
+    if (system.NonFiniteB(m)) return status::kNonFinite;
   } else {
     if (m < 1 || n < 1 || nrhs < 1) return status::kBadSize;
-    if (HasNonFiniteReal(A, int64_t{m} * n) != 0 || HasNonFiniteReal(B, int64_t{m} * nrhs) != 0) {
-      return status::kNonFinite;
-    }
+    if (system.NonFiniteA(m) || system.NonFiniteB(m)) return status::kNonFinite;
   }
   int32_t kept = 0;
   const StatusCode st =
-      SvdSolve(A, m, n, B, nrhs, X, Cut{true, rcond > 0.0 ? rcond : kEpsilon, 0}, &kept);
+      SvdSolve(system, m, n, nrhs, X, Cut{true, rcond > 0.0 ? rcond : kEpsilon, 0}, &kept);
   if (st != status::kOk) return st;
   return kept == std::min(m, n) ? status::kOk : status::kRankDeficient;
 }
@@ -343,7 +347,7 @@ StatusCode TruncatedSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t 
     return status::kNonFinite;
   }
   int32_t kept = 0;
-  return SvdSolve(A, m, n, B, nrhs, X, Cut{false, 0.0, keep}, &kept);
+  return SvdSolve(RowMajorRows<T>{A, B, n, nrhs}, m, n, nrhs, X, Cut{false, 0.0, keep}, &kept);
 }
 
 // pinv(A) into out, or over A when out is null. tol < 0 selects
@@ -377,37 +381,37 @@ StatusCode PseudoInverse(T* A, int32_t m, int32_t n, double tol, T* out) {
 
 namespace {
 
-StatusCode GelsdSolve(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
-                      double* X, double rcond) {
-  if (m < 1 || n < 1 || nrhs < 1) return status::kBadSize;
-  if (HasNonFiniteReal(A, int64_t{m} * n) != 0 || HasNonFiniteReal(B, int64_t{m} * nrhs) != 0) {
-    return status::kNonFinite;
-  }
-  if (UsesPinvPath(m, n)) return LeastSquaresPinvReal(A, m, n, B, nrhs, X, rcond);
+// A negative or NaN rcond selects machine epsilon; zero stays zero. DGELSD
+// takes it times max(m, n).
+double GelsdRcond(int32_t m, int32_t n, double rcond) {
+  return std::max(m, n) * (rcond >= 0.0 ? rcond : kEpsilon);
+}
 
-  const int32_t k = std::min(m, n);
-  // A negative or NaN rcond selects machine epsilon; zero stays zero.
-  const double r = rcond >= 0.0 ? rcond : kEpsilon;
-  const double lapack_rcond = std::max(m, n) * r;
+// DGELSD on R and (Q^H B)[0:n] of the tall A = QR: the same singular values,
+// rank and minimum-norm solution as on A itself, RCOND unchanged.
+template <typename Rows>
+StatusCode GelsdFolded(const Rows& system, int32_t m, int32_t n, int32_t nrhs, double* X,
+                       double rcond) {
+  const int64_t nn = int64_t{n} * n;
+  WorkArray<double> small = AllocWorkUninit<double>(static_cast<size_t>(nn + int64_t{n} * nrhs + n));
+  if (!small) return status::kNoMemory;
+  double* R = small.get();
+  double* y = R + nn;
+  double* sv = y + int64_t{n} * nrhs;
+  StatusCode st = FoldQr(system, m, n, nrhs, R, y);
+  if (st != status::kOk) return st;
   lapack_int rank = 0;
+  st = lapack::Gelsd(n, n, nrhs, R, n, y, n, sv, GelsdRcond(m, n, rcond), &rank);
+  if (st != status::kOk) return st;
+  for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(n, y + int64_t{j} * n, 1, X + j, nrhs);
+  return rank < n ? status::kRankDeficient : status::kOk;
+}
 
-  if (IsTall(m, n)) {
-    // DGELSD on R and (Q^H B)[0:n] of A = QR: the same singular values, rank
-    // and minimum-norm solution as on A itself, RCOND unchanged.
-    const int64_t nn = int64_t{n} * n;
-    WorkArray<double> small = AllocWorkUninit<double>(static_cast<size_t>(nn + int64_t{n} * nrhs + n));
-    if (!small) return status::kNoMemory;
-    double* R = small.get();
-    double* y = R + nn;
-    double* sv = y + int64_t{n} * nrhs;
-    StatusCode st = FoldQr(A, m, n, B, nrhs, R, y);
-    if (st != status::kOk) return st;
-    st = lapack::Gelsd(n, n, nrhs, R, n, y, n, sv, lapack_rcond, &rank);
-    if (st != status::kOk) return st;
-    for (int32_t j = 0; j < nrhs; ++j) lapack::Copy(n, y + int64_t{j} * n, 1, X + j, nrhs);
-    return rank < k ? status::kRankDeficient : status::kOk;
-  }
-
+StatusCode GelsdDense(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
+                      double* X, double rcond) {
+  const int32_t k = std::min(m, n);
+  const double lapack_rcond = GelsdRcond(m, n, rcond);
+  lapack_int rank = 0;
   const int32_t ldb = std::max(m, n);
   // Column-major right-hand sides; rows m..ldb-1 of each column are DGELSD's
   // room for the solution of a wide system.
@@ -431,11 +435,25 @@ StatusCode GelsdSolve(const double* A, int32_t m, int32_t n, const double* B, in
   return st;
 }
 
+template <typename Rows>
+StatusCode GelsdSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, double* X,
+                      double rcond) {
+  if (m < 1 || n < 1 || nrhs < 1) return status::kBadSize;
+  if (system.NonFiniteA(m) || system.NonFiniteB(m)) return status::kNonFinite;
+  if (IsTall(m, n)) return GelsdFolded(system, m, n, nrhs, X, rcond);
+  if constexpr (Rows::kDense) {
+    if (UsesPinvPath(m, n)) return LeastSquaresPinvReal(system.A, m, n, system.B, nrhs, X, rcond);
+    return GelsdDense(system.A, m, n, system.B, nrhs, X, rcond);
+  } else {
+    return status::kBadSize;  // never reached: a Hankel system comes only tall
+  }
+}
+
 }  // namespace
 
 StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
                             double* X, double rcond) {
-  const StatusCode st = GelsdSolve(A, m, n, B, nrhs, X, rcond);
+  const StatusCode st = GelsdSolve(RowMajorRows<double>{A, B, n, nrhs}, m, n, nrhs, X, rcond);
   call_record::Note(st);
   return st;
 }
@@ -444,16 +462,58 @@ StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double*
 
 StatusCode LeastSquaresPinvReal(const double* A, int32_t m, int32_t n, const double* B,
                                 int32_t nrhs, double* X, double rcond) {
-  const StatusCode st = PinvSolve<double>(A, m, n, B, nrhs, X, rcond);
+  const StatusCode st = PinvSolve(RowMajorRows<double>{A, B, n, nrhs}, m, n, nrhs, X, rcond);
   call_record::Note(st);
   return st;
 }
 
 StatusCode LeastSquaresComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
                                int32_t nrhs, Complex* X, double rcond) {
-  const StatusCode st = PinvSolve<Complex>(A, m, n, B, nrhs, X, rcond);
+  const StatusCode st = PinvSolve(RowMajorRows<Complex>{A, B, n, nrhs}, m, n, nrhs, X, rcond);
   call_record::Note(st);
   return st;
+}
+
+// The forward prediction problem of x, solved as LeastSquaresReal and
+// LeastSquaresComplex solve it formed (the same screens, in the same order, and
+// the same statuses). A tall one is folded straight from x.
+namespace {
+template <typename T>
+StatusCode ForwardSolve(const T* x, int32_t n, int32_t p, T* w, double rcond) {
+  const int32_t m = n - p;
+  if (m < 1 || p < 1 || !IsTall(m, p)) {
+    const int64_t mp = int64_t{std::max(m, 0)} * std::max(p, 0);
+    WorkArray<T> A = AllocWorkUninit<T>(static_cast<size_t>(mp));
+    if (!A) return status::kNoMemory;
+    for (int32_t i = 0; i < m; ++i) {
+      for (int32_t j = 0; j < p; ++j) A[int64_t{i} * p + j] = x[i + p - 1 - j];
+    }
+    if constexpr (kIsComplex<T>) {
+      return LeastSquaresComplex(A.get(), m, p, x + p, 1, w, rcond);
+    } else {
+      return LeastSquaresReal(A.get(), m, p, x + p, 1, w, rcond);
+    }
+  }
+  const HankelRows<T> system{x, p, true};
+  StatusCode st = status::kOk;
+  if constexpr (kIsComplex<T>) {
+    st = PinvSolve(system, m, p, 1, w, rcond);
+  } else {
+    st = GelsdSolve(system, m, p, 1, w, rcond);
+  }
+  call_record::Note(st);
+  return st;
+}
+}  // namespace
+
+StatusCode ForwardLeastSquaresReal(const double* x, int32_t n, int32_t p, double* w,
+                                   double rcond) {
+  return ForwardSolve<double>(x, n, p, w, rcond);
+}
+
+StatusCode ForwardLeastSquaresComplex(const Complex* x, int32_t n, int32_t p, Complex* w,
+                                      double rcond) {
+  return ForwardSolve<Complex>(x, n, p, w, rcond);
 }
 
 StatusCode LeastSquaresTruncatedReal(const double* A, int32_t m, int32_t n, const double* B,
@@ -477,7 +537,7 @@ StatusCode QrReduceHankel(const T* x, int32_t m, int32_t n, T* R) {
   if (m < 1 || n < 1 || m < n) return status::kBadSize;
   WorkArray<T> col = AllocWorkUninit<T>(static_cast<size_t>(int64_t{n} * n));
   if (!col) return status::kNoMemory;
-  const StatusCode st = FoldQr(HankelRows<T>{x, n}, m, n, 0, col.get(), static_cast<T*>(nullptr));
+  const StatusCode st = FoldQr(HankelRows<T>{x, n, false}, m, n, 0, col.get(), static_cast<T*>(nullptr));
   if (st != status::kOk) return st;
   TransposeTo(col.get(), n, n, R, false);
   return status::kOk;

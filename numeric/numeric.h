@@ -16,6 +16,13 @@
                                     int32_t n, double* C);
 [[nodiscard]] StatusCode MatMulComplex(const Complex* A, const Complex* B, int32_t m, int32_t k,
                                        int32_t n, Complex* C);
+// Z (rows-by-k, row-major) = H V for the Hankel H[i][j] = x[i + cols - 1 - j]
+// (rows-by-cols, reading x[0 .. rows+cols-2]; the forward prediction block of
+// x, with rows past its last), V cols-by-k row-major. H is never formed whole.
+[[nodiscard]] StatusCode HankelProductReal(const double* x, int32_t rows, int32_t cols,
+                                           const double* V, int32_t k, double* Z);
+[[nodiscard]] StatusCode HankelProductComplex(const Complex* x, int32_t rows, int32_t cols,
+                                              const Complex* V, int32_t k, Complex* Z);
 [[nodiscard]] StatusCode DotReal(const double* x, const double* y, int32_t n, double* result);
 [[nodiscard]] StatusCode VecSubReal(const double* a, const double* b, int32_t n, double* out);
 // 1 if some value is NaN, infinite, == DBL_MAX or <= -1.7976931348623e308; else 0.
@@ -68,6 +75,15 @@ int32_t HasNonFiniteComplex(const Complex* x, int64_t n);
 // of range), so that exactly the keep strongest pass a strict "S > tau" test
 // unless values tie at the boundary.
 double TruncationThreshold(const double* S, int32_t count, int32_t keep);
+// The forward prediction problem of the n samples x for order p: w (p values)
+// minimising ||A w - b|| with A[i][j] = x[i + p - 1 - j] and b[i] = x[i + p],
+// i < n - p. The answer, statuses and call-record notes are those of
+// LeastSquaresReal / LeastSquaresComplex on the formed A and b with nrhs = 1;
+// a tall system (n - p >= 2p) is never formed.
+[[nodiscard]] StatusCode ForwardLeastSquaresReal(const double* x, int32_t n, int32_t p,
+                                                 double* w, double rcond);
+[[nodiscard]] StatusCode ForwardLeastSquaresComplex(const Complex* x, int32_t n, int32_t p,
+                                                    Complex* w, double rcond);
 // R (n-by-n, row-major, upper triangular, zeros below) of A = QR for the
 // m-by-n Hankel matrix A[i][j] = x[i + n - 1 - j] (m >= n; reads x[0 .. m+n-2]),
 // the forward prediction block of x, which is never formed. Q is not kept and

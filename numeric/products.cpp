@@ -120,6 +120,40 @@ StatusCode MatMulComplex(const Complex* A, const Complex* B, int32_t m, int32_t 
   return MatMul<Complex>(A, B, m, k, n, C, false);
 }
 
+// ---- Hankel products -------------------------------------------------------------------
+// H is formed a block of rows at a time, each row a run of the reversed record:
+// H[i][j] = x[i + cols - 1 - j] = reversed[rows - 1 - i + j].
+namespace {
+template <typename T>
+StatusCode HankelProduct(const T* x, int32_t rows, int32_t cols, const T* V, int32_t k, T* Z) {
+  if (rows < 1 || cols < 1 || k < 1) return status::kBadSize;
+  const int64_t span = int64_t{rows} + cols - 1;
+  const int32_t block = std::min(rows, 256);
+  WorkArray<T> reversed = AllocWorkUninit<T>(static_cast<size_t>(span));
+  WorkArray<T> H = AllocWorkUninit<T>(static_cast<size_t>(int64_t{block} * cols));
+  if (!reversed || !H) return status::kNoMemory;
+  for (int64_t t = 0; t < span; ++t) reversed[t] = x[span - 1 - t];
+  for (int32_t r0 = 0; r0 < rows; r0 += block) {
+    const int32_t h = std::min(block, rows - r0);
+    for (int32_t i = 0; i < h; ++i) {
+      std::memcpy(static_cast<void*>(H.get() + int64_t{i} * cols),
+                  reversed.get() + (rows - 1 - r0 - i), static_cast<size_t>(cols) * sizeof(T));
+    }
+    GemmInto(H.get(), V, h, cols, k, Z + int64_t{r0} * k);
+  }
+  return status::kOk;
+}
+}  // namespace
+
+StatusCode HankelProductReal(const double* x, int32_t rows, int32_t cols, const double* V,
+                             int32_t k, double* Z) {
+  return HankelProduct<double>(x, rows, cols, V, k, Z);
+}
+StatusCode HankelProductComplex(const Complex* x, int32_t rows, int32_t cols, const Complex* V,
+                                int32_t k, Complex* Z) {
+  return HankelProduct<Complex>(x, rows, cols, V, k, Z);
+}
+
 // ---- vector helpers ----------------------------------------------------------------
 
 StatusCode DotReal(const double* x, const double* y, int32_t n, double* result) {

@@ -289,6 +289,29 @@ TYPED_TEST(Dense, ThresholdsAndRankDecisions) {
     EXPECT_EQ(TruncationThreshold(s, 3, keep), want) << keep;
 }
 
+// The forward prediction solve, folded straight from the record when tall, gives the formed
+// system's solve bit for bit, status included: several fold blocks, either side of tall, a
+// constant record (rank 1) and a NaN.
+TYPED_TEST(Dense, ForwardSolveIsTheFormedSolve) {
+  using T = TypeParam;
+  for (auto [n, p, kind] : {std::tuple{9000, 16, 0}, {36, 12, 0}, {35, 12, 0}, {200, 10, 1},
+                            {200, 10, 2}}) {
+    SCOPED_TRACE(::testing::Message() << n << " " << p << " " << kind);
+    auto x = Random<T>(1, n, 41);
+    if (kind == 1) x.assign(n, T(1.0));
+    if (kind == 2) x[150] = T(NAN);
+    const int32_t m = n - p;
+    std::vector<T> a(size_t(m) * p), w(p, T(7.0)), want(p, T(7.0));
+    for (int32_t i = 0; i < m; ++i)
+      for (int32_t j = 0; j < p; ++j) a[size_t(i) * p + j] = x[i + p - 1 - j];
+    const StatusCode got = Twin(ForwardLeastSquaresReal, ForwardLeastSquaresComplex, x.data(), n,
+                                p, w.data(), -1.0);
+    EXPECT_EQ(got, Solve(kFirstSolver<T>, a.data(), m, p, x.data() + p, 1, want.data(), -1.0, 0));
+    EXPECT_EQ(got, kind == 0 ? 0 : kind == 1 ? 20001 : -20068);
+    EXPECT_EQ(w, want);
+  }
+}
+
 // An injected driver failure reaches each caller as the status its INFO maps to, nothing
 // written. A real solve leaves DGELSD past a width that grows with the rows: an INFO < 0
 // shows the way, a rank-0 solve in DGELSD (its rank decides), a failure in an SVD.
