@@ -40,18 +40,16 @@ StatusCode ModeAmplitudes(const T* x, int32_t n, const Complex* z, int32_t k, Co
   if (!residual) return status::kNoMemory;
 
   // Vandermonde matrix V[t][i] = z_i^t by running products down each column:
-  // no power function, so every entry is the exact product chain.
-  for (size_t i = 0; i < cols; ++i) {
-    const double zr = z[i].real();
-    const double zi = z[i].imag();
-    double re = 1.0;
-    double im = 0.0;
-    for (size_t t = 0; t < rows; ++t) {
-      V[t * cols + i] = Complex(re, im);
-      const double next_re = re * zr - im * zi;
-      const double next_im = re * zi + im * zr;
-      re = next_re;
-      im = next_im;
+  // no power function, so every entry is the exact product chain. The chains
+  // advance together, a row at a time, so V is written in order.
+  for (size_t i = 0; i < cols; ++i) V[i] = Complex(1.0, 0.0);
+  for (size_t t = 1; t < rows; ++t) {
+    const Complex* prev = V.get() + (t - 1) * cols;
+    Complex* row = V.get() + t * cols;
+    for (size_t i = 0; i < cols; ++i) {
+      const double re = prev[i].real(), im = prev[i].imag();
+      const double zr = z[i].real(), zi = z[i].imag();
+      row[i] = Complex(re * zr - im * zi, re * zi + im * zr);
     }
   }
 

@@ -43,6 +43,16 @@ inline void Gemm(int32_t m, int32_t n, int32_t k, const Complex* A, const Comple
               &one, A, adjointA ? m : k, B, n, &zero, C, n);
 }
 
+// Row-major y (m) = A (m-by-k, lda = k) * x (k).
+inline void Gemv(int32_t m, int32_t k, const double* A, const double* x, double* y) {
+  cblas_dgemv(CblasRowMajor, CblasNoTrans, m, k, 1.0, A, k, x, 1, 0.0, y, 1);
+}
+inline void Gemv(int32_t m, int32_t k, const Complex* A, const Complex* x, Complex* y) {
+  const Complex one(1.0, 0.0);
+  const Complex zero(0.0, 0.0);
+  cblas_zgemv(CblasRowMajor, CblasNoTrans, m, k, &one, A, k, x, 1, &zero, y, 1);
+}
+
 // ---- LAPACK drivers, column-major ---------------------------------------------------
 // Each returns 0, -20001 when its workspace cannot be had, or the status its
 // INFO maps to (see lapack_boundary.cpp for the mapping of each driver).

@@ -51,6 +51,11 @@ void FillQuietNaN(T* C, int64_t count) {
 // C = A * B into storage that does not overlap A or B.
 template <typename T>
 void GemmInto(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C) {
+  // A single column is a matrix-vector product: gemm would pack all of A first.
+  if (n == 1) {
+    lapack::Gemv(m, k, A, B, C);
+    return;
+  }
   if constexpr (std::is_same_v<T, double>) {
     // Only the real product is blocked.
     if (m > kBlockRows && k > kBlockMinInner && n > kBlockMinCols) {
