@@ -186,8 +186,9 @@ int32_t HasNonFiniteReal(const double* x, int64_t n) {
     const int64_t i1 = std::min(n, i0 + kChunk);
     double accepted = 1.0;
     for (int64_t i = i0; i < i1; ++i) {
-      const bool in_range = std::isgreater(x[i], kLowerLimit) & std::isless(x[i], DBL_MAX);
-      accepted = in_range ? accepted : 0.0;
+      const int in_range = static_cast<int>(std::isgreater(x[i], kLowerLimit)) &
+                           static_cast<int>(std::isless(x[i], DBL_MAX));
+      accepted = in_range != 0 ? accepted : 0.0;
     }
     if (accepted == 0.0) return 1;
   }
