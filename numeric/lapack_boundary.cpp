@@ -305,8 +305,8 @@ StatusCode Geqrf(lapack_int m, lapack_int n, Complex* a, lapack_int lda, Complex
   return Done(Driver::kGeqrf, info);
 }
 
-// Compact-WY blocking: block reflectors of kQrBlock columns (32 above 64
-// columns), their triangular factors T kept in the workspace and dropped; only
+// Compact-WY blocking: block reflectors of 8 columns (32 when there are more
+// than 64), their triangular factors T kept in the workspace and dropped; only
 // R is wanted. T and the work array are both nb-by-n.
 namespace {
 lapack_int QrBlock(lapack_int m, lapack_int n) {

@@ -253,8 +253,8 @@ struct Cut {
 };
 
 // X = V diag(1/S) U^H B over the kept singular values of A = U diag(S) V^H. A
-// tall A is first factored as A = QR (Householder QR over row blocks, Q^H
-// applied to B on the way) and the SVD taken of R = U_R diag(S) V_R^H, whose
+// tall A is first factored as A = QR (Householder QR over row blocks, B
+// folded along as extra columns) and the SVD taken of R = U_R diag(S) V_R^H, whose
 // singular values are those of A; then X = V_R diag(1/S) U_R^H (Q^H B)[0:n]. Neither U
 // of the tall matrix nor the pseudo-inverse itself is ever formed. *kept is the
 // number of singular values kept. nrhs < 1 (possible from the complex solve
@@ -291,6 +291,8 @@ StatusCode SvdSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, T* X
   } else if constexpr (Rows::kDense) {
     st = SvdOf(system.A, m, n, f.U, f.S, f.V);
     base = system.B;
+  } else {
+    return status::kBadSize;  // never reached: a Hankel system comes only tall
   }
   if (st != status::kOk) return st;
 
