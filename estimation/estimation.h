@@ -76,6 +76,17 @@ StatusCode ScaleRowsByInverseComplex(Complex* A, int32_t rows, int32_t cols, con
 [[nodiscard]] StatusCode MatrixPencilComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
                                              double fs, double* amp, double* phase, double* damp,
                                              double* freq, double* mse, int32_t* count);
+// The same fit with Y1's leading triplets by Lanczos over FFT products
+// (numeric/krylov.h), forming neither Y1 nor Y2: for long records. The same
+// poles to rounding where Y1's M-th singular value stands clear of the next.
+[[nodiscard]] StatusCode MatrixPencilKrylovReal(const double* x, int32_t n, int32_t L, int32_t M,
+                                                double fs, int32_t realFlag, double* amp,
+                                                double* phase, double* damp, double* freq,
+                                                double* mse, int32_t* count);
+[[nodiscard]] StatusCode MatrixPencilKrylovComplex(const Complex* x, int32_t n, int32_t L,
+                                                   int32_t M, double fs, double* amp,
+                                                   double* phase, double* damp, double* freq,
+                                                   double* mse, int32_t* count);
 
 // ---- minimum description length ------------------------------------------------------------
 [[nodiscard]] StatusCode MdlOrderReal(const double* x, int32_t n, int32_t L, int32_t minOrder,

@@ -11,6 +11,7 @@
 #include <random>
 #include <vector>
 
+#include "estimation/estimation.h"
 #include "numeric/krylov.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
@@ -201,3 +202,72 @@ TEST(HankelFft, RefusesBadSizesAndCountsAllocations) {
 }
 
 }  // namespace
+
+// ---- the matrix pencil on the Krylov route against the dense route ------------------------
+namespace pencil {
+
+struct Case {
+  int32_t n, M;
+  Kind kind;
+  double snr_db;
+};
+
+template <typename T>
+void Agree() {
+  const Case cases[] = {{256, 2, kModes, 40},  {256, 4, kModes, 10},   {1024, 8, kModes, 30},
+                        {1024, 3, kNoiseFree, 0}, {1200, 2, kClose, 40}, {1536, 6, kModes, 20},
+                        {999, 5, kModes, 25}};
+  for (const Case& c : cases) {
+    SCOPED_TRACE(testing::Message() << "n " << c.n << " M " << c.M << " kind " << c.kind);
+    const int modes = c.kind == kClose ? 2 : c.M;
+    std::vector<T> x = Record<T>(c.kind == kModes ? kNoiseFree : c.kind, c.n, modes, 23);
+    if (c.kind == kModes) {  // noise at the asked SNR against the first mode
+      std::mt19937_64 gen(29);
+      std::normal_distribution<double> g(0.0, std::pow(10.0, -c.snr_db / 20.0));
+      for (T& v : x) {
+        if constexpr (kIsCx<T>) v += T(g(gen), g(gen)); else v += g(gen);
+      }
+    }
+    const int32_t L = c.n / 3;
+    std::vector<double> a[2], p[2], d[2], f[2], mse(2);
+    std::vector<int32_t> count(2);
+    StatusCode st[2];
+    for (int route = 0; route < 2; ++route) {
+      for (auto* v : {&a[route], &p[route], &d[route], &f[route]}) v->assign(size_t(c.M), 0.0);
+      if constexpr (kIsCx<T>) {
+        st[route] = (route ? MatrixPencilKrylovComplex : MatrixPencilComplex)(
+            x.data(), c.n, L, c.M, 1.0, a[route].data(), p[route].data(), d[route].data(),
+            f[route].data(), &mse[route], &count[route]);
+      } else {
+        st[route] = (route ? MatrixPencilKrylovReal : MatrixPencilReal)(
+            x.data(), c.n, L, c.M, 1.0, 0, a[route].data(), p[route].data(), d[route].data(),
+            f[route].data(), &mse[route], &count[route]);
+      }
+    }
+    ASSERT_EQ(st[0], st[1]);
+    ASSERT_EQ(st[0], 0);
+    ASSERT_EQ(count[0], count[1]);
+    // Modes in frequency order on both routes.
+    std::vector<int> o[2];
+    for (int route = 0; route < 2; ++route) {
+      for (int i = 0; i < count[route]; ++i) o[route].push_back(i);
+      std::sort(o[route].begin(), o[route].end(),
+                [&](int i, int j) { return f[route][size_t(i)] < f[route][size_t(j)]; });
+    }
+    for (int k = 0; k < count[0]; ++k) {
+      const size_t i = size_t(o[0][size_t(k)]), j = size_t(o[1][size_t(k)]);
+      EXPECT_NEAR(f[1][j], f[0][i], 1e-9 * std::max(1e-3, std::abs(f[0][i]))) << "frequency " << k;
+      EXPECT_NEAR(d[1][j], d[0][i], 1e-9 * std::max(1e-3, std::abs(d[0][i]))) << "damping " << k;
+      EXPECT_NEAR(a[1][j], a[0][i], 1e-8 * a[0][i]) << "amplitude " << k;
+      EXPECT_NEAR(p[1][j], p[0][i], 1e-8) << "phase " << k;
+    }
+    EXPECT_NEAR(mse[1], mse[0], 1e-8 * mse[0] + 1e-20);  // noise-free: rounding level
+  }
+}
+
+}  // namespace pencil
+
+TEST(HankelFft, PencilKrylovRouteAgreesWithDense) {
+  pencil::Agree<double>();
+  pencil::Agree<Cx>();
+}
