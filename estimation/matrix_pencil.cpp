@@ -6,6 +6,8 @@
 // With Y1 = U diag(s) V^H (r = min(q, L) components), the reduced pencil is
 //   K = diag(1/s) U^H Y2 V   (r x r),
 // whose eigenvalues are the signal poles when Y1 has rank >= M.
+#include <algorithm>
+#include <cmath>
 #include <complex>
 #include <cstddef>
 #include <cstring>
@@ -219,15 +221,39 @@ StatusCode MatrixPencilComplex(const Complex* x, int32_t n, int32_t L, int32_t M
                                double* mse, int32_t* count) {
   return MatrixPencil<Complex>(x, n, L, M, fs, 0, amp, phase, damp, freq, mse, count);
 }
-StatusCode MatrixPencilKrylovReal(const double* x, int32_t n, int32_t L, int32_t M, double fs,
-                                  int32_t realFlag, double* amp, double* phase, double* damp,
-                                  double* freq, double* mse, int32_t* count) {
-  return MatrixPencil<double>(x, n, L, M, fs, realFlag, amp, phase, damp, freq, mse, count,
-                              Route::kKrylov);
+// Measured on one core with OpenBLAS: the dense route spends about 3e-10 s
+// (real) or 7.5e-10 s (complex) per q L^2, the Krylov route about 1e-8 s per
+// k N log2 N (k Lanczos vectors, N the FFT length), for either data type.
+bool PencilPrefersKrylov(int32_t n, int32_t L, int32_t M, bool complex) {
+  if (L < 1 || L >= n || int64_t{4} * M > L) return false;
+  const double q = static_cast<double>(n - L);
+  const double N = static_cast<double>(n);
+  const double k = std::max(2.0 * M + 8.0, M + 16.0);
+  const double dense = (complex ? 7.5e-10 : 3e-10) * q * static_cast<double>(L) * L;
+  const double krylov = 1e-8 * k * N * std::log2(N);
+  return 2.0 * krylov < dense;
 }
-StatusCode MatrixPencilKrylovComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
-                                     double fs, double* amp, double* phase, double* damp,
-                                     double* freq, double* mse, int32_t* count) {
+
+namespace {
+Route RouteOf(PencilSolver solver, int32_t n, int32_t L, int32_t M, bool complex) {
+  if (solver == PencilSolver::kKrylov) return Route::kKrylov;
+  if (solver == PencilSolver::kAuto && PencilPrefersKrylov(n, L, M, complex)) {
+    return Route::kKrylov;
+  }
+  return Route::kDense;
+}
+}  // namespace
+
+StatusCode MatrixPencilSolverReal(const double* x, int32_t n, int32_t L, int32_t M, double fs,
+                                  int32_t realFlag, PencilSolver solver, double* amp,
+                                  double* phase, double* damp, double* freq, double* mse,
+                                  int32_t* count) {
+  return MatrixPencil<double>(x, n, L, M, fs, realFlag, amp, phase, damp, freq, mse, count,
+                              RouteOf(solver, n, L, M, false));
+}
+StatusCode MatrixPencilSolverComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
+                                     double fs, PencilSolver solver, double* amp, double* phase,
+                                     double* damp, double* freq, double* mse, int32_t* count) {
   return MatrixPencil<Complex>(x, n, L, M, fs, 0, amp, phase, damp, freq, mse, count,
-                               Route::kKrylov);
+                               RouteOf(solver, n, L, M, true));
 }

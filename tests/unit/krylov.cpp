@@ -235,12 +235,14 @@ void Agree() {
     for (int route = 0; route < 2; ++route) {
       for (auto* v : {&a[route], &p[route], &d[route], &f[route]}) v->assign(size_t(c.M), 0.0);
       if constexpr (kIsCx<T>) {
-        st[route] = (route ? MatrixPencilKrylovComplex : MatrixPencilComplex)(
-            x.data(), c.n, L, c.M, 1.0, a[route].data(), p[route].data(), d[route].data(),
+        st[route] = MatrixPencilSolverComplex(
+            x.data(), c.n, L, c.M, 1.0, route ? PencilSolver::kKrylov : PencilSolver::kDense,
+            a[route].data(), p[route].data(), d[route].data(),
             f[route].data(), &mse[route], &count[route]);
       } else {
-        st[route] = (route ? MatrixPencilKrylovReal : MatrixPencilReal)(
-            x.data(), c.n, L, c.M, 1.0, 0, a[route].data(), p[route].data(), d[route].data(),
+        st[route] = MatrixPencilSolverReal(
+            x.data(), c.n, L, c.M, 1.0, 0, route ? PencilSolver::kKrylov : PencilSolver::kDense,
+            a[route].data(), p[route].data(), d[route].data(),
             f[route].data(), &mse[route], &count[route]);
       }
     }
