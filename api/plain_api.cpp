@@ -105,19 +105,31 @@ struct PlainCall {
   int32_t* count;                           // 0 on failure, or null
 };
 
+// Folds one sample into a running largest magnitude; a NaN or an infinity
+// makes it infinite for good.
+inline void FoldMagnitude(double v, double& largest) {
+  const double a = std::fabs(v);
+  largest = a > largest ? a : largest;
+  if (!(a <= DBL_MAX)) largest = HUGE_VAL;
+}
+
 // The largest magnitude among the samples, or -1 when one is NaN or infinite.
-// No early exit, so the loop vectorizes.
+// Four independent lanes and no early exit keep the scan about as fast as a
+// plain finiteness test.
 double Extent(const Samples& x) {
   const double* v = static_cast<const double*>(x.data);
   const int64_t values = int64_t{x.n} * (x.complex ? 2 : 1);
-  double largest = 0.0;
-  int bad = 0;
-  for (int64_t i = 0; i < values; ++i) {
-    const double a = std::fabs(v[i]);
-    bad |= !(a <= DBL_MAX);
-    largest = a > largest ? a : largest;
+  double m0 = 0.0, m1 = 0.0, m2 = 0.0, m3 = 0.0;
+  int64_t i = 0;
+  for (; i + 4 <= values; i += 4) {
+    FoldMagnitude(v[i], m0);
+    FoldMagnitude(v[i + 1], m1);
+    FoldMagnitude(v[i + 2], m2);
+    FoldMagnitude(v[i + 3], m3);
   }
-  return bad != 0 ? -1.0 : largest;
+  for (; i < values; ++i) FoldMagnitude(v[i], m0);
+  const double largest = std::max(std::max(m0, m1), std::max(m2, m3));
+  return largest > DBL_MAX ? -1.0 : largest;
 }
 
 // The power of two a record is multiplied by before the fit: 0 inside
