@@ -2,16 +2,23 @@
 // is one table of what its call needs (checks, pointers, work size, outputs)
 // and one estimator call; RunPlain does the rest:
 //
-//   1. the argument checks shared with the host face (estimation/entry_checks.h);
-//      a failed check returns its code and writes nothing;
+//   1. the argument checks shared with the host face (estimation/entry_checks.h),
+//      with the order bound floor(2n/3) taken in 64 bits, then this face's own
+//      (a spectrum shorter than the AR polynomial); a failed check returns its
+//      code and writes nothing;
 //   2. required pointers present, else QDM_ERR_NULL_POINTER;
 //   3. the estimated work memory within QDM_MAX_WORK_BYTES, else QDM_ERR_WORK_LIMIT;
 //   4. every sample (and the sampling rate) finite, else QDM_ERR_NON_FINITE;
 //   5. the estimator, on the caller's arrays (they need only double alignment,
-//      which is also the estimators' requirement), inside a call record;
+//      which is also the estimators' requirement), inside a call record; a
+//      record whose largest magnitude lies outside [2^-128, 2^128] is fitted as
+//      a copy scaled by a power of two and the results are scaled back;
 //   6. a failure the estimator absorbed, noted in the record, replaces success;
-//      on any error the outputs are zero-filled and the counts and out doubles
-//      set to 0.
+//   7. every number about to be handed back finite, else
+//      QDM_ERR_NON_FINITE_RESULT; on any error the outputs are zero-filled and
+//      the counts and out doubles set to 0.
+#include <algorithm>
+#include <cfloat>
 #include <cmath>
 #include <cstring>
 #include <initializer_list>
@@ -21,6 +28,7 @@
 #include "core/types.h"
 #include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
+#include "numeric/work.h"
 #include "qdm_api.h"
 
 namespace {
@@ -40,6 +48,19 @@ static_assert(PublicCode(status::kNoModes) == QDM_ERR_NO_MODES);
 static_assert(PublicCode(status::kBadSpectrumSize) == QDM_ERR_SPECTRUM_SIZE);
 static_assert(PublicCode(status::kBadSampleRate) == QDM_ERR_SAMPLE_RATE);
 static_assert(PublicCode(status::kRankDeficient) == QDM_WARN_RANK_DEFICIENT);
+
+// This face's own codes: a spectrum shorter than the AR polynomial (the host
+// face wraps the coefficients there and so evaluates another polynomial), and
+// a fit that ran but has a NaN or an infinity among its results.
+constexpr StatusCode kSpectrumTooShort = 22;
+constexpr StatusCode kNonFiniteResult = QDM_ERR_NON_FINITE_RESULT;
+static_assert(PublicCode(kSpectrumTooShort) == QDM_ERR_SPECTRUM_TOO_SHORT);
+static_assert(PublicCode(kNonFiniteResult) == QDM_ERR_NON_FINITE_RESULT);
+
+// Every order check of this face takes floor(2n/3) in 64 bits: for n >= 2^30
+// the host's 32-bit bound is negative and would refuse every order, where the
+// work-memory bound is the right refusal.
+constexpr checks::Bound kWide = checks::Bound::kWide;
 static_assert(status::kNoMemory == QDM_ERR_NO_MEMORY && status::kBadSize == QDM_ERR_BAD_SIZE &&
               status::kNegativeDim == QDM_ERR_NEGATIVE_DIM &&
               status::kBadOption == QDM_ERR_OPTION &&
@@ -57,31 +78,102 @@ struct Samples {
   bool complex;
 };
 
+// An output array, and how its values follow a power-of-two scaling of the
+// record: 0 unchanged (coefficients, poles, phases, frequencies, spectra), 1
+// as the record (amplitudes), 2 as its square (variances, errors). A counted
+// array holds results in its first *count values only.
 struct OutArray {
   void* data;
   size_t bytes;
+  int power = 0;
+  bool counted = false;
+};
+
+struct OutDouble {
+  double* value;
+  int power = 0;
 };
 
 struct PlainCall {
-  StatusCode check;                         // the shared argument checks' verdict
+  StatusCode check;                         // the argument checks' verdict
   Samples x;
   std::initializer_list<const void*> required;  // pointers the call dereferences
   double work_bytes;                        // estimated work memory
   const double* rate;                       // sampling rate, or null
   std::initializer_list<OutArray> outputs;  // zero-filled on failure
-  std::initializer_list<double*> doubles;   // 0.0 on failure
+  std::initializer_list<OutDouble> doubles; // 0.0 on failure
   int32_t* count;                           // 0 on failure, or null
 };
 
-bool AllFinite(const Samples& x) {
-  const double* v = static_cast<const double*>(x.data);
-  const int64_t values = int64_t{x.n} * (x.complex ? 2 : 1);
-  for (int64_t i = 0; i < values; ++i) {
-    if (!std::isfinite(v[i])) return false;
-  }
-  return true;
+// Folds one sample into a running largest magnitude; a NaN or an infinity
+// makes it infinite for good.
+inline void FoldMagnitude(double v, double& largest) {
+  const double a = std::fabs(v);
+  largest = a > largest ? a : largest;
+  if (!(a <= DBL_MAX)) largest = HUGE_VAL;
 }
 
+// The largest magnitude among the samples, or -1 when one is NaN or infinite.
+// Four independent lanes and no early exit keep the scan about as fast as a
+// plain finiteness test.
+double Extent(const Samples& x) {
+  const double* v = static_cast<const double*>(x.data);
+  const int64_t values = int64_t{x.n} * (x.complex ? 2 : 1);
+  double m0 = 0.0, m1 = 0.0, m2 = 0.0, m3 = 0.0;
+  int64_t i = 0;
+  for (; i + 4 <= values; i += 4) {
+    FoldMagnitude(v[i], m0);
+    FoldMagnitude(v[i + 1], m1);
+    FoldMagnitude(v[i + 2], m2);
+    FoldMagnitude(v[i + 3], m3);
+  }
+  for (; i < values; ++i) FoldMagnitude(v[i], m0);
+  const double largest = std::max(std::max(m0, m1), std::max(m2, m3));
+  return largest > DBL_MAX ? -1.0 : largest;
+}
+
+// The power of two a record is multiplied by before the fit: 0 inside
+// [2^-128, 2^128], where the fits' squares and sums cannot overflow or lose
+// bits to underflow and the estimators see the caller's samples unchanged;
+// outside it, the exponent that brings the largest magnitude into [1, 2).
+// Multiplying by a power of two is exact (but for samples that fall below
+// 2^-1022 beside a much larger maximum, far under its rounding), every fit is
+// homogeneous in the record, and the results are scaled back exactly.
+int RecordScale(double largest) {
+  constexpr double kHigh = 0x1p128, kLow = 0x1p-128;
+  if (largest == 0.0 || (largest >= kLow && largest <= kHigh)) return 0;
+  return -std::ilogb(largest);
+}
+
+// Values of an output that hold results after the fit.
+size_t ResultValues(const OutArray& out, const int32_t* count) {
+  const size_t all = out.bytes / sizeof(double);
+  if (!out.counted) return all;
+  return count == nullptr || *count < 0 ? 0 : std::min(all, static_cast<size_t>(*count));
+}
+
+// Undoes the record's scaling on every result (exact unless a value leaves the
+// double range, which the screen then reports) and screens every result for
+// NaN and infinity.
+bool ResultsFinite(const PlainCall& call, int scale) {
+  int bad = 0;
+  for (const OutArray& out : call.outputs) {
+    double* v = static_cast<double*>(out.data);
+    const size_t values = ResultValues(out, call.count);
+    if (scale != 0 && out.power != 0) {
+      for (size_t i = 0; i < values; ++i) v[i] = std::ldexp(v[i], -scale * out.power);
+    }
+    for (size_t i = 0; i < values; ++i) bad |= !(std::fabs(v[i]) <= DBL_MAX);
+  }
+  for (const OutDouble& d : call.doubles) {
+    if (scale != 0 && d.power != 0) *d.value = std::ldexp(*d.value, -scale * d.power);
+    bad |= !(std::fabs(*d.value) <= DBL_MAX);
+  }
+  return bad == 0;
+}
+
+// The estimator call: `fit` receives the samples to fit, the caller's or a
+// scaled copy of them.
 template <typename Fit>
 int32_t RunPlain(const PlainCall& call, const Fit& fit) {
   if (call.check != status::kOk) return PublicCode(call.check);
@@ -90,17 +182,34 @@ int32_t RunPlain(const PlainCall& call, const Fit& fit) {
     if (p == nullptr) return QDM_ERR_NULL_POINTER;
   }
   if (call.work_bytes > static_cast<double>(QDM_MAX_WORK_BYTES)) return QDM_ERR_WORK_LIMIT;
-  if (!AllFinite(call.x) || (call.rate != nullptr && !std::isfinite(*call.rate))) {
+  const double largest = Extent(call.x);
+  if (largest < 0.0 || (call.rate != nullptr && !std::isfinite(*call.rate))) {
     return QDM_ERR_NON_FINITE;
   }
 
-  call_record::Begin();
-  StatusCode s = fit();
-  const StatusCode absorbed = call_record::End();
-  if (s == status::kOk || s == status::kRankDeficient) s = MergeStatus(s, absorbed);
+  const int scale = RecordScale(largest);
+  StatusCode s = status::kOk;
+  WorkArray<double> scaled;
+  const void* samples = call.x.data;
+  if (scale != 0) {
+    const size_t values = static_cast<size_t>(call.x.n) * (call.x.complex ? 2 : 1);
+    scaled = AllocWorkUninit<double>(values);
+    if (!scaled) s = status::kNoMemory;
+    const double* v = static_cast<const double*>(call.x.data);
+    for (size_t i = 0; scaled && i < values; ++i) scaled[i] = std::ldexp(v[i], scale);
+    samples = scaled.get();
+  }
+  if (s == status::kOk) {
+    call_record::Begin();
+    s = fit(samples);
+    const StatusCode absorbed = call_record::End();
+    if (s == status::kOk || s == status::kRankDeficient) s = MergeStatus(s, absorbed);
+  }
+  scaled.reset();
+  if (s >= 0 && !ResultsFinite(call, scale)) s = kNonFiniteResult;
   if (s < 0) {
     for (const OutArray& out : call.outputs) std::memset(out.data, 0, out.bytes);
-    for (double* d : call.doubles) *d = 0.0;
+    for (const OutDouble& d : call.doubles) *d.value = 0.0;
     if (call.count != nullptr) *call.count = 0;
   }
   return PublicCode(s);
@@ -130,20 +239,25 @@ Complex* AsComplex(qdm_complex* x) { return reinterpret_cast<Complex*>(x); }
 // ---- shared bodies of the twins ----------------------------------------------------
 
 template <typename T>
+const T* As(const void* samples) {
+  return static_cast<const T*>(samples);
+}
+
+template <typename T>
 int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles,
                    double* variance) {
   constexpr bool cx = std::is_same_v<T, Complex>;
-  const StatusCode check = checks::Covariance(n, p);
+  const StatusCode check = checks::Covariance(n, p, kWide);
   const size_t e = cx ? kCx : kReal;
   const int32_t q = check == status::kOk ? p : 0;
   return RunPlain(
       {check, {x, n, cx}, {a, poles, variance}, LinearPredictionWork(n, q, e, 4), nullptr,
-       {{a, Bytes(q + int64_t{1}, e)}, {poles, Bytes(q, kCx)}}, {variance}, nullptr},
-      [&] {
+       {{a, Bytes(q + int64_t{1}, e)}, {poles, Bytes(q, kCx)}}, {{variance, 2}}, nullptr},
+      [&](const void* xs) {
         if constexpr (cx) {
-          return CovarianceArComplex(x, n, p, a, AsComplex(poles), variance);
+          return CovarianceArComplex(As<T>(xs), n, p, a, AsComplex(poles), variance);
         } else {
-          return CovarianceArReal(x, n, p, a, AsComplex(poles), variance);
+          return CovarianceArReal(As<T>(xs), n, p, a, AsComplex(poles), variance);
         }
       });
 }
@@ -151,16 +265,16 @@ int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles,
 template <typename T>
 int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, T* a, qdm_complex* roots) {
   constexpr bool cx = std::is_same_v<T, Complex>;
-  const StatusCode check = checks::Pcar(n, order, components);
+  const StatusCode check = checks::Pcar(n, order, components, kWide);
   const size_t e = cx ? kCx : kReal;
   const int32_t p = check == status::kOk ? order : 0;
   return RunPlain({check, {x, n, cx}, {a, roots}, LinearPredictionWork(n, p, e, 8), nullptr,
                    {{a, Bytes(p + int64_t{1}, e)}, {roots, Bytes(p, kCx)}}, {}, nullptr},
-                  [&] {
+                  [&](const void* xs) {
                     if constexpr (cx) {
-                      return PcarEstimateComplex(x, n, p, components, a, AsComplex(roots));
+                      return PcarEstimateComplex(As<T>(xs), n, p, components, a, AsComplex(roots));
                     } else {
-                      return PcarEstimateReal(x, n, p, components, a, AsComplex(roots));
+                      return PcarEstimateReal(As<T>(xs), n, p, components, a, AsComplex(roots));
                     }
                   });
 }
@@ -169,17 +283,29 @@ int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, T* a, qdm
 template <typename T>
 int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t* order) {
   constexpr bool cx = std::is_same_v<T, Complex>;
-  const StatusCode check = checks::Mdl(n, max_order, min_order);
+  const StatusCode check = checks::Mdl(n, max_order, min_order, kWide);
   const int32_t L = check == status::kOk ? max_order : 0;
   return RunPlain({check, {x, n, cx}, {order}, PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L),
                    nullptr, {}, {}, order},
-                  [&] {
+                  [&](const void* xs) {
                     if constexpr (cx) {
-                      return MdlOrderComplex(x, n, L, min_order, order);
+                      return MdlOrderComplex(As<T>(xs), n, L, min_order, order);
                     } else {
-                      return MdlOrderReal(x, n, L, min_order, order);
+                      return MdlOrderReal(As<T>(xs), n, L, min_order, order);
                     }
                   });
+}
+
+// The mode arrays of Prony and the pencil: m values each, counted by *modes.
+#define QDM_MODE_OUTPUTS(m)                                                         \
+  {amplitude, Bytes(m, kReal), 1, true}, {phase, Bytes(m, kReal), 0, true},         \
+      {damping, Bytes(m, kReal), 0, true}, {frequency, Bytes(m, kReal), 0, true}
+
+// The spectra evaluate 1/|A(f)|^2 exactly only on a grid of at least p + 1
+// points; below it this face refuses the call.
+StatusCode SpectrumCheck(StatusCode shared, int32_t points, int32_t order) {
+  if (shared != status::kOk) return shared;
+  return SpectrumLength(points) < int64_t{order} + 1 ? kSpectrumTooShort : status::kOk;
 }
 
 }  // namespace
@@ -239,31 +365,27 @@ QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t 
 QDM_PLAIN_API int32_t qdm_prony_real(const double* x, int32_t n, int32_t order, double fs,
                                      int32_t real_signal, double* amplitude, double* phase,
                                      double* damping, double* frequency, int32_t* modes) {
-  const StatusCode check = checks::Prony(n, order, fs);
+  const StatusCode check = checks::Prony(n, order, fs, kWide);
   const int32_t p = check == status::kOk ? order : 0;
   return RunPlain({check, {x, n, false}, {amplitude, phase, damping, frequency, modes},
                    LinearPredictionWork(n, p, kReal, 4) + ModeFitWork(n, p), &fs,
-                   {{amplitude, Bytes(p, kReal)}, {phase, Bytes(p, kReal)},
-                    {damping, Bytes(p, kReal)}, {frequency, Bytes(p, kReal)}},
-                   {}, modes},
-                  [&] {
-                    return PronyReal(x, n, p, fs, real_signal, amplitude, phase, damping,
-                                     frequency, modes);
+                   {QDM_MODE_OUTPUTS(p)}, {}, modes},
+                  [&](const void* xs) {
+                    return PronyReal(As<double>(xs), n, p, fs, real_signal, amplitude, phase,
+                                     damping, frequency, modes);
                   });
 }
 
 QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t order,
                                         double fs, double* amplitude, double* phase,
                                         double* damping, double* frequency, int32_t* modes) {
-  const StatusCode check = checks::Prony(n, order, fs);
+  const StatusCode check = checks::Prony(n, order, fs, kWide);
   const int32_t p = check == status::kOk ? order : 0;
   return RunPlain({check, {x, n, true}, {amplitude, phase, damping, frequency, modes},
                    LinearPredictionWork(n, p, kCx, 4) + ModeFitWork(n, p), &fs,
-                   {{amplitude, Bytes(p, kReal)}, {phase, Bytes(p, kReal)},
-                    {damping, Bytes(p, kReal)}, {frequency, Bytes(p, kReal)}},
-                   {}, modes},
-                  [&] {
-                    return PronyComplex(AsComplex(x), n, p, fs, amplitude, phase, damping,
+                   {QDM_MODE_OUTPUTS(p)}, {}, modes},
+                  [&](const void* xs) {
+                    return PronyComplex(As<Complex>(xs), n, p, fs, amplitude, phase, damping,
                                         frequency, modes);
                   });
 }
@@ -274,17 +396,15 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_real(const double* x, int32_t n, int32_t
                                              int32_t order, double fs, int32_t real_signal,
                                              double* amplitude, double* phase, double* damping,
                                              double* frequency, int32_t* modes, double* mse) {
-  const StatusCode check = checks::Pencil(n, pencil, order, fs);
+  const StatusCode check = checks::Pencil(n, pencil, order, fs, kWide);
   const int32_t M = check == status::kOk ? order : 0;
   const int32_t L = check == status::kOk ? pencil : 0;
   return RunPlain({check, {x, n, false}, {amplitude, phase, damping, frequency, modes, mse},
-                   PencilWork(n, L, kReal) + ModeFitWork(n, M), &fs,
-                   {{amplitude, Bytes(M, kReal)}, {phase, Bytes(M, kReal)},
-                    {damping, Bytes(M, kReal)}, {frequency, Bytes(M, kReal)}},
-                   {mse}, modes},
-                  [&] {
-                    return MatrixPencilReal(x, n, L, M, fs, real_signal, amplitude, phase,
-                                            damping, frequency, mse, modes);
+                   PencilWork(n, L, kReal) + ModeFitWork(n, M), &fs, {QDM_MODE_OUTPUTS(M)},
+                   {{mse, 2}}, modes},
+                  [&](const void* xs) {
+                    return MatrixPencilReal(As<double>(xs), n, L, M, fs, real_signal, amplitude,
+                                            phase, damping, frequency, mse, modes);
                   });
 }
 
@@ -292,16 +412,14 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_complex(const qdm_complex* x, int32_t n,
                                                 int32_t order, double fs, double* amplitude,
                                                 double* phase, double* damping,
                                                 double* frequency, int32_t* modes, double* mse) {
-  const StatusCode check = checks::Pencil(n, pencil, order, fs);
+  const StatusCode check = checks::Pencil(n, pencil, order, fs, kWide);
   const int32_t M = check == status::kOk ? order : 0;
   const int32_t L = check == status::kOk ? pencil : 0;
   return RunPlain({check, {x, n, true}, {amplitude, phase, damping, frequency, modes, mse},
-                   PencilWork(n, L, kCx) + ModeFitWork(n, M), &fs,
-                   {{amplitude, Bytes(M, kReal)}, {phase, Bytes(M, kReal)},
-                    {damping, Bytes(M, kReal)}, {frequency, Bytes(M, kReal)}},
-                   {mse}, modes},
-                  [&] {
-                    return MatrixPencilComplex(AsComplex(x), n, L, M, fs, amplitude, phase,
+                   PencilWork(n, L, kCx) + ModeFitWork(n, M), &fs, {QDM_MODE_OUTPUTS(M)},
+                   {{mse, 2}}, modes},
+                  [&](const void* xs) {
+                    return MatrixPencilComplex(As<Complex>(xs), n, L, M, fs, amplitude, phase,
                                                damping, frequency, mse, modes);
                   });
 }
@@ -323,16 +441,17 @@ QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int
 QDM_PLAIN_API int32_t qdm_covariance_psd_real(const double* x, int32_t n, int32_t order,
                                               int32_t points, double fs, double* spectrum,
                                               double* f0, double* df, double* noise_variance) {
-  const StatusCode check = checks::CovSpectrum(n, order, points, fs);
+  const StatusCode check =
+      SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   SpectrumResult result{0.0, 0.0, spectrum};
   return RunPlain({check, {x, n, false}, {spectrum, f0, df, noise_variance},
                    LinearPredictionWork(n, p, kReal, 4) + SpectrumWork(N), &fs,
-                   {{spectrum, Bytes(N, kReal)}}, {f0, df, noise_variance}, nullptr},
-                  [&] {
-                    const StatusCode s =
-                        CovPowerSpectrumReal(x, n, p, N, fs, &result, noise_variance);
+                   {{spectrum, Bytes(N, kReal)}}, {{f0}, {df}, {noise_variance, 2}}, nullptr},
+                  [&](const void* xs) {
+                    const StatusCode s = CovPowerSpectrumReal(As<double>(xs), n, p, N, fs,
+                                                              &result, noise_variance);
                     *f0 = result.f0;
                     *df = result.df;
                     return s;
@@ -343,15 +462,16 @@ QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n
                                                  int32_t order, int32_t points, double fs,
                                                  double* spectrum, double* f0, double* df,
                                                  double* noise_variance) {
-  const StatusCode check = checks::CovSpectrum(n, order, points, fs);
+  const StatusCode check =
+      SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   SpectrumResult result{0.0, 0.0, spectrum};
   return RunPlain({check, {x, n, true}, {spectrum, f0, df, noise_variance},
                    LinearPredictionWork(n, p, kCx, 4) + SpectrumWork(N), &fs,
-                   {{spectrum, Bytes(N, kReal)}}, {f0, df, noise_variance}, nullptr},
-                  [&] {
-                    const StatusCode s = CovPowerSpectrumComplex(AsComplex(x), n, p, N, fs,
+                   {{spectrum, Bytes(N, kReal)}}, {{f0}, {df}, {noise_variance, 2}}, nullptr},
+                  [&](const void* xs) {
+                    const StatusCode s = CovPowerSpectrumComplex(As<Complex>(xs), n, p, N, fs,
                                                                  &result, noise_variance);
                     *f0 = result.f0;
                     *df = result.df;
@@ -364,7 +484,8 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t orde
                                         int32_t real_signal, double* amplitude, double* phase,
                                         double* frequency, int32_t* modes, double* spectrum,
                                         double* f0, double* df, double* fit_error) {
-  const StatusCode check = checks::PcarSpectrum(n, order, components, points, fs);
+  const StatusCode check = SpectrumCheck(
+      checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   const int32_t k = check == status::kOk ? components : 0;
@@ -372,12 +493,13 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t orde
   return RunPlain(
       {check, {x, n, false}, {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
        LinearPredictionWork(n, p, kReal, 8) + ModeFitWork(n, k) + SpectrumWork(N), &fs,
-       {{amplitude, Bytes(k, kReal)}, {phase, Bytes(k, kReal)}, {frequency, Bytes(k, kReal)},
-        {spectrum, Bytes(N, kReal)}},
-       {f0, df, fit_error}, modes},
-      [&] {
-        const StatusCode s = PcarPowerSpectrumReal(x, n, p, k, N, fs, real_signal, amplitude,
-                                                   phase, frequency, fit_error, &result, modes);
+       {{amplitude, Bytes(k, kReal), 1, true}, {phase, Bytes(k, kReal), 0, true},
+        {frequency, Bytes(k, kReal), 0, true}, {spectrum, Bytes(N, kReal)}},
+       {{f0}, {df}, {fit_error, 2}}, modes},
+      [&](const void* xs) {
+        const StatusCode s =
+            PcarPowerSpectrumReal(As<double>(xs), n, p, k, N, fs, real_signal, amplitude, phase,
+                                  frequency, fit_error, &result, modes);
         *f0 = result.f0;
         *df = result.df;
         return s;
@@ -389,7 +511,8 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int3
                                            double* amplitude, double* phase, double* frequency,
                                            int32_t* modes, double* spectrum, double* f0,
                                            double* df, double* fit_error) {
-  const StatusCode check = checks::PcarSpectrum(n, order, components, points, fs);
+  const StatusCode check = SpectrumCheck(
+      checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   const int32_t k = check == status::kOk ? components : 0;
@@ -397,13 +520,13 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int3
   return RunPlain(
       {check, {x, n, true}, {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
        LinearPredictionWork(n, p, kCx, 8) + ModeFitWork(n, k) + SpectrumWork(N), &fs,
-       {{amplitude, Bytes(k, kReal)}, {phase, Bytes(k, kReal)}, {frequency, Bytes(k, kReal)},
-        {spectrum, Bytes(N, kReal)}},
-       {f0, df, fit_error}, modes},
-      [&] {
+       {{amplitude, Bytes(k, kReal), 1, true}, {phase, Bytes(k, kReal), 0, true},
+        {frequency, Bytes(k, kReal), 0, true}, {spectrum, Bytes(N, kReal)}},
+       {{f0}, {df}, {fit_error, 2}}, modes},
+      [&](const void* xs) {
         const StatusCode s =
-            PcarPowerSpectrumComplex(AsComplex(x), n, p, k, N, fs, amplitude, phase, frequency,
-                                     fit_error, &result, modes);
+            PcarPowerSpectrumComplex(As<Complex>(xs), n, p, k, N, fs, amplitude, phase,
+                                     frequency, fit_error, &result, modes);
         *f0 = result.f0;
         *df = result.df;
         return s;
@@ -411,3 +534,5 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int3
 }
 
 }  // extern "C"
+
+#undef QDM_MODE_OUTPUTS

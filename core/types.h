@@ -56,3 +56,9 @@ constexpr StatusCode MergeStatus(StatusCode running, StatusCode later) {
 constexpr int32_t MaxOrder(int32_t n) {
   return static_cast<int32_t>(static_cast<uint32_t>(n) * 2u) / 3;
 }
+
+// The same bound without the wrap, for the plain C API. The host's 32-bit form
+// turns negative for n >= 2^30, so the host face refuses every order there;
+// the plain face takes floor(2n/3) as it is and lets its work-memory bound
+// refuse such a record instead. The two agree for every n below 2^30.
+constexpr int64_t MaxOrderWide(int32_t n) { return int64_t{n} * 2 / 3; }

@@ -12,57 +12,62 @@ bool BadRate(double rate) { return 0.0 >= rate; }
 // m <= 1, or no power of two in 32 bits at or above m.
 bool BadSpectrumSize(int32_t m) { return m <= 1 || SpectrumLength(m) == 0; }
 
+// An order or pencil parameter above floor(2n/3), by the bound asked for.
+bool Above(int32_t p, int32_t n, Bound bound) {
+  return bound == Bound::kHost ? p > MaxOrder(n) : p > MaxOrderWide(n);
+}
+
 }  // namespace
 
-StatusCode Prony(int32_t n, int32_t p, double rate) {
+StatusCode Prony(int32_t n, int32_t p, double rate, Bound bound) {
   if (n < 1) return status::kEmptyInput;
-  if (p <= 0 || p > MaxOrder(n)) return status::kBadCount;
+  if (p <= 0 || Above(p, n, bound)) return status::kBadCount;
   if (BadRate(rate)) return status::kBadSampleRate;
   return status::kOk;
 }
 
-StatusCode Covariance(int32_t n, int32_t p) {
+StatusCode Covariance(int32_t n, int32_t p, Bound bound) {
   if (n < 1) return status::kEmptyInput;
-  if (p <= 0 || p > MaxOrder(n)) return status::kBadCount;
+  if (p <= 0 || Above(p, n, bound)) return status::kBadCount;
   return status::kOk;
 }
 
-StatusCode Pcar(int32_t n, int32_t p, int32_t components) {
+StatusCode Pcar(int32_t n, int32_t p, int32_t components, Bound bound) {
   if (n < 1) return status::kEmptyInput;
-  if (p < 0 || p > MaxOrder(n)) return status::kBadOrder;
+  if (p < 0 || Above(p, n, bound)) return status::kBadOrder;
   if (components <= 0) return status::kBadCount;
   if (components > p) return status::kCountAboveOrder;
   return status::kOk;
 }
 
-StatusCode Pencil(int32_t n, int32_t L, int32_t M, double rate) {
+StatusCode Pencil(int32_t n, int32_t L, int32_t M, double rate, Bound bound) {
   if (n < 1) return status::kEmptyInput;
-  if (L < 0 || L > MaxOrder(n)) return status::kBadOrder;
+  if (L < 0 || Above(L, n, bound)) return status::kBadOrder;
   if (M <= 0) return status::kBadCount;
   if (M > L) return status::kCountAboveOrder;
   if (BadRate(rate)) return status::kBadSampleRate;
   return status::kOk;
 }
 
-StatusCode Mdl(int32_t n, int32_t L, int32_t minOrder) {
+StatusCode Mdl(int32_t n, int32_t L, int32_t minOrder, Bound bound) {
   if (n < 1) return status::kEmptyInput;
   if (minOrder < 1) return status::kBadMinOrder;
-  if (L <= minOrder || L > MaxOrder(n)) return status::kBadMdlUpper;
+  if (L <= minOrder || Above(L, n, bound)) return status::kBadMdlUpper;
   return status::kOk;
 }
 
 // The covariance spectra report a bad order as 12, the PCAR families as 11.
-StatusCode CovSpectrum(int32_t n, int32_t p, int32_t m, double rate) {
+StatusCode CovSpectrum(int32_t n, int32_t p, int32_t m, double rate, Bound bound) {
   if (n < 1) return status::kEmptyInput;
-  if (p < 0 || p > MaxOrder(n)) return status::kBadCount;
+  if (p < 0 || Above(p, n, bound)) return status::kBadCount;
   if (BadSpectrumSize(m)) return status::kBadSpectrumSize;
   if (BadRate(rate)) return status::kBadSampleRate;
   return status::kOk;
 }
 
-StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate) {
+StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate, Bound bound) {
   if (n < 1) return status::kEmptyInput;
-  if (p < 0 || p > MaxOrder(n)) return status::kBadOrder;
+  if (p < 0 || Above(p, n, bound)) return status::kBadOrder;
   if (k <= 0) return status::kBadCount;
   if (k > p) return status::kCountAboveOrder;
   if (BadSpectrumSize(m)) return status::kBadSpectrumSize;

@@ -18,17 +18,37 @@
  *   qdm_status_text() gives its meaning. After an argument error (a -424xx
  *   code) nothing has been written. After any other error every output array
  *   is zero-filled, every mode count is 0 and every out double is 0.0.
+ * - No success (::QDM_OK or the warning) carries a NaN or an infinity. A fit
+ *   that ran but would hand one back (a pole at 0 from a single spike, a pole
+ *   on the unit circle from a ramp, a variance beyond the double range)
+ *   returns ::QDM_ERR_NON_FINITE_RESULT with its outputs zeroed.
  * - Functions are safe to call from any number of threads at once. The only
  *   state shared between calls is the list of FFT plans, under one lock.
  *
  * @par What this face adds to the host face's checks
  * Each fit first makes the host face's argument checks, in the same order and
- * with the same codes. Then, in this order:
- * 1. a null pointer where the function needs one: ::QDM_ERR_NULL_POINTER;
- * 2. a fit whose work memory would exceed #QDM_MAX_WORK_BYTES:
+ * with the same codes, but for one bound: floor(2n/3) is taken in 64 bits, where
+ * the host face's 32-bit form wraps for n >= 2^30 and refuses every order (such
+ * a record meets the work bound here instead). Then, in this order:
+ * 1. (spectra) a spectrum of fewer than order + 1 values:
+ *    ::QDM_ERR_SPECTRUM_TOO_SHORT. The host face wraps the p + 1 AR
+ *    coefficients onto the shorter grid there and so evaluates another
+ *    polynomial than A(f); this face refuses the call;
+ * 2. a null pointer where the function needs one: ::QDM_ERR_NULL_POINTER;
+ * 3. a fit whose work memory would exceed #QDM_MAX_WORK_BYTES:
  *    ::QDM_ERR_WORK_LIMIT (the bound keeps a request for a huge spectrum or
- *    pencil from exhausting the machine);
- * 3. a NaN or infinite sample or sampling rate: ::QDM_ERR_NON_FINITE.
+ *    pencil from exhausting the machine); it is checked before any sample is
+ *    read;
+ * 4. a NaN or infinite sample or sampling rate: ::QDM_ERR_NON_FINITE.
+ *
+ * A record whose largest magnitude lies outside [2^-128, 2^128] is fitted as
+ * a copy multiplied by the power of two that brings that magnitude into
+ * [1, 2), and the results are scaled back (amplitudes once, variances and
+ * errors twice). Every fit is homogeneous in the record and a power of two
+ * rounds nothing, so the results are those of the record itself, without the
+ * overflow of its squares near 1e+308 or their underflow near 1e-308. One
+ * consequence: MDL's fixed threshold on the fitting error then applies to the
+ * scaled record. Records inside the range reach the estimators unchanged.
  *
  * The host face deliberately goes on when a least-squares solve inside a fit
  * fails (covariance AR, Prony, the amplitude fits) and reports success with
@@ -49,7 +69,9 @@
  *   With `real_signal` non-zero only poles with arg(z) in [0, pi) are reported
  *   (one per conjugate pair, amplitude not doubled); otherwise every pole is.
  * - Spectra: qdm_spectrum_length(points) values in dB, peak exactly 0 dB,
- *   value j at frequency f0 + j df with f0 = -fs/2 and df = fs / length.
+ *   value j at frequency f0 + j df with f0 = -fs/2 and df = fs / length, of
+ *   1/|A(f)|^2 for the model's p + 1 coefficients; the length must be at least
+ *   p + 1.
  */
 #ifndef QDM_API_H
 #define QDM_API_H
@@ -108,7 +130,8 @@ QDM_PLAIN_API int32_t qdm_spectrum_length(int32_t points);
  *   ::QDM_ERR_COUNT (order out of range), ::QDM_ERR_NULL_POINTER,
  *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY,
  *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL,
- *   ::QDM_ERR_ROOT_NAN.
+ *   ::QDM_ERR_ROOT_NAN,
+ *   ::QDM_ERR_NON_FINITE_RESULT.
  * @{ */
 QDM_PLAIN_API int32_t qdm_covariance_real(const double* x, int32_t n, int32_t order,
                                           double* coefficients, qdm_complex* poles,
@@ -133,7 +156,8 @@ QDM_PLAIN_API int32_t qdm_covariance_complex(const qdm_complex* x, int32_t n, in
  *   range), ::QDM_ERR_COUNT (components < 1), ::QDM_ERR_COUNT_ABOVE_ORDER
  *   (components > order), ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT,
  *   ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE,
- *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL, ::QDM_ERR_ROOT_NAN.
+ *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL, ::QDM_ERR_ROOT_NAN,
+ *   ::QDM_ERR_NON_FINITE_RESULT.
  * @{ */
 QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order,
                                     int32_t components, double* coefficients,
@@ -159,7 +183,8 @@ QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t 
  *   ::QDM_ERR_COUNT, ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_NULL_POINTER,
  *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY,
  *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL,
- *   ::QDM_ERR_ROOT_NAN.
+ *   ::QDM_ERR_ROOT_NAN,
+ *   ::QDM_ERR_NON_FINITE_RESULT.
  * @{ */
 QDM_PLAIN_API int32_t qdm_prony_real(const double* x, int32_t n, int32_t order, double fs,
                                      int32_t real_signal, double* amplitude, double* phase,
@@ -188,7 +213,8 @@ QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t
  *   ::QDM_ERR_COUNT_ABOVE_ORDER (M > L), ::QDM_ERR_SAMPLE_RATE,
  *   ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE,
  *   ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE (a degenerate record),
- *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_ILLEGAL_ARGUMENT.
+ *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_ILLEGAL_ARGUMENT,
+ *   ::QDM_ERR_NON_FINITE_RESULT.
  * @{ */
 QDM_PLAIN_API int32_t qdm_matrix_pencil_real(const double* x, int32_t n, int32_t pencil,
                                              int32_t order, double fs, int32_t real_signal,
@@ -232,7 +258,8 @@ QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int
  * @param order         model order p, 1 <= p <= floor(2n/3) (0 passes the argument
  *                      check, as on the host face, and the covariance fit refuses it
  *                      with ::QDM_ERR_COUNT)
- * @param points        requested points, 2 <= points <= 2^30
+ * @param points        requested points, 2 <= points <= 2^30, with
+ *                      qdm_spectrum_length(points) >= order + 1
  * @param fs            sampling rate in Hz, > 0
  * @param spectrum      out: qdm_spectrum_length(points) values in dB
  * @param f0            out: frequency of spectrum[0], -fs/2
@@ -240,9 +267,11 @@ QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int
  * @param noise_variance out: the AR model's prediction-error variance
  * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
  *   ::QDM_ERR_COUNT (order out of range), ::QDM_ERR_SPECTRUM_SIZE,
- *   ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT,
- *   ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE,
- *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL, ::QDM_ERR_ROOT_NAN.
+ *   ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_SPECTRUM_TOO_SHORT, ::QDM_ERR_NULL_POINTER,
+ *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY,
+ *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL,
+ *   ::QDM_ERR_ROOT_NAN, ::QDM_ERR_NON_FINITE_RESULT (a pole on the unit
+ *   circle, as a ramp can give, puts an infinity into the spectrum).
  * @{ */
 QDM_PLAIN_API int32_t qdm_covariance_psd_real(const double* x, int32_t n, int32_t order,
                                               int32_t points, double fs, double* spectrum,
@@ -261,7 +290,8 @@ QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n
  * @param x             n samples
  * @param n             number of samples, >= 1
  * @param order         model order p, 0 <= p <= floor(2n/3)
- * @param points        requested points, 2 <= points <= 2^30
+ * @param points        requested points, 2 <= points <= 2^30, with
+ *                      qdm_spectrum_length(points) >= order + 1
  * @param components    modes k, 1 <= k <= p
  * @param fs            sampling rate in Hz, > 0
  * @param real_signal   (real data only) non-zero: one mode per conjugate pair
@@ -272,10 +302,12 @@ QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n
  * @param fit_error     out: mean squared error of the amplitude fit
  * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
  *   ::QDM_ERR_ORDER, ::QDM_ERR_COUNT, ::QDM_ERR_COUNT_ABOVE_ORDER,
- *   ::QDM_ERR_SPECTRUM_SIZE, ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_NULL_POINTER,
+ *   ::QDM_ERR_SPECTRUM_SIZE, ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_SPECTRUM_TOO_SHORT,
+ *   ::QDM_ERR_NULL_POINTER,
  *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY,
  *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL,
- *   ::QDM_ERR_ROOT_NAN.
+ *   ::QDM_ERR_ROOT_NAN,
+ *   ::QDM_ERR_NON_FINITE_RESULT.
  * @{ */
 QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t order,
                                         int32_t points, int32_t components, double fs,

@@ -3,10 +3,12 @@
  * documentation are both made from it.
  *
  * 0 is success. 20001 is a warning (the plain face only: the results are
- * complete and valid). Codes from -42401 down to -42421 are argument errors,
- * -424xx in the host's numbering. The other negative codes are numeric and FFT
- * failures. The host face also returns -42400 - e when the host's
- * NumericArrayResize fails with its own error e. */
+ * complete and valid). Codes from -42401 down to -42422 are argument errors,
+ * -424xx in the host's numbering; the plain face writes nothing when it returns
+ * one. -30001 is the plain face's screen of its own results: a fit ran, but a
+ * number it was about to hand back is NaN or infinite. The other negative
+ * codes are numeric and FFT failures. The host face also returns -42400 - e
+ * when the host's NumericArrayResize fails with its own error e. */
 #ifndef QDM_STATUS_H
 #define QDM_STATUS_H
 
@@ -30,6 +32,11 @@
   X(QDM_ERR_WORK_LIMIT, -42420,                                                                \
     "the fit would need more work memory than the library's bound (QDM_MAX_WORK_BYTES)")       \
   X(QDM_ERR_NULL_POINTER, -42421, "a required pointer argument is null")                       \
+  X(QDM_ERR_SPECTRUM_TOO_SHORT, -42422,                                                        \
+    "spectrum length (the power of two at or above the points asked for) below order + 1")    \
+  X(QDM_ERR_NON_FINITE_RESULT, -30001,                                                         \
+    "a result of the fit is NaN or infinite (a degenerate record: zero, constant, a spike, a " \
+    "ramp, or values beyond the range of double)")                                             \
   X(QDM_ERR_NO_MEMORY, -20001, "working memory could not be allocated")                        \
   X(QDM_ERR_BAD_SIZE, -20003, "a size argument is below 1")                                    \
   X(QDM_ERR_NEGATIVE_DIM, -20004, "a matrix-product dimension is negative")                    \

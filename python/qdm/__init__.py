@@ -23,7 +23,7 @@ from qdm._lib import functions as _fn, lib as _clib, status_text
 
 __all__ = ["covariance", "pcar", "prony", "matrix_pencil", "mdl_order", "covariance_psd",
            "pcar_psd", "Error", "ArgumentError", "DTypeError", "OutOfMemoryError",
-           "NumericError", "RankDeficientWarning", "status_text", "__version__",
+           "NumericError", "NonFiniteResultError", "RankDeficientWarning", "status_text", "__version__",
            "CovarianceFit", "PcarFit", "PronyFit", "PencilFit", "CovarianceSpectrum",
            "PcarSpectrum"]
 
@@ -58,6 +58,12 @@ class NumericError(Error):
     """A numeric failure inside the fit (LAPACK, the root finder, extreme values)."""
 
 
+class NonFiniteResultError(NumericError, FloatingPointError):
+    """The fit ran, but a result came out NaN or infinite (-30001): a degenerate
+    record (zero, constant, a spike, a ramp) or a result beyond the range of
+    float64. No partial results are returned."""
+
+
 class RankDeficientWarning(UserWarning):
     """The fit succeeded, but a least-squares system inside it was rank deficient
     (minimum-norm solution used): code 20001. The results are complete."""
@@ -69,6 +75,7 @@ class RankDeficientWarning(UserWarning):
 
 _NO_MEMORY = -20001
 _RANK_DEFICIENT = 20001
+_NON_FINITE_RESULT = -30001
 
 
 def _check(status, function):
@@ -82,6 +89,8 @@ def _check(status, function):
         raise ArgumentError(status, text, function)
     if status == _NO_MEMORY:
         raise OutOfMemoryError(status, text, function)
+    if status == _NON_FINITE_RESULT:
+        raise NonFiniteResultError(status, text, function)
     raise NumericError(status, text, function)
 
 
@@ -288,7 +297,8 @@ def mdl_order(x, *, max_order=None, min_order=1):
 
 def covariance_psd(x, *, order, points=512, fs=1.0):
     """Power spectrum 1/|A(f)|^2 of the covariance AR model in dB (peak 0 dB)
-    at N frequencies from -fs/2, N the power of two not below `points`."""
+    at N frequencies from -fs/2, N the power of two not below `points`; N below
+    order + 1 raises ArgumentError (-42422)."""
     x, c = _signal(x, "covariance_psd")
     n, p, pts = x.shape[0], _int(order), _int(points)
     N = _clib.qdm_spectrum_length(pts)
@@ -303,7 +313,8 @@ def covariance_psd(x, *, order, points=512, fs=1.0):
 def pcar_psd(x, *, order, components, points=512, fs=1.0, real_signal=False):
     """Power spectrum of the principal-component AR model in dB (peak 0 dB), and
     the `components` modes whose poles lie nearest the unit circle (nearest
-    first), amplitudes fitted by least squares. No damping is reported."""
+    first), amplitudes fitted by least squares. No damping is reported. N below
+    order + 1 raises ArgumentError (-42422)."""
     x, c = _signal(x, "pcar_psd")
     n, p, k, pts = x.shape[0], _int(order), _int(components), _int(points)
     N = _clib.qdm_spectrum_length(pts)

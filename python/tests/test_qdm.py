@@ -144,6 +144,8 @@ BAD = [  # call, exception, library code (None: refused before the library)
     (lambda: qdm.covariance_psd(REAL, order=4, points=1), E, -42417),
     (lambda: qdm.pcar_psd(COMPLEX, order=4, components=2, fs=0.0), E, -42418),
     (lambda: qdm.covariance_psd(REAL, order=4, points=2**30), E, -42420),
+    (lambda: qdm.covariance_psd(REAL, order=4, points=4), E, -42422),
+    (lambda: qdm.pcar_psd(COMPLEX, order=8, components=2, points=5), E, -42422),
 ]
 
 
@@ -154,6 +156,25 @@ def test_bad_input_raises_with_the_library_code_and_text(call, exc, code):
     if code is not None:
         assert isinstance(e, ValueError) and e.text == qdm.status_text(code)
         assert str(code) in str(e) and e.text in str(e)
+
+
+@pytest.mark.parametrize("call", [
+    lambda: qdm.prony(np.zeros(48), order=4),
+    lambda: qdm.prony(np.eye(1, 48).ravel() + 0j, order=4),      # a spike: a pole at 0
+    lambda: qdm.covariance(REAL * 1e160, order=4),               # variance past 1e308
+    lambda: qdm.covariance_psd(np.arange(12.0), order=2, points=16),  # a ramp: a pole on 1
+], ids=range(4))
+def test_a_non_finite_result_is_an_error_not_a_number(call):
+    e = pytest.raises(qdm.NonFiniteResultError, call).value
+    assert isinstance(e, qdm.NumericError) and isinstance(e, FloatingPointError)
+    assert e.code == -30001 and e.text == qdm.status_text(-30001)
+
+
+@pytest.mark.parametrize("scale", [1e155, 1e-165, 2.0**-1000])
+def test_records_near_the_ends_of_the_range_give_scaled_results(scale):
+    ref, fit = qdm.prony(REAL, order=6), qdm.prony(REAL * scale, order=6)
+    np.testing.assert_allclose(fit.amplitude, ref.amplitude * scale, rtol=1e-12)
+    np.testing.assert_allclose(fit.frequency, ref.frequency, rtol=1e-12)
 
 
 def test_rank_deficiency_is_a_warning_with_complete_results():

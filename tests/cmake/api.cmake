@@ -2,6 +2,7 @@
 # hook), against the built libqdm loaded as the host loads it.
 if(TARGET qdm_api)
   add_executable(api_plain_vs_host ${CMAKE_SOURCE_DIR}/tests/api/plain_vs_host.cpp
+                 ${CMAKE_SOURCE_DIR}/tests/api/plain_records.cpp
                  $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})
   target_include_directories(api_plain_vs_host PRIVATE ${CMAKE_SOURCE_DIR}
                              ${CMAKE_CURRENT_SOURCE_DIR} ${CMAKE_SOURCE_DIR}/include

@@ -72,6 +72,13 @@ inline bool Modes(Family f) {
   return f == Family::kProny || f == Family::kPencil || f == Family::kPcarSpectrum;
 }
 
+// A spectrum whose grid is shorter than the AR polynomial: the host face wraps
+// the coefficients there, the plain face refuses the call.
+inline bool SpectrumTooShort(const Export& x, const Scalars& s) {
+  return (x.family == Family::kCovSpectrum || x.family == Family::kPcarSpectrum) &&
+         SpectrumN(s.b) < int64_t{s.a} + 1;
+}
+
 inline std::vector<double> Samples(bool cx, int32_t n) {
   return Signal(cx, n).Reals(n * (cx ? 2 : 1));
 }
