@@ -293,7 +293,7 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
                                    kKrylovTolerance * s[0];
     }
     const int32_t keep = converged ? count : std::min(k - 1, count + (k - count) / 2);
-    if (!converged && restart >= kKrylovMaxRestarts) return status::kNoConvergence;
+    if (!converged && restart >= kKrylovMaxRestarts) return status::kKrylovNoConvergence;
     // V[:, 0:keep] = V Q[:, 0:keep] (row-major C = Q[:, 0:keep]: C[j][i] = conj(Qh[i][j])),
     // the residual direction v_k moved next to them, U[:, 0:keep] = U P[:, 0:keep].
     for (int32_t j = 0; j < k; ++j) {

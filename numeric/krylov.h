@@ -36,7 +36,7 @@
 // vectors, on a subspace of at most max(2 count + 8, count + 16) vectors. It
 // stops when every wanted triplet has ||H^H u - s v|| <= kKrylovTolerance s_1
 // (H v = s u holds by construction), and gives up with
-// status::kNoConvergence after kKrylovMaxRestarts restarts. Memory is
+// status::kKrylovNoConvergence after kKrylovMaxRestarts restarts. Memory is
 // O((rows + cols) * subspace) plus the FFT buffers; nothing is shared between
 // calls but the FFT plans, so it is thread-safe. x is not screened.
 constexpr double kKrylovTolerance = 1e-13;
