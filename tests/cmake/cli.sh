@@ -297,6 +297,9 @@ covspectrum $data --points 1073741824
 pencil /dev/zero
 pencil -
 pencil /dev/zero --max-input-bytes 4EiB
+covariance l1.csv --json
+covariance long_field.csv --json
+covariance --order 0 --rate 0 $data
 EOF
   # A refused spectrum size costs no memory: the library refuses before it is touched.
   kib=$($py - "$qdm" "$data" <<'PY'
