@@ -283,6 +283,8 @@ limits)
   expect 0 covariance seq.csv --max-input-bytes 9KiB
   expect 1 covariance seq.csv --max-input-bytes 0
   # Under a 2 GB address-space limit: one line and a documented code, never a signal.
+  # (AddressSanitizer reserves terabytes of address space: no such run with it.)
+  if ldd "$qdm" | grep -q libasan; then echo "passed: $case (AddressSanitizer: no limits run)"; exit 0; fi
   while read -r args; do
     # shellcheck disable=SC2086
     timeout 60 prlimit --as=2000000000 "$qdm" $args >/dev/null 2>err </dev/zero; rc=$?
