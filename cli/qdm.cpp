@@ -1,10 +1,9 @@
 // qdm: the command-line tool over the plain C API (libqdm_api). One method per run on a CSV
 // file, standard input or the built-in example; a table, JSON or CSV on standard output, and a
 // plot drawn with gnuplot. With several files (or --jobs) the files are fitted on a pool of
-// threads and printed as JSON lines, in input order. Exit status: 0 success, 1 bad usage or
-// input, 2 a library status (several files: any record failed), 3 an output not written.
-#include <unistd.h>
-
+// threads and printed as JSON lines, in input order. Exit status: 0 success, 1 bad usage,
+// input or value (a -424xx library status included), 2 the fit failed (any other library
+// status, or no memory; several files: any record failed), 3 an output not written.
 #include <algorithm>
 #include <atomic>
 #include <charconv>
@@ -13,11 +12,10 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <fstream>
-#include <iostream>
+#include <memory>
 #include <mutex>
+#include <new>
 #include <optional>
-#include <sstream>
 #include <string>
 #include <thread>
 #include <utility>
@@ -27,19 +25,14 @@
 #include "example_signal.h"
 #include "nlohmann/json.hpp"
 #include "qdm_api.h"
+#include "tool.h"
 
 namespace {
 
+using namespace qdm_cli;
 using Json = nlohmann::ordered_json;
-enum Exit { kOk = 0, kUsage = 1, kLibrary = 2, kOutput = 3 };
+constexpr auto kReplace = Json::error_handler_t::replace;  // invalid UTF-8 becomes U+FFFD
 constexpr double kPi = 3.14159265358979323846;
-
-// A failed record or run: its exit code, the library status if any, one line.
-struct Failure {
-  int exit;
-  std::optional<int32_t> status;
-  std::string message;
-};
 
 enum Method { kCovariance, kProny, kPcar, kPencil, kMdl, kCovSpectrum, kPcarSpectrum };
 constexpr unsigned Bit(Method m) { return 1u << m; }
@@ -62,9 +55,11 @@ struct Options {
   std::optional<int32_t> order, components, pencil, modes, upper, minOrder, points;
   std::optional<double> rate;
   bool realSignal = false, json = false, csv = false;
-  std::string example, plot;
+  std::string example, plot, columns, delimiter = ",";
+  uint64_t maxInputBytes = uint64_t{1} << 30;
   std::vector<std::string> files;
   int jobs = 1;
+  CsvFormat format;  // from columns, delimiter and maxInputBytes
 };
 
 // The integer parameters, and the methods each applies to.
@@ -89,69 +84,6 @@ const IntOption kIntOptions[] = {
      "spectrum points, rounded up to a power of two [512]", kSpectra},
 };
 
-struct Signal {
-  bool complex = false;
-  std::vector<double> values;  // n reals, or n (re, im) pairs
-  int32_t n = 0;
-  double defaultRate = 1.0;
-  // The samples as either twin takes them.
-  operator const double*() const { return values.data(); }
-  operator const qdm_complex*() const {
-    return reinterpret_cast<const qdm_complex*>(values.data());
-  }
-};
-
-[[noreturn]] void Bad(const std::string& message) { throw Failure{kUsage, {}, message}; }
-
-std::string Trim(const std::string& s) {
-  const size_t b = s.find_first_not_of(" \t\r\n");
-  return b == std::string::npos ? "" : s.substr(b, s.find_last_not_of(" \t\r\n") - b + 1);
-}
-
-bool ToDouble(const std::string& field, double* v) {
-  const char* first = field.c_str() + (field.size() > 1 && field[0] == '+');
-  const char* last = field.c_str() + field.size();
-  const auto r = std::from_chars(first, last, *v);
-  return !field.empty() && r.ec == std::errc() && r.ptr == last;
-}
-
-// One column: real samples; two: real and imaginary parts. Blank lines and
-// '#' comments are skipped; a first line with no number in it is a header.
-Signal ReadCsv(std::istream& in, const std::string& name) {
-  Signal s;
-  size_t columns = 0;
-  bool first = true;
-  std::string line;
-  for (size_t lineNo = 1; std::getline(in, line); ++lineNo) {
-    const std::string text = Trim(line.substr(0, line.find('#')));
-    if (text.empty()) continue;
-    std::vector<std::string> fields;
-    std::stringstream split(text);
-    for (std::string f; std::getline(split, f, ',');) fields.push_back(Trim(f));
-    if (text.back() == ',') fields.push_back("");
-    const std::string where = name + ":" + std::to_string(lineNo) + ": ";
-    double v = 0.0;
-    if (std::exchange(first, false) &&
-        std::none_of(fields.begin(), fields.end(), [&](auto& f) { return ToDouble(f, &v); }))
-      continue;  // a header
-    if (columns == 0) columns = fields.size();
-    if (columns > 2) Bad(where + std::to_string(columns) + " columns; expected 1 or 2");
-    if (fields.size() != columns)
-      Bad(where + std::to_string(fields.size()) + " fields, expected " + std::to_string(columns));
-    for (size_t c = 0; c < columns; ++c) {
-      if (!ToDouble(fields[c], &v))
-        Bad(where + "field " + std::to_string(c + 1) + " '" + fields[c] + "' is not a number");
-      s.values.push_back(v);
-    }
-  }
-  if (in.bad()) Bad("error reading " + name);
-  if (columns == 0) Bad(name + ": no samples");
-  if (s.values.size() / columns > INT32_MAX) Bad(name + ": too many samples");
-  s.complex = columns == 2;
-  s.n = static_cast<int32_t>(s.values.size() / columns);
-  return s;
-}
-
 Signal Load(const std::string& path, const Options& o) {
   if (!o.example.empty()) {
     Signal s;
@@ -161,28 +93,42 @@ Signal Load(const std::string& path, const Options& o) {
     s.defaultRate = qdm_example::kRate;
     return s;
   }
-  if (path == "-") return ReadCsv(std::cin, "standard input");
-  std::ifstream in(path);
-  if (!in) Bad("cannot read " + path + ": " + std::strerror(errno));
-  return ReadCsv(in, path);
+  if (path == "-") return ReadCsv(stdin, "standard input", o.format);
+  std::FILE* in = std::fopen(path.c_str(), "rb");
+  if (in == nullptr) Bad("cannot read " + Shown(path, kNameShown) + ": " + std::strerror(errno));
+  try {
+    Signal s = ReadCsv(in, path, o.format);
+    std::fclose(in);
+    return s;
+  } catch (...) {
+    std::fclose(in);
+    throw;
+  }
 }
 
+// One fit: the record (input, method, signal, parameters, status, results) and
+// the spectrum, which stays out of the JSON tree and is written as a stream.
 struct Record {
-  Json json;  // input, method, signal, parameters, status, results (or error)
+  Json json;
   int32_t status = QDM_OK;
   std::string warning;
+  std::unique_ptr<double[]> spectrum;
+  size_t spectrumLength = 0;
 };
 
+// A value the library refuses (an argument error, -424xx) is bad input, exit 1;
+// any other error status is a failed fit, exit 2. The message carries the status.
 void Check(int32_t status, const char* function, bool complex, Record& r) {
   r.status = status;
   if (status == QDM_WARN_RANK_DEFICIENT) r.warning = qdm_status_text(status);
   if (status == QDM_OK || status == QDM_WARN_RANK_DEFICIENT) return;
-  throw Failure{kLibrary, status,
+  const bool refused = status <= -42401 && status >= -42499;
+  throw Failure{refused ? kUsage : kFailed, status,
                 function + std::string(complex ? "_complex" : "_real") + " returned " +
                     std::to_string(status) + ": " + qdm_status_text(status)};
 }
 
-// A caller-allocated output that passes as either twin's pointer type.
+// A small caller-allocated output that passes as either twin's pointer type.
 struct Array {
   std::vector<double> v;
   explicit Array(size_t doubles) : v(std::max<size_t>(doubles, 2)) {}
@@ -190,9 +136,22 @@ struct Array {
   operator qdm_complex*() { return reinterpret_cast<qdm_complex*>(v.data()); }
 };
 
+// The spectrum output, allocated but not touched: the library checks its work
+// bound before it writes anything, so a refused size costs no memory.
+std::unique_ptr<double[]> SpectrumOutput(int32_t length) {
+  try {
+    return std::unique_ptr<double[]>(new double[std::max<size_t>(length, 2)]);
+  } catch (const std::bad_alloc&) {
+    throw Failure{kFailed, {},
+                  "no memory for a spectrum of " + std::to_string(length) + " values (" +
+                      std::to_string((uint64_t(length) * sizeof(double)) >> 20) + " MiB)"};
+  }
+}
+
 // The twins of a plain-API function that take the same arguments after the samples.
-#define QDM_TWIN(fn, ...) \
-  Check(s.complex ? fn##_complex(s, __VA_ARGS__) : fn##_real(s, __VA_ARGS__), #fn, s.complex, r)
+#define QDM_TWIN(fn, ...)                                                                \
+  Check(s.complex ? fn##_complex(cx, __VA_ARGS__) : fn##_real(re, __VA_ARGS__), #fn, \
+        s.complex, r)
 
 // Rows of named columns: row i of column c is values[c][i * stride]; null columns are left out.
 Json Rows(std::initializer_list<const char*> names, std::vector<const double*> values, size_t n,
@@ -221,6 +180,8 @@ Json Poles(const double* z, size_t n, double rate) {
 
 Record Fit(Method m, const Options& o, const std::string& input, const Signal& s) {
   Record r;
+  const double* re = s.values.data();
+  const auto* cx = reinterpret_cast<const qdm_complex*>(s.values.data());
   const double rate = o.rate.value_or(s.defaultRate);
   const int32_t flag = o.realSignal ? 1 : 0, n = s.n;
   int32_t resolved[std::size(kIntOptions)];
@@ -234,10 +195,12 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     if (kIntOptions[i].methods & Bit(m)) par[kIntOptions[i].key] = resolved[i];
   if (m != kMdl) par["rate_hz"] = rate;
   if ((kModal & Bit(m)) && !s.complex) par["real_signal"] = flag;
-  // Outputs are sized from parameters the library accepts (orders below n).
+  // Outputs are sized from parameters the library accepts (orders below n) and,
+  // for a spectrum, from the library's own length for the points asked.
   const size_t room = std::clamp(std::max({p, k, M}), 1, std::max(n, 1)) + 1;
   Array a(2 * room), z(2 * room), amp(room), phase(room), damping(room), freq(room);
-  Array db(std::max(qdm_spectrum_length(points), 1));
+  const int32_t length = (kSpectra & Bit(m)) ? qdm_spectrum_length(points) : 0;
+  std::unique_ptr<double[]> db = (kSpectra & Bit(m)) ? SpectrumOutput(length) : nullptr;
   double variance = 0.0, mse = 0.0, f0 = 0.0, df = 0.0, fitError = 0.0;
   int32_t count = 0, order = 0;
   switch (m) {
@@ -245,25 +208,25 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     case kPcar: QDM_TWIN(qdm_pcar, n, p, k, a, z); break;
     case kMdl: QDM_TWIN(qdm_mdl_order, n, upper, minOrder, &order); break;
     case kCovSpectrum:
-      QDM_TWIN(qdm_covariance_psd, n, p, points, rate, db, &f0, &df, &variance);
+      QDM_TWIN(qdm_covariance_psd, n, p, points, rate, db.get(), &f0, &df, &variance);
       break;
     case kProny:  // the real twins of these three take the real-signal flag
-      Check(s.complex ? qdm_prony_complex(s, n, p, rate, amp, phase, damping, freq, &count)
-                      : qdm_prony_real(s, n, p, rate, flag, amp, phase, damping, freq, &count),
+      Check(s.complex ? qdm_prony_complex(cx, n, p, rate, amp, phase, damping, freq, &count)
+                      : qdm_prony_real(re, n, p, rate, flag, amp, phase, damping, freq, &count),
             "qdm_prony", s.complex, r);
       break;
     case kPencil:
-      Check(s.complex ? qdm_matrix_pencil_complex(s, n, L, M, rate, amp, phase, damping, freq,
+      Check(s.complex ? qdm_matrix_pencil_complex(cx, n, L, M, rate, amp, phase, damping, freq,
                                                   &count, &mse)
-                      : qdm_matrix_pencil_real(s, n, L, M, rate, flag, amp, phase, damping, freq,
+                      : qdm_matrix_pencil_real(re, n, L, M, rate, flag, amp, phase, damping, freq,
                                                &count, &mse),
             "qdm_matrix_pencil", s.complex, r);
       break;
     case kPcarSpectrum:
-      Check(s.complex ? qdm_pcar_psd_complex(s, n, p, points, k, rate, amp, phase, freq, &count, db,
-                                             &f0, &df, &fitError)
-                      : qdm_pcar_psd_real(s, n, p, points, k, rate, flag, amp, phase, freq, &count,
-                                          db, &f0, &df, &fitError),
+      Check(s.complex ? qdm_pcar_psd_complex(cx, n, p, points, k, rate, amp, phase, freq, &count,
+                                             db.get(), &f0, &df, &fitError)
+                      : qdm_pcar_psd_real(re, n, p, points, k, rate, flag, amp, phase, freq,
+                                          &count, db.get(), &f0, &df, &fitError),
             "qdm_pcar_psd", s.complex, r);
       break;
   }
@@ -283,8 +246,10 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
                         {amp, phase, m == kPcarSpectrum ? nullptr : damping.v.data(), freq}, count);
   }
   if (kSpectra & Bit(m)) {
-    db.v.resize(qdm_spectrum_length(points));
-    res["spectrum"] = {{"f0_hz", f0}, {"df_hz", df}, {"length", db.v.size()}, {"db", db.v}};
+    // "db" is filled in from r.spectrum as the record is written.
+    res["spectrum"] = {{"f0_hz", f0}, {"df_hz", df}, {"length", length}, {"db", Json::array()}};
+    r.spectrum = std::move(db);
+    r.spectrumLength = size_t(length);
   }
   r.json = {{"input", input},
             {"method", kMethods[m][0]},
@@ -296,10 +261,61 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   return r;
 }
 
-// Shortest text that reads back as the same double (null, for NaN: nan).
-std::string Exact(const Json& v) {
+// ---- output ---------------------------------------------------------------------------
+
+// Writes in pieces through a buffer, so a long spectrum is never one string.
+class Writer {
+ public:
+  explicit Writer(std::FILE* out) : out_(out) {}
+  ~Writer() { Flush(); }
+  Writer& operator<<(std::string_view s) {
+    buffer_.append(s);
+    if (buffer_.size() >= (size_t{1} << 16)) Flush();
+    return *this;
+  }
+  void Flush() {
+    std::fwrite(buffer_.data(), 1, buffer_.size(), out_);
+    buffer_.clear();
+  }
+
+ private:
+  std::FILE* out_;
+  std::string buffer_;
+};
+
+// Shortest text that reads back as the same double (NaN: nan).
+std::string Exact(double v) {
   char b[32];
-  return std::string(b, std::to_chars(b, b + sizeof b, v.is_null() ? NAN : v.get<double>()).ptr);
+  return std::string(b, std::to_chars(b, b + sizeof b, v).ptr);
+}
+std::string Exact(const Json& v) { return Exact(v.is_null() ? NAN : v.get<double>()); }
+
+// A double as the JSON writer puts it: shortest form, a point if integral, null if not finite.
+std::string JsonNumber(double v) {
+  if (!std::isfinite(v)) return "null";
+  std::string text = Exact(v);
+  if (text.find_first_of(".e") == std::string::npos) text += ".0";
+  return text;
+}
+
+// The record as JSON (indent < 0: one line), with the spectrum spliced into "db".
+void WriteJson(std::FILE* out, const Record& r, int indent) {
+  const std::string text = r.json.dump(indent, ' ', false, kReplace);
+  Writer w(out);
+  const std::string empty = indent < 0 ? "\"db\":[]" : "\"db\": []";
+  const size_t at = r.spectrum ? text.rfind(empty) : std::string::npos;
+  if (at == std::string::npos) {
+    w << text << "\n";
+    return;
+  }
+  const size_t open = at + empty.size() - 1;  // the ']' of "[]"
+  const size_t lineStart = text.rfind('\n', at) + 1;
+  const std::string pad = indent < 0 ? "" : "\n" + std::string(at - lineStart, ' ');
+  const std::string inner = indent < 0 ? "" : pad + std::string(size_t(indent), ' ');
+  w << std::string_view(text).substr(0, open);
+  for (size_t i = 0; i < r.spectrumLength; ++i)
+    w << (i == 0 ? "" : ",") << inner << JsonNumber(r.spectrum[i]);
+  w << (r.spectrumLength ? pad : "") << std::string_view(text).substr(open) << "\n";
 }
 
 std::string Brief(const Json& v) {
@@ -315,7 +331,7 @@ std::string Padded(const std::string& text, size_t width) {
 std::string Table(const Json& j) {
   const std::string input = j["input"];
   std::string out = "qdm " + j["method"].get<std::string>() + ": " +
-                    (input == "-" ? "standard input" : input) + ", " +
+                    (input == "-" ? "standard input" : Shown(input, kNameShown)) + ", " +
                     j["signal"]["type"].get<std::string>() + ", " + j["signal"]["samples"].dump() +
                     " samples\nparameters:";
   for (const auto& [key, v] : j["parameters"].items()) out += " " + key + " = " + Brief(v);
@@ -342,112 +358,122 @@ std::string Table(const Json& j) {
 
 // One table of the results as CSV, numbers exact: the spectrum (frequency_hz,
 // power_db) or an array of records (modes, coefficients, poles).
-std::string CsvTable(const Json& res, const std::string& key) {
-  std::string out;
+void WriteCsvTable(std::FILE* out, const Record& r, const std::string& key) {
+  Writer w(out);
+  const Json& res = r.json["results"];
   if (key == "spectrum") {
-    const Json& s = res[key];
-    out = "frequency_hz,power_db\n";
-    for (size_t i = 0; i < s["db"].size(); ++i)
-      out += Exact(s["f0_hz"].get<double>() + static_cast<double>(i) * s["df_hz"].get<double>()) +
-             "," + Exact(s["db"][i]) + "\n";
+    const double f0 = res[key]["f0_hz"], df = res[key]["df_hz"];
+    w << "frequency_hz,power_db\n";
+    for (size_t i = 0; i < r.spectrumLength; ++i)
+      w << Exact(f0 + static_cast<double>(i) * df) << "," << Exact(r.spectrum[i]) << "\n";
+    return;
   }
-  for (size_t i = 0; key != "spectrum" && i < res[key].size(); ++i) {
+  for (size_t i = 0; i < res[key].size(); ++i) {
     std::string header, row;
     for (const auto& [column, v] : res[key][i].items()) {
       header.append(",").append(column);
       row.append(",").append(Exact(v));
     }
-    out += (i == 0 ? header.substr(1) + "\n" : "") + row.substr(1) + "\n";
+    w << (i == 0 ? header.substr(1) + "\n" : "") << row.substr(1) << "\n";
   }
-  return out;
 }
 
 // The method's main table: the spectrum, the modes, the coefficients, or the order.
-std::string Csv(const Json& res) {
+void WriteCsv(std::FILE* out, const Record& r) {
+  const Json& res = r.json["results"];
   for (const char* key : {"spectrum", "modes", "coefficients"})
-    if (res.contains(key)) return CsvTable(res, key);
-  return "order\n" + res["order"].dump() + "\n";
+    if (res.contains(key)) return WriteCsvTable(out, r, key);
+  Writer(out) << "order\n" << res["order"].dump() << "\n";
 }
 
-std::string Quoted(const std::string& s) {  // a gnuplot string
-  std::string out = "'";
-  for (const char c : s) out += c == '\'' ? std::string("''") : std::string(1, c);
-  return out + "'";
+// ---- the plot -------------------------------------------------------------------------
+
+// Text as gnuplot's data reader gives it back: shown as a message shows it,
+// with quotes escaped and every backslash doubled (the reader removes one).
+std::string PlotText(const std::string& text) {
+  std::string out;
+  for (const char c : Shown(text, 1024, true)) out += c == '\\' ? std::string(2, c) : std::string(1, c);
+  return out;
 }
 
 // Draws the spectrum (modes marked), the modes, or the poles; false: no gnuplot.
-bool Plot(const std::string& png, const Json& j) {
+// The script is fixed text; the title (which names the input) and every number
+// are data files it reads.
+bool Plot(const std::string& png, const Record& r) {
+  const Json& j = r.json;
   const Json& res = j["results"];
   std::string key;
   for (const char* k : {"spectrum", "modes", "poles", "roots"})
     if (key.empty() && res.contains(k)) key = k;
-  if (key.empty()) return true;  // mdl: nothing to draw
-  if (std::system("command -v gnuplot >/dev/null 2>&1") != 0) return false;
-  std::string title =
-      "qdm " + j["method"].get<std::string>() + ", " + j["input"].get<std::string>();
+  std::string title = "qdm " + j["method"].get<std::string>() + ", " +
+                      (j["input"] == "-" ? "standard input" : j["input"].get<std::string>());
   for (const auto& [name, v] : j["parameters"].items()) title += ", " + name + " " + Brief(v);
-  std::string script = "set terminal pngcairo size 1100,650 font 'DejaVu Sans,11'\nset output " +
-                       Quoted(png) + "\nset title " + Quoted(title) +
-                       " noenhanced\nset grid\nset key bottom right opaque box\n"
-                       "set datafile separator ','\nset datafile columnheaders\n$d << EOD\n" +
-                       CsvTable(res, key) + "EOD\n";
+  std::vector<PlotFile> files = {
+      {"title.txt", [&](std::FILE* f) { Writer(f) << PlotText(title) << "\n"; }},
+      {"data.csv", [&](std::FILE* f) { WriteCsvTable(f, r, key); }},
+  };
+  std::string script =
+      "set datafile separator \"\\t\"\n"
+      "set datafile commentschars \"\"\n"
+      "stats 'title.txt' using (T = strcol(1), 0) nooutput\n"
+      "set title T noenhanced\n"
+      "set grid\nset key bottom right opaque box\n"
+      "set datafile separator ','\nset datafile columnheaders\n";
+  const std::string terminal =
+      "set terminal pngcairo size 1100,650 font 'DejaVu Sans,11'\nset output\n";
+  const Json modes = res.value("modes", Json::array());
   if (key == "spectrum") {
     const bool mirror = j["parameters"].value("real_signal", 0) == 1;
-    const Json modes = res.value("modes", Json::array());
-    for (const Json& mode : modes) {
-      const double f = mode["frequency_hz"];
-      script += "set label '" + Brief(f) + " Hz' at " + Exact(f) +
-                ", graph 0.96 offset 0.5,0 tc rgb '#c0392b'\n";
-      for (const double x : mirror ? std::vector{f, -f} : std::vector{f})
-        script += "set arrow from " + Exact(x) + ", graph 0 to " + Exact(x) +
-                  ", graph 1 nohead dt 2 lw 1.5 lc rgb '#c0392b'\n";
-    }
+    // A first pass on no terminal finds the y range the mode lines span.
     script +=
         "set xlabel 'Frequency (Hz)'\nset ylabel 'Power (dB, peak = 0 dB)'\n"
-        "set yrange [-160<*:3]\nplot $d using 1:2 with lines lw 2 lc rgb '#1f5fa8' title "
-        "'AR spectrum'" +
-        std::string(modes.empty() ? ""
-                                  : ", NaN with lines dt 2 lw 1.5 lc rgb '#c0392b' title 'modes'");
+        "set yrange [-160<*:3]\nset terminal unknown\nplot 'data.csv' using 1:2 notitle\n"
+        "lo = GPVAL_Y_MIN\nhi = GPVAL_Y_MAX\nset yrange [lo:hi]\n" +
+        terminal + "plot 'data.csv' using 1:2 with lines lw 2 lc rgb '#1f5fa8' title 'AR spectrum'";
+    if (!modes.empty()) {
+      files.push_back({"modes.csv", [&](std::FILE* f) {
+                         Writer w(f);
+                         w << "frequency_hz\n";
+                         for (const Json& mode : modes) w << Exact(mode["frequency_hz"]) << "\n";
+                       }});
+      const std::string line = ":(lo):(0):(hi-lo) with vectors nohead dt 2 lw 1.5 lc rgb '#c0392b'";
+      script += ", 'modes.csv' using 1" + line + " title 'modes'";
+      if (mirror) script += ", 'modes.csv' using (-$1)" + line + " notitle";
+      script +=
+          ", 'modes.csv' using 1:(hi):(sprintf('%.5g Hz', $1)) with labels left "
+          "offset 0.5,-0.8 tc rgb '#c0392b' notitle";
+    }
   } else if (key == "modes") {
-    script +=
-        "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n"
-        "plot $d using 'frequency_hz':'amplitude' with impulses lw 3 lc rgb '#1f5fa8' "
-        "title 'modes', '' using 'frequency_hz':'amplitude':(sprintf('%.4g Hz', "
-        "column('frequency_hz'))) with labels offset 0,1 notitle";
+    script += "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n" + terminal +
+              "plot 'data.csv' using 'frequency_hz':'amplitude' with impulses lw 3 lc rgb "
+              "'#1f5fa8' title 'modes', '' using 'frequency_hz':'amplitude':(sprintf('%.4g Hz', "
+              "column('frequency_hz'))) with labels offset 0,1 notitle";
   } else {
-    script +=
-        "set parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
-        "set ylabel 'Imaginary'\nplot cos(t), sin(t) with lines lc rgb 'gray' title "
-        "'unit circle', $d using 1:2 with points pt 7 ps 1.5 lc rgb '#1f5fa8' title " +
-        Quoted(key);
+    script += "set parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
+              "set ylabel 'Imaginary'\n" + terminal +
+              "plot cos(t), sin(t) with lines lc rgb 'gray' title 'unit circle', 'data.csv' "
+              "using 1:2 with points pt 7 ps 1.5 lc rgb '#1f5fa8' title '" +
+              std::string(key == "roots" ? "roots" : "poles") + "'";
   }
-  char path[] = "/tmp/qdm-plot-XXXXXX";
-  const int fd = mkstemp(path);
-  script += "\n";
-  const bool written = fd >= 0 && write(fd, script.data(), script.size()) == ssize_t(script.size());
-  std::string reason;  // gnuplot's last line
-  int rc = -1;
-  FILE* gnuplot =
-      written ? popen(("gnuplot " + std::string(path) + " 2>&1").c_str(), "r") : nullptr;
-  for (char line[512]; gnuplot && std::fgets(line, sizeof line, gnuplot);)
-    if (!Trim(line).empty()) reason = Trim(line);
-  if (gnuplot) rc = pclose(gnuplot);
-  if (fd >= 0) close(fd), std::remove(path);
-  if (rc != 0) throw Failure{kOutput, {}, "gnuplot could not draw " + png + ": " + reason};
-  return true;
+  return RunGnuplot(script + "\n", files, png);
 }
+
+// ---- runs -----------------------------------------------------------------------------
 
 // Fits one input; the record, or the error record, and the exit code it gives.
 Record RunOne(Method m, const Options& o, const std::string& path, int* exitCode) {
-  Failure f;
+  Failure f{kOk, {}, {}};
   try {
     *exitCode = kOk;
     return Fit(m, o, path, Load(path, o));
   } catch (const Failure& failure) {
     f = failure;
-    if (f.status) f.message = path + ": " + f.message;  // read errors name the file already
-  } catch (const std::exception& e) {                   // no memory for the samples, say
-    f = {kUsage, {}, path + ": " + e.what()};
+    if (f.exit != kUsage || f.status)  // read errors name the file already
+      f.message = Shown(path, kNameShown) + ": " + f.message;
+  } catch (const std::bad_alloc&) {
+    f = {kFailed, {}, Shown(path, kNameShown) + ": out of memory"};
+  } catch (const std::exception& e) {
+    f = {kFailed, {}, Shown(path, kNameShown) + ": " + Shown(e.what(), 200)};
   }
   *exitCode = f.exit;
   Record r;
@@ -464,13 +490,18 @@ Record RunOne(Method m, const Options& o, const std::string& path, int* exitCode
 int RunBatch(Method m, const Options& o) {
   const size_t n = o.files.size();
   std::vector<std::optional<Record>> records(n);
-  std::vector<int> codes(n);
+  std::vector<int> codes(n, kOk);
   std::mutex mutex;
   std::condition_variable ready;
   std::atomic<size_t> next{0};
   auto worker = [&] {
     for (size_t i; (i = next++) < n;) {
-      Record r = RunOne(m, o, o.files[i], &codes[i]);
+      Record r;
+      try {
+        r = RunOne(m, o, o.files[i], &codes[i]);
+      } catch (...) {  // no memory even for the error record: it is written below
+        codes[i] = kFailed;
+      }
       std::lock_guard<std::mutex> lock(mutex);
       records[i] = std::move(r);
       ready.notify_all();
@@ -483,16 +514,20 @@ int RunBatch(Method m, const Options& o) {
   for (size_t i = 0; i < n; ++i) {
     std::unique_lock<std::mutex> lock(mutex);
     ready.wait(lock, [&] { return records[i].has_value(); });
-    const Record r = std::move(*records[i]);
+    Record r = std::move(*records[i]);
     records[i].reset();
     lock.unlock();
-    std::fputs((r.json.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n").c_str(),
-               stdout);
+    if (r.json.is_null())
+      r.json = {{"input", o.files[i]}, {"method", kMethods[m][0]}, {"status", nullptr},
+                {"exit", kFailed}, {"error", Shown(o.files[i], kNameShown) + ": out of memory"}};
+    WriteJson(stdout, r, -1);
     if (!r.warning.empty())
-      std::fprintf(stderr, "qdm: %s: warning: %s\n", o.files[i].c_str(), r.warning.c_str());
-    if (codes[i] != kOk) exit = kLibrary;
-    if (codes[i] != kOk)
+      std::fprintf(stderr, "qdm: %s: warning: %s\n", Shown(o.files[i], kNameShown).c_str(),
+                   r.warning.c_str());
+    if (codes[i] != kOk) {
+      exit = kFailed;
       std::fprintf(stderr, "qdm: %s\n", r.json["error"].get<std::string>().c_str());
+    }
   }
   return exit;
 }
@@ -502,24 +537,56 @@ int RunSingle(Method m, const Options& o) {
   int code = kOk;
   Record r = RunOne(m, o, path, &code);
   if (code != kOk) {
-    if (o.json) std::printf("%s\n", r.json.dump(2).c_str());
+    if (o.json) WriteJson(stdout, r, 2);
     std::fprintf(stderr, "qdm: %s\n", r.json["error"].get<std::string>().c_str());
     return code;
   }
   if (!r.warning.empty()) std::fprintf(stderr, "qdm: warning: %s\n", r.warning.c_str());
-  const std::string out = o.json ? r.json.dump(2, ' ', false, Json::error_handler_t::replace) + "\n"
-                          : o.csv ? Csv(r.json["results"])
-                                  : Table(r.json);
-  std::fputs(out.c_str(), stdout);
-  if (!o.plot.empty() && !Plot(o.plot, r.json))
+  if (o.json) {
+    WriteJson(stdout, r, 2);
+  } else if (o.csv) {
+    WriteCsv(stdout, r);
+  } else {
+    std::fputs(Table(r.json).c_str(), stdout);
+  }
+  if (!o.plot.empty() && !Plot(o.plot, r))
     std::fprintf(stderr, "qdm: gnuplot not found on PATH, %s not drawn (install gnuplot-nox)\n",
-                 o.plot.c_str());
+                 Shown(o.plot, kNameShown).c_str());
   return kOk;
 }
 
-}  // namespace
+// ---- the command line -----------------------------------------------------------------
 
-int main(int argc, char** argv) {
+// CLI11 takes `--order ''` as no value at all; here it is an error.
+const CLI::Validator kNonEmpty(
+    [](std::string& value) { return value.empty() ? std::string("an empty value") : std::string(); },
+    "", "NonEmpty");
+
+// --column(s) and --delimiter into the CSV format; a usage message, or "".
+std::string MakeFormat(Options& o) {
+  CsvFormat& f = o.format;
+  f.maxBytes = o.maxInputBytes;
+  const std::string& d = o.delimiter;
+  if (d == "tab" || d == "\t") f.delimiter = '\t';
+  else if (d == "space" || d == " ") f.blanks = true;
+  else if (d == "," || d == ";" || d == "|") f.delimiter = d[0];
+  else return "--delimiter takes ',', ';', '|', tab or space, not '" + Shown(d, kFieldShown) + "'";
+  if (o.columns.empty()) return "";
+  for (size_t i = 0;;) {
+    const size_t end = std::min(o.columns.find(',', i), o.columns.size());
+    f.columns.push_back(o.columns.substr(i, end - i));
+    if (end == o.columns.size()) break;
+    i = end + 1;
+  }
+  const bool empty = std::any_of(f.columns.begin(), f.columns.end(),
+                                 [](const std::string& c) { return c.empty(); });
+  if (f.columns.size() > 2 || empty)
+    return "--column takes one column (real samples) or two, as N,M or NAME,NAME (real, "
+           "imaginary), not '" + Shown(o.columns, kFieldShown) + "'";
+  return "";
+}
+
+int Main(int argc, char** argv) {
   CLI::App app{
       "qdm: AR models, damped exponentials and AR spectra of a signal: a CSV file (one "
       "column: real samples;\ntwo: real and imaginary parts), standard input (FILE '-' "
@@ -528,30 +595,52 @@ int main(int argc, char** argv) {
   app.set_version_flag("--version", std::string("qdm ") + qdm_version());
   app.require_subcommand(1);
   app.footer(
-      "Exit status: 0 success, 1 bad usage or input, 2 a library status (with several "
+      "Exit status: 0 success, 1 bad usage, input or value (a library status -424xx "
+      "included), 2 the fit failed (any other library status, or no memory; with several "
       "files: any record failed), 3 an output that cannot be written.");
   Options o;
   std::vector<std::pair<CLI::App*, Method>> subs;
+  const char* const kIgnored = "Options of other methods (accepted and ignored)";
   for (int m = kCovariance; m <= kPcarSpectrum; ++m) {
     CLI::App* sub = app.add_subcommand(kMethods[m][0], kMethods[m][1]);
     subs.push_back({sub, Method(m)});
     const unsigned bit = Bit(Method(m));
     for (const IntOption& io : kIntOptions)
-      sub->add_option(io.flag, o.*io.field, io.help)->group(io.methods & bit ? "Parameters" : "");
+      sub->add_option(io.flag, o.*io.field, io.help)
+          ->check(kNonEmpty)
+          ->group(io.methods & bit ? "Parameters" : kIgnored);
     sub->add_option("--rate", o.rate, "sampling rate in Hz [1000 for the example, else 1]")
-        ->group(m == kMdl ? "" : "Parameters");
+        ->check(kNonEmpty)
+        ->group(m == kMdl ? kIgnored : "Parameters");
     sub->add_flag("--real-signal", o.realSignal,
                   "real data: one mode per conjugate pair, at its non-negative frequency")
-        ->group(kModal & bit ? "Parameters" : "");
+        ->group(kModal & bit ? "Parameters" : kIgnored);
     sub->add_option("files", o.files, "CSV files; '-' or none: standard input");
     sub->add_option("--example", o.example, "fit the built-in example signal: real or complex")
         ->expected(0, 1)
         ->default_str("real")
         ->check(CLI::IsMember({"real", "complex"}));
+    sub->add_option("--column,--columns", o.columns,
+                    "the CSV column of real samples, or two (real, imaginary) as N,M; by "
+                    "1-based number or header name")
+        ->check(kNonEmpty)
+        ->group("Input");
+    sub->add_option("--delimiter", o.delimiter,
+                    "CSV field separator: ',' (default), ';', '|', tab, or space (runs of "
+                    "spaces and tabs); other than ',', a comma in a number is its decimal point")
+        ->check(kNonEmpty)
+        ->group("Input");
+    sub->add_option("--max-input-bytes", o.maxInputBytes,
+                    "refuse input longer than this (units as 64MiB or 2GiB) [1GiB]")
+        ->transform(CLI::AsSizeValue(false))
+        ->check(CLI::Range(uint64_t{1}, uint64_t{1} << 62))
+        ->group("Input");
     CLI::Option* json = sub->add_flag("--json", o.json, "print JSON");
     sub->add_flag("--csv", o.csv, "print the main table as CSV")->excludes(json);
-    sub->add_option("--plot", o.plot, "draw the results to FILE.png with gnuplot");
+    sub->add_option("--plot", o.plot, "draw the results to FILE.png with gnuplot")
+        ->check(kNonEmpty);
     sub->add_option("--jobs", o.jobs, "fit the files on N threads (0: one per core), JSON lines")
+        ->check(kNonEmpty)
         ->check(CLI::Range(0, 1024));
     sub->footer("Options of the other methods are accepted and ignored.");
   }
@@ -563,24 +652,34 @@ int main(int argc, char** argv) {
     std::fprintf(stderr,
                  "qdm: %s%s%s; methods: covariance, prony, pcar, pencil, mdl, covspectrum, "
                  "pcarspectrum (see qdm --help)\n",
-                 argc < 2 ? "no method given" : "unknown method '", argc < 2 ? "" : argv[1],
-                 argc < 2 ? "" : "'");
+                 argc < 2 ? "no method given" : "unknown method '",
+                 argc < 2 ? "" : Shown(argv[1], kFieldShown).c_str(), argc < 2 ? "" : "'");
     return kUsage;
   }
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& e) {
     if (e.get_exit_code() == 0) return app.exit(e);
-    std::fprintf(stderr, "qdm: %s (see qdm --help)\n", e.what());
+    std::fprintf(stderr, "qdm: %s (see qdm --help)\n", Shown(e.what(), 200).c_str());
     return kUsage;
   }
   const bool batch = o.files.size() > 1 || chosen->count("--jobs") > 0;
-  std::string usage;
+  std::string usage = MakeFormat(o);
   if (!o.example.empty() && !o.files.empty()) usage = "--example takes no FILE";
   if (batch && (o.csv || !o.plot.empty())) usage = "--csv and --plot take one FILE, not --jobs";
+  if (method == kMdl && !o.plot.empty()) usage = "--plot draws nothing for mdl";
+  if (std::count(o.files.begin(), o.files.end(), "-") > 1)
+    usage = "standard input ('-') can be read only once";
   if (!usage.empty()) {
     std::fprintf(stderr, "qdm: %s (see qdm %s --help)\n", usage.c_str(), kMethods[method][0]);
     return kUsage;
+  }
+  // gnuplot never sees the path, but a name with control bytes is no picture's name.
+  if (std::any_of(o.plot.begin(), o.plot.end(),
+                  [](unsigned char c) { return c < 0x20 || c == 0x7f; })) {
+    std::fprintf(stderr, "qdm: refused --plot name '%s': it holds control characters\n",
+                 Shown(o.plot, kNameShown).c_str());
+    return kOutput;
   }
   if (o.files.empty())
     o.files.push_back(o.example.empty() ? "-" : "built-in example (" + o.example + ")");
@@ -596,4 +695,23 @@ int main(int argc, char** argv) {
     return kOutput;
   }
   return code;
+}
+
+}  // namespace
+
+// Every exception ends here as one line and a documented exit code.
+int main(int argc, char** argv) {
+  try {
+    return Main(argc, argv);
+  } catch (const Failure& f) {
+    std::fprintf(stderr, "qdm: %s\n", f.message.c_str());
+    return f.exit;
+  } catch (const std::bad_alloc&) {
+    std::fputs("qdm: out of memory\n", stderr);
+  } catch (const std::exception& e) {
+    std::fprintf(stderr, "qdm: %s\n", Shown(e.what(), 200).c_str());
+  } catch (...) {
+    std::fputs("qdm: unexpected error\n", stderr);
+  }
+  return kFailed;
 }

@@ -74,21 +74,6 @@ std::vector<Scalars> Sets(const Export& x) {
   return sets;
 }
 
-// Values of output i that hold results: a mode array's first `count` only.
-size_t ResultValues(const Export& x, const PlainCall& c, int i) {
-  const bool counted = Modes(x.family) && !(x.family == Family::kPcarSpectrum && i == 3);
-  return counted ? std::min(c.out[i].size(), size_t(std::max(c.count, 0))) : c.out[i].size();
-}
-
-bool AllFinite(const Export& x, const PlainCall& c) {
-  for (int i = 0; i < x.outputs; ++i)
-    for (size_t j = 0; j < ResultValues(x, c, i); ++j)
-      if (!std::isfinite(c.out[i][j])) return false;
-  for (int j = 0; j < x.doubles; ++j)
-    if (!std::isfinite(c.d[j])) return false;
-  return true;
-}
-
 bool Known(int32_t st) {
   switch (st) {
 #define QDM_KNOWN(name, code, text) case code:

@@ -1,5 +1,6 @@
 # The installed qdm tool (Linux), run by tests/cmake/cli.sh from a prefix under
-# the build tree: stdin and stdout, --jobs, every exit code, plots.
+# the build tree: stdin and stdout, --jobs, every exit code, plots, CSV
+# dialects and hostile input.
 if(NOT TARGET qdm_cli)
   return()
 endif()
@@ -7,10 +8,11 @@ set(_cli_prefix ${CMAKE_CURRENT_BINARY_DIR}/cli_prefix)
 add_test(NAME cli.install
          COMMAND ${CMAKE_COMMAND} --install ${CMAKE_BINARY_DIR} --prefix ${_cli_prefix})
 set_tests_properties(cli.install PROPERTIES FIXTURES_SETUP qdm_cli_installed)
-foreach(case stdin_stdout jobs exit_codes plot)
+foreach(case stdin_stdout jobs exit_codes plot csv limits)
   add_test(NAME cli.${case}
            COMMAND bash ${CMAKE_CURRENT_LIST_DIR}/cli.sh ${_cli_prefix}
                    ${CMAKE_CURRENT_BINARY_DIR}/cli_work/${case}
-                   ${CMAKE_SOURCE_DIR}/tests/data/marple64.csv ${case})
+                   ${CMAKE_SOURCE_DIR}/tests/data/marple64.csv
+                   ${CMAKE_SOURCE_DIR}/README.md ${case})
   set_tests_properties(cli.${case} PROPERTIES FIXTURES_REQUIRED qdm_cli_installed)
 endforeach()

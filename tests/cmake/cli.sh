@@ -1,24 +1,33 @@
 #!/usr/bin/env bash
-# End-to-end checks of the installed qdm tool: cli.sh PREFIX WORKDIR DATA CASE.
+# End-to-end checks of the installed qdm tool: cli.sh PREFIX WORKDIR DATA README CASE.
 # PREFIX is a tree made by `cmake --install`; every case runs the installed copy
 # (no build-tree paths, no LD_LIBRARY_PATH). Prints what it checks; exit 0 = pass.
 set -uo pipefail
-prefix=$1 work=$2 data=$3 case=$4
+prefix=$1 work=$2 data=$3 readme=$4 case=$5
 qdm=$prefix/bin/qdm
 py=/usr/bin/python3
 unset LD_LIBRARY_PATH
 mkdir -p "$work" && cd "$work" || exit 1
 fail() { echo "FAIL: $*"; exit 1; }
 # expect CODE ARGS...: runs qdm, checks the exit code; stdout in out, stderr in err.
+# A failure is one line on stderr that names the program.
 expect() {
   local want=$1; shift
   "$qdm" "$@" >out 2>err; local rc=$?
-  [ "$rc" = "$want" ] || fail "qdm $* exited $rc, expected $want; stderr: $(cat err)"
+  [ "$rc" = "$want" ] || fail "qdm $* exited $rc, expected $want; stderr: $(head -c 300 err)"
   if [ "$want" != 0 ]; then
-    [ "$(wc -l <err)" = 1 ] || fail "qdm $*: expected one line on stderr, got: $(cat err)"
-    grep -q '^qdm: ' err || fail "qdm $*: stderr line lacks the program name: $(cat err)"
+    [ "$(wc -l <err)" = 1 ] || fail "qdm $*: expected one line on stderr, got: $(head -c 300 err)"
+    grep -q '^qdm: ' err || fail "qdm $*: stderr line lacks the program name: $(head -c 300 err)"
   fi
-  echo "ok: qdm $* -> $rc $(head -c 120 err)"
+  echo "ok: qdm $(printf '%q ' "$@" | head -c 100) -> $rc $(head -c 120 err)"
+}
+# samples TYPE N: the JSON record in out read TYPE (real or complex) with N samples.
+samples() {
+  $py - "$1" "$2" <<'PY' || fail "expected $1 signal of $2 samples: $(head -c 300 out)"
+import json, sys
+s = json.load(open("out"))["signal"]
+assert s == {"type": sys.argv[1], "samples": int(sys.argv[2])}, s
+PY
 }
 
 case $case in
@@ -36,6 +45,18 @@ assert len(r["results"]["coefficients"]) == 16 and "noise_variance" in r["result
 PY
   expect 0 covariance --order 15 --csv - <"$data"
   [ "$(head -1 out)" = "real,imag" ] && [ "$(wc -l <out)" = 17 ] || fail "CSV: $(head -3 out)"
+  # The spectrum is written as a stream: its JSON and CSV forms hold the same doubles.
+  "$qdm" pcarspectrum "$data" --points 100 --json >spectrum.json || fail "spectrum JSON"
+  "$qdm" pcarspectrum "$data" --points 100 --csv >spectrum.csv || fail "spectrum CSV"
+  $py - <<'PY' || fail "spectrum JSON and CSV differ"
+import csv, json
+s = json.load(open("spectrum.json"))["results"]["spectrum"]
+rows = list(csv.DictReader(open("spectrum.csv")))
+assert s["length"] == 128 == len(s["db"]) == len(rows), (s["length"], len(rows))
+assert all(isinstance(v, float) for v in s["db"]) and max(s["db"]) == 0.0, s["db"][:4]
+assert [float(r["power_db"]) for r in rows] == s["db"]
+assert float(rows[5]["frequency_hz"]) == s["f0_hz"] + 5 * s["df_hz"]
+PY
   # The installed tree moves as a whole: the tool finds its library beside it.
   rm -rf moved && cp -a "$prefix" moved && qdm=$PWD/moved/bin/qdm
   expect 0 covariance - --order 15 --json <"$data"
@@ -46,7 +67,8 @@ PY
 jobs)
   # One bad file among good ones: its own error line, the others fitted, input order kept.
   cp "$data" a.csv && head -40 "$data" >b.csv && printf '1\n2\nxyz\n' >bad.csv
-  expect 2 pencil --jobs 2 a.csv bad.csv b.csv
+  cp "$data" $'latin\xff.csv' && printf '1\n2\n\xe9t\xe9\n' >l1.csv
+  expect 2 pencil --jobs 2 a.csv bad.csv b.csv --order 0
   $py - out <<'PY' || fail "JSON lines: $(cat out)"
 import json, sys
 lines = [json.loads(l) for l in open(sys.argv[1])]
@@ -58,20 +80,78 @@ PY
   grep -q 'bad.csv:3' err || fail "stderr does not name the bad record: $(cat err)"
   expect 0 pencil --jobs 2 a.csv b.csv a.csv
   [ "$(wc -l <out)" = 3 ] || fail "three lines expected"
+  # Per record, a refused value is exit 1 and a failed fit exit 2, as for one file;
+  # non-UTF-8 names and contents still give valid JSON lines.
+  for i in $(seq 64); do echo 0; done >zeros.csv
+  "$qdm" mdl --jobs 2 a.csv zeros.csv $'latin\xff.csv' l1.csv >out 2>err; rc=$?
+  [ $rc = 2 ] && [ "$(wc -l <err)" = 2 ] || fail "mixed records: exit $rc, $(cat err)"
+  "$qdm" covariance --order 0 --jobs 1 a.csv >>out 2>/dev/null
+  $py - out <<'PY' || fail "per-record exit codes: $(cat out)"
+import json, sys
+lines = [json.loads(l) for l in open(sys.argv[1], encoding="utf-8")]
+assert [l.get("exit", 0) for l in lines] == [0, 2, 0, 1, 1], lines
+assert lines[2]["input"] == "latin\ufffd.csv" and lines[4]["status"] == -42412, lines
+assert lines[1]["status"] < 0 and not -42499 <= lines[1]["status"] <= -42401, lines[1]
+assert "\\xe9t\\xe9" in lines[3]["error"], lines[3]
+PY
+  echo "ok: per-record exit codes 0 2 0 1 1"
+  # Standard input is read once, by one thread.
+  expect 1 covariance - - --jobs 2 <"$data"
+  grep -q "standard input" err || fail "no reason given: $(cat err)"
+  expect 0 covariance - a.csv --jobs 2 <"$data"
+  [ "$(wc -l <out)" = 2 ] || fail "two lines expected"
   ;;
 exit_codes)
+  # Every command in README's exit-status table gives the code of its row.
+  root=$(dirname "$readme")
+  rows=$($py - "$readme" <<'PY'
+import re, sys
+text = open(sys.argv[1], encoding="utf-8").read()
+section = text.split("## The command-line tool: `qdm`", 1)[1].split("\n## ", 1)[0]
+table = section.split("| code | meaning |", 1)[1]
+for line in table.splitlines():
+    cells = [c.strip() for c in re.split(r"(?<!\\)\|", line)]
+    if len(cells) == 5 and cells[1].isdigit():
+        for command in re.findall(r"`([^`]+)`", cells[3]):
+            print(cells[1] + "\t" + command.replace("\\|", "|"))
+PY
+)
+  [ "$(cut -f1 <<<"$rows" | sort -u | tr -d '\n')" = 0123 ] || fail "table rows: $rows"
+  while IFS=$'\t' read -r want command; do
+    (cd "$root" && PATH=$prefix/bin:$PATH bash -c "$command" >/dev/null 2>"$work/err")
+    rc=$?
+    [ "$rc" = "$want" ] || fail "README: $command exited $rc, not $want: $(cat err)"
+    [ "$want" = 0 ] || [ "$(grep -c '^qdm: ' err)" -ge 1 ] || fail "README: $command: $(cat err)"
+    echo "ok: README: $command -> $rc"
+  done <<<"$rows"
   expect 0 --version
   grep -q '^qdm [0-9]' out || fail "--version: $(cat out)"
   expect 0 pencil --help
-  expect 1
-  expect 1 fourier
-  expect 1 covariance --order twelve "$data"
-  expect 1 covariance no_such_file.csv
+  # Usage and values: 1, with the library's status in the message when it refused.
   printf '1,2\n3\n' >ragged.csv
-  expect 1 covariance ragged.csv
-  expect 2 covariance --order 0 "$data"
-  grep -q -- '-42412' err || fail "status number missing: $(cat err)"
+  while read -r status args; do
+    # shellcheck disable=SC2086
+    expect 1 $args
+    [ "$status" = - ] || grep -q -- "$status" err || fail "status $status missing: $(cat err)"
+  done <<EOF
+- fourier
+- covariance --order twelve $data
+- covariance no_such_file.csv
+- covariance ragged.csv
+-42412 covariance --order 0 $data
+-42418 pencil --rate 0 $data
+-42417 covspectrum --points 1 $data
+-42411 pencil --pencil 60 $data
+EOF
+  expect 1
   expect 0 pencil --points 8 --upper 3 "$data"  # options of other methods are ignored
+  # A missing or empty value names its option, whether or not the method uses it.
+  for option in --order --rate --points --column --delimiter; do
+    expect 1 pencil "$data" $option
+    grep -q -- "$option" err || fail "$option not named: $(cat err)"
+  done
+  expect 1 covariance "$data" --order ''
+  grep -q -- '--order' err || fail "--order '' not named: $(cat err)"
   "$qdm" covariance "$data" >/dev/full 2>err; rc=$?
   [ $rc = 3 ] && [ "$(wc -l <err)" = 1 ] || fail "/dev/full: exit $rc, $(cat err)"
   echo "ok: qdm covariance >/dev/full -> 3 $(cat err)"
@@ -84,11 +164,156 @@ plot)
   [ "$(wc -l <err)" = 1 ] && grep -q 'gnuplot not found' err || fail "warning: $(cat err)"
   grep -q '^modes' out && [ ! -e none.png ] || fail "fit output without gnuplot"
   echo "ok: without gnuplot: $(cat err)"
+  expect 1 mdl --example --plot m.png
+  # A name with a control byte is refused before anything runs.
+  evil=$'a.png\nsystem "touch PWNED"\n#'
+  expect 3 pencil "$data" --plot "$evil"
+  [ ! -e PWNED ] && [ ! -e "$evil" ] || fail "the refused name ran or was written"
   if command -v gnuplot >/dev/null; then
+    # The hole this closes: were either name text in gnuplot's script, PWNED would exist.
+    for quote in "'" '"'; do
+      name="x$quote"$'\nsystem "touch PWNED"\nprint '"$quote"'.csv'
+      cp "$data" "$name"
+      for method in pencil covspectrum covariance; do
+        expect 0 $method "$name" --plot "b$quote.png"
+        [ ! -e PWNED ] || fail "gnuplot ran a command from the input's name"
+        [ "$(head -c 4 "b$quote.png" | tail -c 3)" = PNG ] || fail "no PNG for a hostile name"
+      done
+    done
     expect 0 pcarspectrum --example --real-signal --plot spectrum.png
     [ "$(head -c 4 spectrum.png | tail -c 3)" = PNG ] || fail "no PNG drawn"
     expect 3 covariance --example --plot "$work/no_such_dir/x.png"
+    expect 3 pencil --example --plot /dev/full
+    grep -q 'No space' err || fail "/dev/full: $(cat err)"
   fi
+  ;;
+csv)
+  # CSV as people write it: generated files, the options, the exit code and what is read.
+  $py - <<'PY'
+import math
+x = [math.sin(0.3 * i) + 0.5 * math.cos(0.71 * i) for i in range(256)]
+def put(name, lines, encoding="utf-8"):
+    open(name, "w", encoding=encoding).write("".join(l + "\n" for l in lines))
+put("bom.csv", ["%r" % v for v in x], "utf-8-sig")
+put("bomheader.csv", ["value"] + ["%r" % v for v in x], "utf-8-sig")
+put("huge_first.csv", ["1e400"] + ["%r" % v for v in x])
+put("hex_first.csv", ["0x1p3"] + ["%r" % v for v in x])
+put("huge_later.csv", ["%r" % v for v in x] + ["1e400"])
+put("decimal_comma.csv", [("%.4f" % v).replace(".", ",") for v in x])
+put("year.csv", ["year,value"] + ["%d,%r" % (1766 + i, v) for i, v in enumerate(x)])
+put("index.csv", [",value"] + ["%d,%r" % (i, v) for i, v in enumerate(x)])
+put("index_noheader.csv", ["%d,%r" % (i, v) for i, v in enumerate(x)])
+put("reim.csv", ["re,im"] + ["%r,%r" % (v, -v) for v in x])
+put("iq.csv", ["I;Q"] + [("%r;%r" % (v, -v)).replace(".", ",") for v in x])
+put("noheader2.csv", ["%r,%r" % (v, -v) for v in x])
+put("three.tsv", ["t\tre\tim"] + ["%d\t%r\t%r" % (i, v, -v) for i, v in enumerate(x)])
+put("blanks.txt", ["%r   \t%r" % (v, -v) for v in x])
+put("quoted.csv", ['"","x"'] + ['"%d",%r' % (i + 1, v) for i, v in enumerate(x)])
+put("dup.csv", ["a,a"] + ["%r,%r" % (v, v) for v in x])
+PY
+  while read -r rc type n file args; do
+    # shellcheck disable=SC2086
+    expect "$rc" covariance --order 4 --json "$file" $args
+    [ "$rc" != 0 ] || samples "$type" "$n"
+  done <<'EOF'
+0 real 256 bom.csv
+0 real 256 bomheader.csv
+1 - - huge_first.csv
+1 - - hex_first.csv
+1 - - huge_later.csv
+1 - - decimal_comma.csv
+0 real 256 decimal_comma.csv --delimiter ;
+1 - - year.csv
+0 real 256 year.csv --column 2
+0 real 256 year.csv --column value
+1 - - index.csv
+0 real 256 index.csv --column value
+1 - - index_noheader.csv
+0 real 256 index_noheader.csv --column 2
+0 complex 256 index_noheader.csv --columns 1,2
+0 complex 256 reim.csv
+0 complex 256 iq.csv --delimiter ;
+0 complex 256 noheader2.csv
+0 real 256 noheader2.csv --column 2
+1 - - three.tsv --delimiter tab
+0 complex 256 three.tsv --delimiter tab --columns re,im
+0 complex 256 three.tsv --delimiter tab --columns 2,3
+1 - - three.tsv --delimiter tab --column 4
+1 - - three.tsv --delimiter tab --column nope
+1 - - three.tsv --delimiter tab --columns 1,2,3
+1 - - noheader2.csv --column x
+0 complex 256 blanks.txt --delimiter space
+1 - - blanks.txt
+0 real 256 quoted.csv --column x
+1 - - dup.csv --column a
+1 - - bom.csv --delimiter x
+EOF
+  # The errors name the line and the field.
+  expect 1 covariance huge_first.csv
+  grep -q "huge_first.csv:1: field 1 '1e400' is out of the range" err || fail "$(cat err)"
+  expect 1 covariance hex_first.csv
+  grep -q "hex_first.csv:1: field 1 '0x1p3' is not a number" err || fail "$(cat err)"
+  expect 1 covariance huge_later.csv
+  grep -q "huge_later.csv:257: field 1 '1e400'" err || fail "$(cat err)"
+  ;;
+limits)
+  # Hostile input: bounded, and every failure is one line and a documented code.
+  { echo 1; echo 2; head -c 200000 /dev/zero | tr '\0' 7; echo x; } >long_field.csv
+  expect 1 covariance long_field.csv
+  [ "$(wc -c <err)" -lt 300 ] || fail "the field is echoed whole: $(wc -c <err) bytes"
+  grep -q "long_field.csv:3: field 1 '7\{40\}\.\.\.' is not a number" err || fail "$(cat err)"
+  { head -c 2000000 /dev/zero | tr '\0' 7; echo; } >long_line.csv
+  expect 1 covariance long_line.csv
+  printf '1\n2\nab\0cd\n3\n' >nul.csv
+  expect 1 covariance nul.csv
+  grep -q 'nul.csv:3: a NUL byte' err || fail "$(cat err)"
+  printf '1\n2\n\xc2\x85\x1b[31m\xff\n' >ctl.csv
+  expect 1 covariance --json ctl.csv
+  grep -q "'\\\\xc2\\\\x85\\\\x1b\[31m\\\\xff'" err || fail "control bytes not escaped: $(cat -v err)"
+  $py -c 'import json; json.load(open("out"))' || fail "error record is not JSON: $(cat out)"
+  printf '1\n2\n\xe9t\xe9\n' >l1.csv
+  expect 1 covariance l1.csv --json
+  $py -c 'import json; r = json.load(open("out")); assert r["exit"] == 1, r' || fail "$(cat out)"
+  cp "$data" $'name\xff.csv'
+  expect 0 covariance $'name\xff.csv' --json
+  $py -c 'import json; assert json.load(open("out"))["input"] == "name\ufffd.csv"' || fail "$(cat out)"
+  seq 1 2000 >seq.csv
+  expect 1 covariance seq.csv --max-input-bytes 1KiB
+  grep -q 'more than 1024 bytes' err || fail "$(cat err)"
+  expect 0 covariance seq.csv --max-input-bytes 9KiB
+  expect 1 covariance seq.csv --max-input-bytes 0
+  # Under a 2 GB address-space limit: one line and a documented code, never a signal.
+  # (AddressSanitizer reserves terabytes of address space: no such run with it.)
+  if ldd "$qdm" | grep -q libasan; then echo "passed: $case (AddressSanitizer: no limits run)"; exit 0; fi
+  while read -r args; do
+    # shellcheck disable=SC2086
+    timeout 60 prlimit --as=2000000000 "$qdm" $args >/dev/null 2>err </dev/zero; rc=$?
+    [ $rc -le 3 ] && [ $rc -ge 1 ] && [ "$(wc -l <err)" = 1 ] && grep -q '^qdm: ' err \
+      || fail "qdm $args under 2 GB: exit $rc, $(head -c 300 err)"
+    echo "ok: 2 GB: qdm $args -> $rc $(cat err)"
+  done <<EOF
+covspectrum $data --points 67108864 --csv
+covspectrum $data --points 67108864 --json
+pcarspectrum $data --points 536870912
+covspectrum $data --points 1073741824
+pencil /dev/zero
+pencil -
+pencil /dev/zero --max-input-bytes 4EiB
+covariance l1.csv --json
+covariance long_field.csv --json
+covariance --order 0 --rate 0 $data
+EOF
+  # A refused spectrum size costs no memory: the library refuses before it is touched.
+  kib=$($py - "$qdm" "$data" <<'PY'
+import resource, subprocess, sys
+r = subprocess.run([sys.argv[1], "covspectrum", sys.argv[2], "--points", "536870912"],
+                   capture_output=True, text=True)
+assert r.returncode == 1 and "-42420" in r.stderr, (r.returncode, r.stderr)
+print(resource.getrusage(resource.RUSAGE_CHILDREN).ru_maxrss)
+PY
+) || fail "--points 536870912: $kib"
+  [ "$kib" -lt 200000 ] || fail "--points 536870912 used $kib KiB"
+  echo "ok: --points 536870912 refused with -42420, peak $kib KiB"
   ;;
 *) fail "unknown case $case" ;;
 esac

@@ -67,10 +67,12 @@ const std::set<int32_t> kPlainStatuses = {
     QDM_STATUS_TABLE(QDM_FUZZ_STATUS)
 #undef QDM_FUZZ_STATUS
 };
-// The host face has neither the warning nor the plain face's own refusals, but
-// the injected resize error.
+// The host face has neither the warning nor the plain face's own refusals and
+// results screen, but the injected resize error.
 bool HostStatus(int32_t st) {
-  return st == HostCode(kResizeError) || (kPlainStatuses.count(st) && st != 20001 && st > -42419);
+  return st == HostCode(kResizeError) ||
+         (kPlainStatuses.count(st) && st != 20001 && st > -42419 &&
+          st != QDM_ERR_NON_FINITE_RESULT);
 }
 
 void Require(bool ok, const char* what, const Export& x, int32_t st) {
@@ -99,6 +101,8 @@ void PlainFace(const Export& x, const Scalars& s, const double* data, uint8_t fl
   Require(NumAllocOutstanding() == 0, "work memory left allocated", x, cleanStatus);
   Require(cleanStatus >= 0 || cleanStatus <= -42400 || Zeroed(x, clean),
           "failed plain call did not zero its outputs", x, cleanStatus);
+  Require(cleanStatus < 0 || AllFinite(x, clean), "a plain success holds NaN or infinity", x,
+          cleanStatus);
   if ((flags & 18) == 0) return;
   if (flags & 16) {
     LapackFailAt(faultAt % 64 + 1, (flags & 32) ? -1 : 1, false);

@@ -72,6 +72,21 @@ inline bool Modes(Family f) {
   return f == Family::kProny || f == Family::kPencil || f == Family::kPcarSpectrum;
 }
 
+// Values of output i that hold results: a mode array's first `count` only.
+inline size_t ResultValues(const Export& x, const PlainCall& c, int i) {
+  const bool counted = Modes(x.family) && !(x.family == Family::kPcarSpectrum && i == 3);
+  return counted ? std::min(c.out[i].size(), size_t(std::max(c.count, 0))) : c.out[i].size();
+}
+
+inline bool AllFinite(const Export& x, const PlainCall& c) {
+  for (int i = 0; i < x.outputs; ++i)
+    for (size_t j = 0; j < ResultValues(x, c, i); ++j)
+      if (!std::isfinite(c.out[i][j])) return false;
+  for (int j = 0; j < x.doubles; ++j)
+    if (!std::isfinite(c.d[j])) return false;
+  return true;
+}
+
 // A spectrum whose grid is shorter than the AR polynomial: the host face wraps
 // the coefficients there, the plain face refuses the call.
 inline bool SpectrumTooShort(const Export& x, const Scalars& s) {
