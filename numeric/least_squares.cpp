@@ -303,8 +303,9 @@ StatusCode FoldQr(const Rows& rows, int32_t m, int32_t n, int32_t nrhs, T* R, T*
 // same way, each tile's sums of products of one kind are exact (four lanes,
 // row i in lane i mod 4), and the tiles' sums are gathered compensated.
 // Every order is fixed and no multiply-add is fused, so every variant and
-// every machine gives the same bits (barring underflow, a grid beyond the
-// double range only makes the correction non-finite, and it is then dropped).
+// every machine gives the same bits. Near the underflow threshold the sums
+// are no longer exact (the step then only helps less); data so large that a
+// grid's constant overflows make the correction non-finite, and it is dropped.
 
 // Rows per tile of the correction step; a tile's data stays in the first-level
 // cache.
