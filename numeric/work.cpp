@@ -20,7 +20,11 @@ std::atomic<int64_t> g_outstanding{0};
 // pair of rows in a loop that loads the next element of x one iteration early,
 // so its last pass reads the 16 bytes one stride of x past x's last element;
 // with a negative stride that is |stride| elements before x's first. It reads
-// nothing outside A or y. LAPACK hands it rows of a column-major matrix as x
+// nothing outside A or y. zdotc with a stride other than one
+// (kernel/x86_64/zdot.c) does the same to both vectors. Tried against guard
+// pages with the Haswell and SkylakeX kernels, no other BLAS routine the
+// library calls itself (copy, dot, gemv, gemm, real or complex) reads outside
+// its operands: only LAPACK's calls, on work blocks, need the guards. LAPACK hands it rows of a column-major matrix as x
 // (stride = the leading dimension: zlarf from the right, in zgebd2 and
 // zunml2), and the read then lands on the element of that row one column past
 // the matrix: (row + 1) elements past the end of its storage. The rows that

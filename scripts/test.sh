@@ -16,7 +16,7 @@ scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev 
   libopenblas0-pthread libopenblas-pthread-dev libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev \
   python3-numpy python3-pytest python3-matplotlib python3-venv python3-pip \
   pkg-config doxygen dpkg-dev libcli11-dev nlohmann-json3-dev gnuplot-nox \
-  clang-14 libclang-rt-14-dev || exit 1
+  clang-14 libclang-rt-14-dev valgrind || exit 1
 
 jobs=$(nproc)
 failed=0
