@@ -275,9 +275,11 @@ void AddCases(const qdmtest::QdmApi& q, std::vector<Case>& cases, const std::str
 }
 
 // The BLAS that actually runs: the file that provides dgemm in this process,
-// and OpenBLAS's own account of its kernel when it is OpenBLAS.
+// and OpenBLAS's own account of its kernel when it is OpenBLAS. A library
+// built with its own OpenBLAS (QDM_BLAS=openblas) loads no shared BLAS, and
+// its copy's names are local to it.
 std::string BlasDescription() {
-  std::string where = "unknown";
+  std::string where = "the library's own OpenBLAS, linked in (no shared BLAS loaded)";
   void* blas = dlopen("libblas.so.3", RTLD_NOW | RTLD_NOLOAD);
   if (blas == nullptr) blas = dlopen("libopenblas.so.0", RTLD_NOW | RTLD_NOLOAD);
   if (blas != nullptr) {

@@ -43,12 +43,8 @@ set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
 set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_PACKAGE_SECTION science)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
-if(QDM_BLAS STREQUAL "openblas")
-  # The libraries' run path leads to OpenBLAS's pthreads variant (run with one
-  # thread); without it they run on whatever libblas.so.3 and liblapack.so.3
-  # the system provides.
-  set(CPACK_DEBIAN_PACKAGE_RECOMMENDS libopenblas0-pthread)
-endif()
+# On QDM_BLAS=openblas the libraries carry their own OpenBLAS and need only the
+# Fortran run-time; on reference, the reference BLAS and LAPACK packages.
 include(CPack)
 
 # The reference: the header comments of both faces and the status page made

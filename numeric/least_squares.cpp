@@ -162,6 +162,25 @@ struct RowMajorRows {  // A (m-by-n) and B (m-by-nrhs), both row-major
   int32_t n, nrhs;
   bool NonFiniteA(int32_t m) const { return HasNonFinite(A, int64_t{m} * n) != 0; }
   bool NonFiniteB(int32_t m) const { return HasNonFinite(B, int64_t{m} * nrhs) != 0; }
+  // A tile of the correction step: rows i0 .. i0+h-1 of A, column-major with
+  // `rows` rows a column, and of the first right-hand side; zeros up to `rows`.
+  int64_t TileSpan(int32_t rows) const { return int64_t{rows} * n; }
+  int64_t ColumnBase(int32_t) const { return 0; }
+  int64_t ColumnStride(int32_t rows) const { return rows; }
+  void LoadTile(int32_t i0, int32_t h, int32_t rows, double* re, double* im, double* bre,
+                double* bim) const {
+    for (int32_t i = 0; i < rows; ++i) {
+      const bool in = i < h;
+      const T* a = A + int64_t{i0 + (in ? i : 0)} * n;
+      for (int32_t j = 0; j < n; ++j) {
+        re[int64_t{j} * rows + i] = in ? a[j].real() : 0.0;
+        im[int64_t{j} * rows + i] = in ? a[j].imag() : 0.0;
+      }
+      const T b = in ? B[int64_t{i0 + i} * nrhs] : T(0.0);
+      bre[i] = b.real();
+      bim[i] = b.imag();
+    }
+  }
   // Tiles of kTile rows: a tile of A is read from cache once per column, and
   // each column of W is written in runs of kTile.
   void operator()(T* W, int32_t ld, int32_t top, int32_t r0, int32_t h) const {
@@ -189,6 +208,25 @@ struct HankelRows {
   bool rhs;
   bool NonFiniteA(int32_t m) const { return HasNonFinite(x, int64_t{m} + n - 1) != 0; }
   bool NonFiniteB(int32_t m) const { return HasNonFinite(x + n, m) != 0; }
+  // A tile of the correction step holds the samples of rows i0 .. i0+h-1:
+  // column j is the run from sample n-1-j of the tile on.
+  int64_t TileSpan(int32_t rows) const { return int64_t{rows} + n - 1; }
+  int64_t ColumnBase(int32_t) const { return n - 1; }
+  int64_t ColumnStride(int32_t) const { return -1; }
+  void LoadTile(int32_t i0, int32_t h, int32_t rows, double* re, double* im, double* bre,
+                double* bim) const {
+    const int64_t used = int64_t{h} + n - 1;
+    for (int64_t k = 0; k < int64_t{rows} + n - 1; ++k) {
+      const T a = k < used ? x[i0 + k] : T(0.0);
+      re[k] = a.real();
+      im[k] = a.imag();
+    }
+    for (int32_t i = 0; i < rows; ++i) {
+      const T b = i < h ? x[int64_t{i0} + i + n] : T(0.0);
+      bre[i] = b.real();
+      bim[i] = b.imag();
+    }
+  }
   void operator()(T* W, int32_t ld, int32_t top, int32_t r0, int32_t h) const {
     const size_t bytes = static_cast<size_t>(h) * sizeof(T);
     for (int32_t j = 0; j < n; ++j) {
@@ -242,6 +280,334 @@ StatusCode FoldQr(const Rows& rows, int32_t m, int32_t n, int32_t nrhs, T* R, T*
   }
   return status::kOk;
 }
+
+// ---- refinement of an ill-conditioned complex solve -----------------------------------
+// The fold rounds R's entries once per row block, so on a long record its
+// error grows with the number of blocks, and on an ill-conditioned system the
+// solution carries it amplified. One correction step on the semi-normal
+// equations, R^H R dw = A^H (b - A w), with the residual formed to well beyond
+// the working precision, takes the solution back to the accuracy the data
+// allow, and further than an unfolded QR gets.
+//
+// The residual's cancellation is what needs the extra precision, and it is
+// had without double-double arithmetic: a tile of rows and w are each split
+// exactly into three parts on ever finer grids of k bits (a = ah + am + al,
+// w = w1 + w2 + w3). The grids follow the tile's largest element and w's
+// largest part, and k is chosen so that every product ah w1 is an integer
+// number of cells of one grid, and every ah w2 and am w1 of the next, with
+// 4n of them summing below 2^53 cells: each row's sum of the products of
+// either kind is then exact in plain double arithmetic, whatever the order.
+// The rest, al w + am (w - w1) + ah w3, is some 2^-2k of A w and is summed
+// plainly. A^H r needs the same care, as its errors reach the correction
+// amplified by the condition number squared: the tile's residual is split the
+// same way, each tile's sums of products of one kind are exact (four lanes,
+// row i in lane i mod 4), and the tiles' sums are gathered compensated.
+// Every order is fixed and no multiply-add is fused, so every variant and
+// every machine gives the same bits. Near the underflow threshold the sums
+// are no longer exact (the step then only helps less); data so large that a
+// grid's constant overflows make the correction non-finite, and it is dropped.
+
+// Rows per tile of the correction step; a tile's data stays in the first-level
+// cache.
+constexpr int32_t kTileRows = 64;
+
+// The tile kernels run in 32-byte vectors of four rows. On x86-64 ELF targets
+// with GCC they are also built for AVX and picked by the loader; without fused
+// multiply-adds both variants give the same bits.
+#if defined(__GNUC__) && !defined(__clang__) && defined(__x86_64__) && defined(__ELF__)
+#define QDM_TILE_CLONES __attribute__((target_clones("avx", "default")))
+#else
+#define QDM_TILE_CLONES
+#endif
+
+typedef double V4 __attribute__((vector_size(32)));
+
+// A tile of rows, de-interleaved: element i of column j has its real part at
+// re[base + j * stride + i], its three parts at hre[...], mre[...] and
+// lre[...], and likewise for the imaginary part.
+struct Tile {
+  const double* re;
+  const double* im;
+  const double* hre;
+  const double* him;
+  const double* mre;
+  const double* mim;
+  const double* lre;
+  const double* lim;
+  int64_t base, stride;
+  int32_t n;
+};
+
+// r = b - A w for the tile's rows. w holds 10n doubles: the real and
+// imaginary parts of w, w1, w2, w3 and w - w1, in that order.
+QDM_TILE_CLONES void TileResidual(const Tile& t, const double* bre, const double* bim,
+                                  const double* w, double* rr, double* ri) {
+  const int32_t n = t.n;
+  for (int32_t i = 0; i < kTileRows; i += 4) {
+    V4 s1r = {}, s1i = {}, s2r = {}, s2i = {}, s3r = {}, s3i = {};
+    for (int32_t j = 0; j < n; ++j) {
+      const int64_t o = t.base + j * t.stride + i;
+      V4 hr, hi, mr, mi, lr, li;
+      std::memcpy(&hr, t.hre + o, sizeof hr);
+      std::memcpy(&hi, t.him + o, sizeof hi);
+      std::memcpy(&mr, t.mre + o, sizeof mr);
+      std::memcpy(&mi, t.mim + o, sizeof mi);
+      std::memcpy(&lr, t.lre + o, sizeof lr);
+      std::memcpy(&li, t.lim + o, sizeof li);
+      const double wr = w[j], wi = w[n + j];
+      const double ur = w[2 * n + j], ui = w[3 * n + j];
+      const double vr = w[4 * n + j], vi = w[5 * n + j];
+      const double zr = w[6 * n + j], zi = w[7 * n + j];
+      const double dr = w[8 * n + j], di = w[9 * n + j];
+      s1r += hr * ur;  // each step of s1 and s2 exact
+      s1r -= hi * ui;
+      s1i += hr * ui;
+      s1i += hi * ur;
+      s2r += hr * vr;
+      s2r -= hi * vi;
+      s2r += mr * ur;
+      s2r -= mi * ui;
+      s2i += hr * vi;
+      s2i += hi * vr;
+      s2i += mr * ui;
+      s2i += mi * ur;
+      s3r += (lr * wr - li * wi) + (mr * dr - mi * di) + (hr * zr - hi * zi);
+      s3i += (lr * wi + li * wr) + (mr * di + mi * dr) + (hr * zi + hi * zr);
+    }
+    // b - s1 - s2 exactly as d + e1 + e2 (two-sums), then one rounding.
+    V4 re1[2];
+    std::memcpy(&re1[0], bre + i, sizeof re1[0]);
+    std::memcpy(&re1[1], bim + i, sizeof re1[1]);
+    const V4 s1[2] = {s1r, s1i}, s2[2] = {s2r, s2i}, s3[2] = {s3r, s3i};
+    double* out[2] = {rr + i, ri + i};
+    for (int32_t q = 0; q < 2; ++q) {
+      const V4 b = re1[q];
+      const V4 d = b - s1[q];
+      const V4 c = d - b;
+      const V4 e1 = (b - (d - c)) - (s1[q] + c);
+      const V4 f = d - s2[q];
+      const V4 g = f - d;
+      const V4 e2 = (d - (f - g)) - (s2[q] + g);
+      const V4 r = f + ((e1 + e2) - s3[q]);
+      std::memcpy(out[q], &r, sizeof r);
+    }
+  }
+}
+
+// acc += the tile's A^H r, per column: four lanes (row i in lane i mod 4) of
+// sum and correction, real then imaginary parts, 16 doubles a column. r holds
+// 10 kTileRows doubles: the real and imaginary parts of r, r1, r2, r3 and r -
+// r1, in that order.
+QDM_TILE_CLONES void TileGradient(const Tile& t, const double* r, double* acc) {
+  constexpr int32_t T = kTileRows;
+  for (int32_t j = 0; j < t.n; ++j) {
+    const int64_t o = t.base + j * t.stride;
+    V4 s1r = {}, s1i = {}, s2r = {}, s2i = {}, s3r = {}, s3i = {};
+    for (int32_t i = 0; i < T; i += 4) {
+      V4 hr, hi, mr, mi, lr, li, xr, xi, ur, ui, vr, vi, zr, zi, dr, di;
+      std::memcpy(&hr, t.hre + o + i, sizeof hr);
+      std::memcpy(&hi, t.him + o + i, sizeof hi);
+      std::memcpy(&mr, t.mre + o + i, sizeof mr);
+      std::memcpy(&mi, t.mim + o + i, sizeof mi);
+      std::memcpy(&lr, t.lre + o + i, sizeof lr);
+      std::memcpy(&li, t.lim + o + i, sizeof li);
+      std::memcpy(&xr, r + i, sizeof xr);
+      std::memcpy(&xi, r + T + i, sizeof xi);
+      std::memcpy(&ur, r + 2 * T + i, sizeof ur);
+      std::memcpy(&ui, r + 3 * T + i, sizeof ui);
+      std::memcpy(&vr, r + 4 * T + i, sizeof vr);
+      std::memcpy(&vi, r + 5 * T + i, sizeof vi);
+      std::memcpy(&zr, r + 6 * T + i, sizeof zr);
+      std::memcpy(&zi, r + 7 * T + i, sizeof zi);
+      std::memcpy(&dr, r + 8 * T + i, sizeof dr);
+      std::memcpy(&di, r + 9 * T + i, sizeof di);
+      s1r += hr * ur;  // conj(a) r; each step of s1 and s2 exact
+      s1r += hi * ui;
+      s1i += hr * ui;
+      s1i -= hi * ur;
+      s2r += hr * vr;
+      s2r += hi * vi;
+      s2r += mr * ur;
+      s2r += mi * ui;
+      s2i += hr * vi;
+      s2i -= hi * vr;
+      s2i += mr * ui;
+      s2i -= mi * ur;
+      s3r += (lr * xr + li * xi) + (mr * dr + mi * di) + (hr * zr + hi * zi);
+      s3i += (lr * xi - li * xr) + (mr * di - mi * dr) + (hr * zi - hi * zr);
+    }
+    double* a = acc + 16 * int64_t{j};
+    V4 s[4];
+    std::memcpy(s, a, sizeof s);
+    const V4 p1[2] = {s1r, s1i}, p2[2] = {s2r, s2i}, p3[2] = {s3r, s3i};
+    for (int32_t q = 0; q < 2; ++q) {  // two-sums of the lanes' sums and the tile's
+      V4 sum = s[2 * q] + p1[q];
+      V4 bb = sum - s[2 * q];
+      const V4 e1 = (s[2 * q] - (sum - bb)) + (p1[q] - bb);
+      const V4 next = sum + p2[q];
+      bb = next - sum;
+      const V4 e2 = (sum - (next - bb)) + (p2[q] - bb);
+      s[2 * q + 1] += (e1 + e2) + p3[q];
+      s[2 * q] = next;
+    }
+    std::memcpy(a, s, sizeof s);
+  }
+}
+
+// The tile's parts split at the grids of sigma and tau: h = (a + sigma) -
+// sigma, then m the same of a - h with tau, and l the rest.
+QDM_TILE_CLONES void SplitTile(const double* re, double* hre, double* mre, double* lre,
+                               int64_t span, double sigma, double tau) {
+  for (int64_t k = 0; k < span; ++k) {
+    const double h = (re[k] + sigma) - sigma;
+    const double rest = re[k] - h;
+    const double m = (rest + tau) - tau;
+    hre[k] = h;
+    mre[k] = m;
+    lre[k] = rest - m;
+  }
+}
+
+// The splitting constant for values up to `largest` in magnitude, to keep
+// `bits` bits of the largest: 1.5 2^(E + 53 - bits) with largest <= 2^E. Then
+// (a + sigma) - sigma is a, rounded to a multiple of 2^(E + 1 - bits), exactly.
+double SplitSigma(double largest, int32_t bits) {
+  int e = 0;
+  std::frexp(largest, &e);  // largest < 2^e
+  return std::ldexp(1.5, e + 53 - bits);
+}
+
+double MaxAbs(const double* v, int64_t count) {
+  double top = 0.0;
+  for (int64_t k = 0; k < count; ++k) top = std::max(top, std::fabs(v[k]));
+  return top;
+}
+
+// Doubles of scratch Gradient needs for n columns.
+template <typename Rows>
+int64_t GradientScratch(const Rows& rows, int32_t n) {
+  return 8 * rows.TileSpan(kTileRows) + 12 * kTileRows + 26 * int64_t{n};
+}
+
+// g = A^H (b - A w) for one right-hand side, the residual to beyond the
+// working precision and rounded once per row. `scratch` holds
+// GradientScratch(rows, n) doubles.
+template <typename Rows>
+void Gradient(const Rows& rows, int32_t m, int32_t n, const Complex* w, Complex* g,
+              double* scratch) {
+  constexpr int32_t T = kTileRows;
+  const int64_t span = rows.TileSpan(T);
+  double* re = scratch;
+  double* im = re + span;
+  double* hre = im + span;
+  double* him = hre + span;
+  double* mre = him + span;
+  double* mim = mre + span;
+  double* lre = mim + span;
+  double* lim = lre + span;
+  double* bre = lim + span;
+  double* bim = bre + T;
+  double* rr = bim + T;  // r, r1, r2, r3, r - r1: real parts, then imaginary parts
+  double* ri = rr + T;
+  double* wv = rr + 10 * T;  // w, w1, w2, w3, w - w1: real parts, then imaginary parts
+  double* acc = wv + 10 * int64_t{n};
+  // Grid bits: a row's 4n products of one kind, and a column's 4 kTileRows,
+  // stay below 2^53 cells.
+  int32_t headroom = 0;
+  while ((int64_t{1} << headroom) < 4 * int64_t{std::max(n, T)}) ++headroom;
+  const int32_t bits = (55 - headroom) / 2;
+  for (int32_t j = 0; j < n; ++j) {
+    wv[j] = w[j].real();
+    wv[n + j] = w[j].imag();
+  }
+  const double w_sigma = SplitSigma(MaxAbs(wv, 2 * int64_t{n}), bits);
+  const double w_tau = std::ldexp(w_sigma, -bits);
+  for (int32_t k = 0; k < 2 * n; ++k) {
+    const double w1 = (wv[k] + w_sigma) - w_sigma;
+    const double rest = wv[k] - w1;
+    const double w2 = (rest + w_tau) - w_tau;
+    wv[2 * n + k] = w1;
+    wv[4 * n + k] = w2;
+    wv[6 * n + k] = rest - w2;
+    wv[8 * n + k] = rest;
+  }
+  std::fill(acc, acc + 16 * int64_t{n}, 0.0);
+  const Tile tile{re,  im,  hre, him, mre, mim, lre, lim, rows.ColumnBase(T), rows.ColumnStride(T),
+                  n};
+  for (int32_t i0 = 0; i0 < m; i0 += T) {
+    const int32_t h = std::min(T, m - i0);
+    rows.LoadTile(i0, h, T, re, im, bre, bim);
+    const double a_sigma = SplitSigma(std::max(MaxAbs(re, span), MaxAbs(im, span)), bits);
+    const double a_tau = std::ldexp(a_sigma, -bits);
+    SplitTile(re, hre, mre, lre, span, a_sigma, a_tau);
+    SplitTile(im, him, mim, lim, span, a_sigma, a_tau);
+    TileResidual(tile, bre, bim, wv, rr, ri);
+    // Rows past the end: a Hankel tile's later columns still reach real samples.
+    std::fill(rr + h, rr + T, 0.0);
+    std::fill(ri + h, ri + T, 0.0);
+    const double r_sigma = SplitSigma(std::max(MaxAbs(rr, T), MaxAbs(ri, T)), bits);
+    const double r_tau = std::ldexp(r_sigma, -bits);
+    for (int32_t k = 0; k < 2 * T; ++k) {
+      const double r1 = (rr[k] + r_sigma) - r_sigma;
+      const double rest = rr[k] - r1;
+      const double r2 = (rest + r_tau) - r_tau;
+      rr[2 * T + k] = r1;
+      rr[4 * T + k] = r2;
+      rr[6 * T + k] = rest - r2;
+      rr[8 * T + k] = rest;
+    }
+    TileGradient(tile, rr, acc);
+  }
+  for (int32_t j = 0; j < n; ++j) {
+    double part[2] = {0.0, 0.0};
+    for (int32_t q = 0; q < 2; ++q) {  // the four lanes, compensated, in lane order
+      const double* s = acc + 16 * int64_t{j} + 8 * q;
+      double sum = 0.0, c = 0.0;
+      for (int32_t l = 0; l < 4; ++l) {
+        const double next = sum + s[l];
+        const double bb = next - sum;
+        c += ((sum - (next - bb)) + (s[l] - bb)) + s[4 + l];
+        sum = next;
+      }
+      part[q] = sum + c;
+    }
+    g[j] = Complex(part[0], part[1]);
+  }
+}
+
+// Systems at least this ill-conditioned (largest over smallest kept singular
+// value) get the correction step; better conditioned ones lose nothing worth
+// its cost to the fold.
+constexpr double kRefineCondition = 1e4;
+
+// Elements of Complex scratch Refine needs.
+template <typename Rows>
+int64_t RefineScratch(const Rows& rows, int32_t n, int32_t k) {
+  return 2 * int64_t{n} + k + (GradientScratch(rows, n) + 1) / 2;
+}
+
+// One correction of the solution w (n values) of a tall system with one
+// right-hand side: w += V diag(1/S^2) V^H A^H (b - A w) over the kept singular
+// values, which keeps w in their span (the minimum-norm solution of the same
+// rank). V is n-by-k, row-major. A non-finite correction is not applied.
+// `scratch` holds RefineScratch(rows, n, k) elements.
+template <typename Rows>
+void Refine(const Rows& rows, int32_t m, int32_t n, int32_t k, const Complex* V, const double* S,
+            double threshold, Complex* w, Complex* scratch) {
+  Complex* g = scratch;
+  Complex* t = g + n;
+  Complex* dw = t + k;
+  Gradient(rows, m, n, w, g, reinterpret_cast<double*>(dw + n));
+  lapack::Gemm(k, 1, n, V, g, t, true);
+  for (int32_t i = 0; i < k; ++i) t[i] = S[i] > threshold ? t[i] / (S[i] * S[i]) : Complex(0.0, 0.0);
+  lapack::Gemm(n, 1, k, V, t, dw);
+  if (HasNonFiniteComplex(dw, n) != 0) return;
+  for (int32_t j = 0; j < n; ++j) w[j] += dw[j];
+}
+
+template <typename Rows>
+void Refine(const Rows&, int32_t, int32_t, int32_t, const double*, const double*, double, double*,
+            double*) {}
 
 // Which singular values a solve keeps: those above max(m, n) S[0] e (relative),
 // or those above the midpoint threshold of TruncationThreshold for `keep`
@@ -305,7 +671,11 @@ StatusCode SvdSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, T* X
 
   // z = diag(1/S) U^H base (k-by-nrhs), rows of dropped values zero; then V z.
   const int64_t kr = int64_t{k} * nrhs;
-  WorkArray<T> z = AllocWorkUninit<T>(static_cast<size_t>(kr + int64_t{n} * nrhs));
+  const bool refine = kIsComplex<T> && tall && nrhs == 1 && cut.relative && count > 0 &&
+                      f.S[0] > kRefineCondition * f.S[count - 1];
+  // Room for the correction: g, V^H g, dw and the gradient's scratch.
+  const int64_t extra = refine ? RefineScratch(system, n, k) : 0;
+  WorkArray<T> z = AllocWorkUninit<T>(static_cast<size_t>(kr + int64_t{n} * nrhs + extra));
   if (!z) return status::kNoMemory;
   lapack::Gemm(k, nrhs, rows, f.U, base, z.get(), true);
   for (int32_t i = 0; i < k; ++i) {
@@ -316,6 +686,7 @@ StatusCode SvdSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, T* X
   }
   T* solution = z.get() + kr;
   lapack::Gemm(n, nrhs, k, f.V, z.get(), solution);
+  if (refine) Refine(system, m, n, k, f.V, f.S, threshold, solution, solution + n);
   std::memcpy(static_cast<void*>(X), solution, static_cast<size_t>(int64_t{n} * nrhs) * sizeof(T));
   return status::kOk;
 }

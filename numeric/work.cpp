@@ -13,11 +13,52 @@ std::atomic<bool> g_fail_persistent{false};
 std::atomic<int64_t> g_attempts{0};
 std::atomic<int64_t> g_outstanding{0};
 
-// Every block gets this much slack past its end. Some optimized BLAS kernels
-// (OpenBLAS's complex gemv among them) read a vector's last element as part of
-// a wider load, up to 16 bytes past its end; when a block ends at the end of a
-// mapped page, that read would fault. The slack keeps it inside the block.
-constexpr size_t kSlack = 64;
+// Every block is guarded on both sides by bytes the library never uses,
+// because optimized BLAS kernels read outside the operands they are given.
+// OpenBLAS's complex gemv without transpose (zgemv_n, kernel/x86_64/zgemv_n_4.c
+// in its Haswell, Zen, SkylakeX and Sandy Bridge builds) handles a trailing
+// pair of rows in a loop that loads the next element of x one iteration early,
+// so its last pass reads the 16 bytes one stride of x past x's last element;
+// with a negative stride that is |stride| elements before x's first. It reads
+// nothing outside A or y. zdotc with a stride other than one
+// (kernel/x86_64/zdot.c) does the same to both vectors. Tried against guard
+// pages with the Haswell and SkylakeX kernels, no other BLAS routine the
+// library calls itself (copy, dot, gemv, gemm, real or complex) reads outside
+// its operands: only LAPACK's calls, on work blocks, need the guards. LAPACK hands it rows of a column-major matrix as x
+// (stride = the leading dimension: zlarf from the right, in zgebd2 and
+// zunml2), and the read then lands on the element of that row one column past
+// the matrix: (row + 1) elements past the end of its storage. The rows that
+// carry reflectors come before min(rows, columns), so a block of b bytes
+// holding such a matrix is overrun by at most 16 * sqrt(b / 16) = 4 sqrt(b)
+// bytes. The guard on each side is that bound plus one element, and never less
+// than 64 bytes.
+//
+// Layout: [front guard | block | back guard]. The 16 bytes just before the
+// block hold the front guard's length and the block's, for NumFree and
+// NumRealloc; the rest of both guards is zeroed, so what a kernel reads there
+// is always the same.
+constexpr size_t kElement = 16;
+constexpr size_t kMinGuard = 64;
+
+size_t GuardBytes(size_t bytes) {
+  // ceil(sqrt(bytes / 16)) elements, found without floating point.
+  const size_t elements = bytes / kElement + 1;
+  size_t root = 1;
+  while (root * root < elements) root *= 2;
+  size_t lo = root / 2, hi = root;  // lo^2 < elements <= hi^2
+  while (hi - lo > 1) {
+    const size_t mid = lo + (hi - lo) / 2;
+    (mid * mid < elements ? lo : hi) = mid;
+  }
+  const size_t guard = (hi + 1) * kElement;
+  return guard < kMinGuard ? kMinGuard : guard;
+}
+
+struct Header {
+  size_t front;
+  size_t bytes;
+};
+static_assert(sizeof(Header) == kElement, "the header fills one guard element");
 
 bool InjectFailure() {
   const int64_t attempt = g_attempts.fetch_add(1, std::memory_order_relaxed) + 1;
@@ -25,10 +66,35 @@ bool InjectFailure() {
   if (k <= 0) return false;
   return g_fail_persistent.load(std::memory_order_relaxed) ? attempt >= k : attempt == k;
 }
+
+// A guarded block of `bytes` (uninitialised), or null when the sizes overflow
+// or malloc fails. No accounting.
+void* GuardedAlloc(size_t bytes) {
+  const size_t guard = GuardBytes(bytes);
+  if (bytes > SIZE_MAX - 2 * guard) return nullptr;
+  unsigned char* base = static_cast<unsigned char*>(std::malloc(bytes + 2 * guard));
+  if (base == nullptr) return nullptr;
+  unsigned char* block = base + guard;
+  std::memset(base, 0, guard - sizeof(Header));
+  const Header h{guard, bytes};
+  std::memcpy(block - sizeof(Header), &h, sizeof h);
+  std::memset(block + bytes, 0, guard);
+  return block;
+}
+
+Header HeaderOf(const void* block) {
+  Header h;
+  std::memcpy(&h, static_cast<const unsigned char*>(block) - sizeof(Header), sizeof h);
+  return h;
+}
+
+void GuardedFree(void* block) {
+  std::free(static_cast<unsigned char*>(block) - HeaderOf(block).front);
+}
 }  // namespace
 
 StatusCode NumAlloc(void** slot, size_t bytes) {
-  void* p = InjectFailure() ? nullptr : std::malloc(bytes + kSlack);
+  void* p = InjectFailure() ? nullptr : GuardedAlloc(bytes);
   *slot = p;
   if (p == nullptr) {
     call_record::Note(status::kNoMemory);
@@ -41,21 +107,29 @@ StatusCode NumAlloc(void** slot, size_t bytes) {
 StatusCode NumFree(void* ptr) {
   if (ptr != nullptr) {
     g_outstanding.fetch_sub(1, std::memory_order_relaxed);
-    std::free(ptr);
+    GuardedFree(ptr);
   }
   return status::kOk;
 }
 
+// A new guarded block and a copy: the guards' lengths change with the size, so
+// growing in place would move the block within its allocation anyway.
 StatusCode NumRealloc(void** slot, size_t bytes) {
   void* old = *slot;
-  void* p = InjectFailure() ? nullptr : std::realloc(old, bytes + kSlack);
+  void* p = InjectFailure() ? nullptr : GuardedAlloc(bytes);
   if (p == nullptr) {
     (void)NumFree(old);
     *slot = nullptr;
     call_record::Note(status::kNoMemory);
     return status::kNoMemory;
   }
-  if (old == nullptr) g_outstanding.fetch_add(1, std::memory_order_relaxed);
+  if (old == nullptr) {
+    g_outstanding.fetch_add(1, std::memory_order_relaxed);
+  } else {
+    const size_t kept = HeaderOf(old).bytes;
+    std::memcpy(p, old, kept < bytes ? kept : bytes);
+    GuardedFree(old);
+  }
   *slot = p;
   return status::kOk;
 }

@@ -11,7 +11,7 @@
 set -euo pipefail
 cd "$(dirname "$0")/.."
 scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
-  libopenblas0-pthread libgtest-dev libgmock-dev gnuplot-nox libcli11-dev nlohmann-json3-dev
+  libopenblas0-pthread libopenblas-pthread-dev libgtest-dev libgmock-dev gnuplot-nox libcli11-dev nlohmann-json3-dev
 
 cmake -S . -B build/release -DCMAKE_BUILD_TYPE=Release >/dev/null
 cmake --build build/release --target qdm qdm_api qdm_cli -j"$(nproc)" >/dev/null

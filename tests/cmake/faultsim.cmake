@@ -6,7 +6,7 @@ add_library(qdm_faultsim SHARED $<TARGET_OBJECTS:qdm_core>
 target_include_directories(qdm_faultsim PRIVATE ${CMAKE_SOURCE_DIR})
 target_link_libraries(qdm_faultsim PRIVATE ${QDM_LINALG_LIBS} Threads::Threads ${CMAKE_DL_LIBS})
 if(NOT WIN32)
-  target_link_options(qdm_faultsim PRIVATE -Wl,--no-undefined)
+  target_link_options(qdm_faultsim PRIVATE -Wl,--no-undefined ${QDM_LINALG_SHARED_OPTIONS})
 endif()
 
 if(TARGET e2e_fault_injection)
