@@ -50,11 +50,18 @@ static_assert(PublicCode(status::kBadSampleRate) == QDM_ERR_SAMPLE_RATE);
 static_assert(PublicCode(status::kRankDeficient) == QDM_WARN_RANK_DEFICIENT);
 
 // This face's own codes: a spectrum shorter than the AR polynomial (the host
-// face wraps the coefficients there and so evaluates another polynomial), and
-// a fit that ran but has a NaN or an infinity among its results.
+// face wraps the coefficients there and so evaluates another polynomial), a
+// solver route it does not know, and a fit that ran but has a NaN or an
+// infinity among its results.
 constexpr StatusCode kSpectrumTooShort = 22;
+constexpr StatusCode kBadSolver = 23;
 constexpr StatusCode kNonFiniteResult = QDM_ERR_NON_FINITE_RESULT;
 static_assert(PublicCode(kSpectrumTooShort) == QDM_ERR_SPECTRUM_TOO_SHORT);
+static_assert(PublicCode(kBadSolver) == QDM_ERR_SOLVER);
+static_assert(status::kKrylovNoConvergence == QDM_ERR_KRYLOV_NO_CONVERGENCE);
+static_assert(int32_t(PencilSolver::kAuto) == QDM_SOLVER_AUTO &&
+              int32_t(PencilSolver::kDense) == QDM_SOLVER_DENSE &&
+              int32_t(PencilSolver::kKrylov) == QDM_SOLVER_KRYLOV);
 static_assert(PublicCode(kNonFiniteResult) == QDM_ERR_NON_FINITE_RESULT);
 
 // Every order check of this face takes floor(2n/3) in 64 bits: for n >= 2^30
@@ -231,6 +238,12 @@ double ModeFitWork(int32_t n, int32_t k) { return kCx * (3.0 * n * k + 8.0 * n);
 double PencilWork(int32_t n, int32_t L, size_t element) {
   return static_cast<double>(element) * (8.0 * double(n - L) * L + 8.0 * n);
 }
+// The Krylov route holds two Lanczos bases of at most max(2M + 8, M + 16)
+// vectors (n values between them), the FFT buffers and Z = H V (n by M).
+double PencilKrylovWork(int32_t n, int32_t M, size_t element) {
+  const double k = std::max(2.0 * M + 8.0, M + 16.0);
+  return static_cast<double>(element) * (k + 1.0 + 2.0 * M) * n + kCx * 6.0 * n;
+}
 double SpectrumWork(int32_t length) { return 48.0 * length; }
 
 const Complex* AsComplex(const qdm_complex* x) { return reinterpret_cast<const Complex*>(x); }
@@ -300,6 +313,40 @@ int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t
 #define QDM_MODE_OUTPUTS(m)                                                         \
   {amplitude, Bytes(m, kReal), 1, true}, {phase, Bytes(m, kReal), 0, true},         \
       {damping, Bytes(m, kReal), 0, true}, {frequency, Bytes(m, kReal), 0, true}
+
+// The pencil on either route; the automatic choice also sets the work estimate.
+template <typename T>
+int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs,
+               int32_t real_signal, int32_t solver, double* amplitude, double* phase,
+               double* damping, double* frequency, int32_t* modes, double* mse) {
+  constexpr bool cx = std::is_same_v<T, Complex>;
+  StatusCode check = checks::Pencil(n, pencil, order, fs, kWide);
+  if (check == status::kOk && (solver < QDM_SOLVER_AUTO || solver > QDM_SOLVER_KRYLOV)) {
+    check = kBadSolver;
+  }
+  const int32_t M = check == status::kOk ? order : 0;
+  const int32_t L = check == status::kOk ? pencil : 0;
+  PencilSolver route = static_cast<PencilSolver>(check == status::kOk ? solver : 0);
+  if (route == PencilSolver::kAuto) {
+    route = PencilPrefersKrylov(n, L, M, cx) ? PencilSolver::kKrylov : PencilSolver::kDense;
+  }
+  const size_t e = cx ? kCx : kReal;
+  const double work = (route == PencilSolver::kKrylov ? PencilKrylovWork(n, M, e)
+                                                      : PencilWork(n, L, e)) +
+                      ModeFitWork(n, M);
+  return RunPlain({check, {x, n, cx}, {amplitude, phase, damping, frequency, modes, mse}, work,
+                   &fs, {QDM_MODE_OUTPUTS(M)}, {{mse, 2}}, modes},
+                  [&](const void* xs) {
+                    if constexpr (cx) {
+                      return MatrixPencilSolverComplex(As<T>(xs), n, L, M, fs, route, amplitude,
+                                                       phase, damping, frequency, mse, modes);
+                    } else {
+                      return MatrixPencilSolverReal(As<T>(xs), n, L, M, fs, real_signal, route,
+                                                    amplitude, phase, damping, frequency, mse,
+                                                    modes);
+                    }
+                  });
+}
 
 // The spectra evaluate 1/|A(f)|^2 exactly only on a grid of at least p + 1
 // points; below it this face refuses the call.
@@ -396,32 +443,36 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_real(const double* x, int32_t n, int32_t
                                              int32_t order, double fs, int32_t real_signal,
                                              double* amplitude, double* phase, double* damping,
                                              double* frequency, int32_t* modes, double* mse) {
-  const StatusCode check = checks::Pencil(n, pencil, order, fs, kWide);
-  const int32_t M = check == status::kOk ? order : 0;
-  const int32_t L = check == status::kOk ? pencil : 0;
-  return RunPlain({check, {x, n, false}, {amplitude, phase, damping, frequency, modes, mse},
-                   PencilWork(n, L, kReal) + ModeFitWork(n, M), &fs, {QDM_MODE_OUTPUTS(M)},
-                   {{mse, 2}}, modes},
-                  [&](const void* xs) {
-                    return MatrixPencilReal(As<double>(xs), n, L, M, fs, real_signal, amplitude,
-                                            phase, damping, frequency, mse, modes);
-                  });
+  return Pencil(x, n, pencil, order, fs, real_signal, QDM_SOLVER_AUTO, amplitude, phase, damping,
+                frequency, modes, mse);
 }
 
 QDM_PLAIN_API int32_t qdm_matrix_pencil_complex(const qdm_complex* x, int32_t n, int32_t pencil,
                                                 int32_t order, double fs, double* amplitude,
                                                 double* phase, double* damping,
                                                 double* frequency, int32_t* modes, double* mse) {
-  const StatusCode check = checks::Pencil(n, pencil, order, fs, kWide);
-  const int32_t M = check == status::kOk ? order : 0;
-  const int32_t L = check == status::kOk ? pencil : 0;
-  return RunPlain({check, {x, n, true}, {amplitude, phase, damping, frequency, modes, mse},
-                   PencilWork(n, L, kCx) + ModeFitWork(n, M), &fs, {QDM_MODE_OUTPUTS(M)},
-                   {{mse, 2}}, modes},
-                  [&](const void* xs) {
-                    return MatrixPencilComplex(As<Complex>(xs), n, L, M, fs, amplitude, phase,
-                                               damping, frequency, mse, modes);
-                  });
+  return Pencil(AsComplex(x), n, pencil, order, fs, 0, QDM_SOLVER_AUTO, amplitude, phase,
+                damping, frequency, modes, mse);
+}
+
+QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_real(const double* x, int32_t n, int32_t pencil,
+                                                    int32_t order, double fs,
+                                                    int32_t real_signal, int32_t solver,
+                                                    double* amplitude, double* phase,
+                                                    double* damping, double* frequency,
+                                                    int32_t* modes, double* mse) {
+  return Pencil(x, n, pencil, order, fs, real_signal, solver, amplitude, phase, damping,
+                frequency, modes, mse);
+}
+
+QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int32_t n,
+                                                       int32_t pencil, int32_t order, double fs,
+                                                       int32_t solver, double* amplitude,
+                                                       double* phase, double* damping,
+                                                       double* frequency, int32_t* modes,
+                                                       double* mse) {
+  return Pencil(AsComplex(x), n, pencil, order, fs, 0, solver, amplitude, phase, damping,
+                frequency, modes, mse);
 }
 
 // ---- MDL ----------------------------------------------------------------------------------

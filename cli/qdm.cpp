@@ -55,7 +55,7 @@ struct Options {
   std::optional<int32_t> order, components, pencil, modes, upper, minOrder, points;
   std::optional<double> rate;
   bool realSignal = false, json = false, csv = false;
-  std::string example, plot, columns, delimiter = ",";
+  std::string example, plot, columns, delimiter = ",", solver = "auto";
   uint64_t maxInputBytes = uint64_t{1} << 30;
   std::vector<std::string> files;
   int jobs = 1;
@@ -178,6 +178,12 @@ Json Poles(const double* z, size_t n, double rate) {
   return t;
 }
 
+int32_t SolverOf(const Options& o) {
+  return o.solver == "krylov" ? QDM_SOLVER_KRYLOV
+         : o.solver == "dense" ? QDM_SOLVER_DENSE
+                               : QDM_SOLVER_AUTO;
+}
+
 Record Fit(Method m, const Options& o, const std::string& input, const Signal& s) {
   Record r;
   const double* re = s.values.data();
@@ -195,6 +201,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     if (kIntOptions[i].methods & Bit(m)) par[kIntOptions[i].key] = resolved[i];
   if (m != kMdl) par["rate_hz"] = rate;
   if ((kModal & Bit(m)) && !s.complex) par["real_signal"] = flag;
+  if (m == kPencil) par["solver"] = o.solver;
   // Outputs are sized from parameters the library accepts (orders below n) and,
   // for a spectrum, from the library's own length for the points asked.
   const size_t room = std::clamp(std::max({p, k, M}), 1, std::max(n, 1)) + 1;
@@ -216,11 +223,11 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
             "qdm_prony", s.complex, r);
       break;
     case kPencil:
-      Check(s.complex ? qdm_matrix_pencil_complex(cx, n, L, M, rate, amp, phase, damping, freq,
-                                                  &count, &mse)
-                      : qdm_matrix_pencil_real(re, n, L, M, rate, flag, amp, phase, damping, freq,
-                                               &count, &mse),
-            "qdm_matrix_pencil", s.complex, r);
+      Check(s.complex ? qdm_matrix_pencil_solver_complex(cx, n, L, M, rate, SolverOf(o), amp,
+                                                         phase, damping, freq, &count, &mse)
+                      : qdm_matrix_pencil_solver_real(re, n, L, M, rate, flag, SolverOf(o), amp,
+                                                      phase, damping, freq, &count, &mse),
+            "qdm_matrix_pencil_solver", s.complex, r);
       break;
     case kPcarSpectrum:
       Check(s.complex ? qdm_pcar_psd_complex(cx, n, p, points, k, rate, amp, phase, freq, &count,
@@ -319,6 +326,7 @@ void WriteJson(std::FILE* out, const Record& r, int indent) {
 }
 
 std::string Brief(const Json& v) {
+  if (v.is_string()) return v.get<std::string>();
   char buf[32];
   std::snprintf(buf, sizeof buf, "%.8g", v.is_null() ? NAN : v.get<double>());
   return v.is_number_float() || v.is_null() ? buf : v.dump();
@@ -612,6 +620,11 @@ int Main(int argc, char** argv) {
     sub->add_option("--rate", o.rate, "sampling rate in Hz [1000 for the example, else 1]")
         ->check(kNonEmpty)
         ->group(m == kMdl ? kIgnored : "Parameters");
+    sub->add_option("--solver", o.solver,
+                    "how the pencil finds its singular triplets: auto, dense, or krylov (Lanczos "
+                    "over FFT products, for long records) [auto]")
+        ->check(CLI::IsMember({"auto", "dense", "krylov"}))
+        ->group(m == kPencil ? "Parameters" : kIgnored);
     sub->add_flag("--real-signal", o.realSignal,
                   "real data: one mode per conjugate pair, at its non-negative frequency")
         ->group(kModal & bit ? "Parameters" : kIgnored);

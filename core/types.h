@@ -36,6 +36,7 @@ constexpr StatusCode kNoConvergence = -20062;  // LAPACK INFO > 0, root iteratio
 constexpr StatusCode kBadPolynomial = -20063;  // NaN coefficient or degree < 1
 constexpr StatusCode kNonFinite = -20068;      // rejected by HasNonFinite*
 constexpr StatusCode kRootNaN = -20116;        // root iteration produced NaN
+constexpr StatusCode kKrylovNoConvergence = -20070;  // Lanczos restarts exhausted
 constexpr StatusCode kIllegalArgument = -20999;  // LAPACK INFO < 0; real FFT length mismatch
 
 // FFT engine

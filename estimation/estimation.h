@@ -76,6 +76,24 @@ StatusCode ScaleRowsByInverseComplex(Complex* A, int32_t rows, int32_t cols, con
 [[nodiscard]] StatusCode MatrixPencilComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
                                              double fs, double* amp, double* phase, double* damp,
                                              double* freq, double* mse, int32_t* count);
+// How the pencil gets Y1's leading triplets: kDense forms Y1 and Y2 and
+// decomposes Y1 (the fit above); kKrylov forms neither and takes the triplets
+// by Lanczos over FFT products (numeric/krylov.h), for long records: the same
+// poles to rounding wherever Y1's M-th singular value stands clear of the
+// next. kAuto takes whichever PencilPrefersKrylov says is cheaper.
+enum class PencilSolver : int32_t { kAuto = 0, kDense = 1, kKrylov = 2 };
+// True when the Krylov route's estimated time is under half the dense one's
+// and M is at most L/4 (where the dense route stays, its numbers are the
+// reference).
+bool PencilPrefersKrylov(int32_t n, int32_t L, int32_t M, bool complex);
+[[nodiscard]] StatusCode MatrixPencilSolverReal(const double* x, int32_t n, int32_t L, int32_t M,
+                                                double fs, int32_t realFlag, PencilSolver solver,
+                                                double* amp, double* phase, double* damp,
+                                                double* freq, double* mse, int32_t* count);
+[[nodiscard]] StatusCode MatrixPencilSolverComplex(const Complex* x, int32_t n, int32_t L,
+                                                   int32_t M, double fs, PencilSolver solver,
+                                                   double* amp, double* phase, double* damp,
+                                                   double* freq, double* mse, int32_t* count);
 
 // ---- minimum description length ------------------------------------------------------------
 [[nodiscard]] StatusCode MdlOrderReal(const double* x, int32_t n, int32_t L, int32_t minOrder,

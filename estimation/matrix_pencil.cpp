@@ -6,6 +6,8 @@
 // With Y1 = U diag(s) V^H (r = min(q, L) components), the reduced pencil is
 //   K = diag(1/s) U^H Y2 V   (r x r),
 // whose eigenvalues are the signal poles when Y1 has rank >= M.
+#include <algorithm>
+#include <cmath>
 #include <complex>
 #include <cstddef>
 #include <cstring>
@@ -13,6 +15,7 @@
 
 #include "estimation/estimation.h"
 #include "estimation/twins.h"
+#include "numeric/krylov.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
@@ -31,11 +34,48 @@ using namespace twin;
 // Y1 V_M = Z[0:q] = U_M diag(s_M) and Y2 V_M = Z[1:q+1], so
 //   K_M = diag(1/s_M) diag(1/s_M) Z[0:q]^H Z[1:q+1].
 // Otherwise Y1 and Y2 are built and Y1's leading triplets taken directly.
+//
+// The Krylov route (long records) forms neither: Y1's leading triplets come
+// from a Lanczos bidiagonalization whose products with Y1 are FFT
+// convolutions with x, and Z = H V_M is one more such product, so time is
+// O(n log n) per product and memory O(n M).
+enum class Route { kDense, kKrylov };
+
 template <typename T>
-StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K) {
+StatusCode PencilMatrixKrylov(const T* x, int32_t q, int32_t L, int32_t mr, T* full) {
+  auto Z = AllocWorkUninit<T>(static_cast<size_t>(q + 1) * static_cast<size_t>(mr));
+  auto Zh = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(q));
+  auto s = AllocWorkUninit<double>(static_cast<size_t>(mr));
+  auto V = AllocWorkUninit<T>(static_cast<size_t>(L) * static_cast<size_t>(mr));
+  if (!Z || !Zh || !s || !V) return status::kNoMemory;
+  StatusCode st = HankelSvdLeading(x, q, L, mr, s.get(), nullptr, V.get());
+  if (st != status::kOk) return st;
+  st = HankelProductFft(x, q + 1, L, V.get(), mr, Z.get());
+  if (st != status::kOk) return st;
+  st = AdjointInto(Z.get(), q, mr, Zh.get());
+  if (st != status::kOk) return st;
+  st = MatMul(Zh.get(), Z.get() + mr, mr, q, mr, full);
+  if (st != status::kOk) return st;
+  st = ScaleRowsByInverse(full, mr, mr, s.get());
+  if (st != status::kOk) return st;
+  return ScaleRowsByInverse(full, mr, mr, s.get());
+}
+
+template <typename T>
+StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K,
+                        Route route = Route::kDense) {
   const int32_t q = n - L;
   const int32_t r = q < L ? q : L;
   const int32_t mr = M < r ? M : r;
+  if (route == Route::kKrylov) {
+    auto full = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(mr));
+    if (!full) return status::kNoMemory;
+    const StatusCode st = PencilMatrixKrylov(x, q, L, mr, full.get());
+    if (st != status::kOk) return st;
+    std::memcpy(static_cast<void*>(K), full.get(),
+                static_cast<size_t>(mr) * static_cast<size_t>(mr) * sizeof(T));
+    return status::kOk;
+  }
   const bool tall = int64_t{q} >= 2 * int64_t{L};
   const size_t qL = tall ? 0 : static_cast<size_t>(q) * static_cast<size_t>(L);
   const size_t LL = tall ? static_cast<size_t>(L) * static_cast<size_t>(L) : 0;
@@ -131,7 +171,7 @@ StatusCode ScaleRows(T* A, int32_t rows, int32_t cols, const double* s) {
 template <typename T>
 StatusCode MatrixPencil(const T* x, int32_t n, int32_t L, int32_t M, double fs,
                         int32_t realFlag, double* amp, double* phase, double* damp, double* freq,
-                        double* mse, int32_t* count) {
+                        double* mse, int32_t* count, Route route = Route::kDense) {
   if (n < 1) return status::kEmptyInput;
   if (L < 0 || L > MaxOrder(n)) return status::kBadOrder;
   if (M < 1) return status::kBadCount;
@@ -146,7 +186,7 @@ StatusCode MatrixPencil(const T* x, int32_t n, int32_t L, int32_t M, double fs,
   auto amplitudes = AllocWork<Complex>(static_cast<size_t>(order));
   if (!K || !poles || !amplitudes) return status::kNoMemory;
 
-  StatusCode st = PencilMatrix(x, n, L, M, K.get());
+  StatusCode st = PencilMatrix(x, n, L, M, K.get(), route);
   if (st != status::kOk) return st;
   st = EigenvaluesOf(K.get(), order, poles.get());
   if (st != status::kOk) return st;
@@ -180,4 +220,40 @@ StatusCode MatrixPencilComplex(const Complex* x, int32_t n, int32_t L, int32_t M
                                double* amp, double* phase, double* damp, double* freq,
                                double* mse, int32_t* count) {
   return MatrixPencil<Complex>(x, n, L, M, fs, 0, amp, phase, damp, freq, mse, count);
+}
+// Measured on one core with OpenBLAS: the dense route spends about 3e-10 s
+// (real) or 7.5e-10 s (complex) per q L^2, the Krylov route about 1e-8 s per
+// k N log2 N (k Lanczos vectors, N the FFT length), for either data type.
+bool PencilPrefersKrylov(int32_t n, int32_t L, int32_t M, bool complex) {
+  if (L < 1 || L >= n || int64_t{4} * M > L) return false;
+  const double q = static_cast<double>(n - L);
+  const double N = static_cast<double>(n);
+  const double k = std::max(2.0 * M + 8.0, M + 16.0);
+  const double dense = (complex ? 7.5e-10 : 3e-10) * q * static_cast<double>(L) * L;
+  const double krylov = 1e-8 * k * N * std::log2(N);
+  return 2.0 * krylov < dense;
+}
+
+namespace {
+Route RouteOf(PencilSolver solver, int32_t n, int32_t L, int32_t M, bool complex) {
+  if (solver == PencilSolver::kKrylov) return Route::kKrylov;
+  if (solver == PencilSolver::kAuto && PencilPrefersKrylov(n, L, M, complex)) {
+    return Route::kKrylov;
+  }
+  return Route::kDense;
+}
+}  // namespace
+
+StatusCode MatrixPencilSolverReal(const double* x, int32_t n, int32_t L, int32_t M, double fs,
+                                  int32_t realFlag, PencilSolver solver, double* amp,
+                                  double* phase, double* damp, double* freq, double* mse,
+                                  int32_t* count) {
+  return MatrixPencil<double>(x, n, L, M, fs, realFlag, amp, phase, damp, freq, mse, count,
+                              RouteOf(solver, n, L, M, false));
+}
+StatusCode MatrixPencilSolverComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
+                                     double fs, PencilSolver solver, double* amp, double* phase,
+                                     double* damp, double* freq, double* mse, int32_t* count) {
+  return MatrixPencil<Complex>(x, n, L, M, fs, 0, amp, phase, damp, freq, mse, count,
+                               RouteOf(solver, n, L, M, true));
 }

@@ -9,6 +9,7 @@
 #include <type_traits>
 
 #include "estimation/estimation.h"
+#include "numeric/krylov.h"
 #include "numeric/numeric.h"
 
 namespace twin {
@@ -95,6 +96,23 @@ inline StatusCode QrReduceHankel(const double* x, int32_t m, int32_t n, double* 
 }
 inline StatusCode QrReduceHankel(const Complex* x, int32_t m, int32_t n, Complex* R) {
   return QrReduceHankelComplex(x, m, n, R);
+}
+// Y1's leading triplets and the product with H, by FFT (numeric/krylov.h).
+inline StatusCode HankelSvdLeading(const double* x, int32_t rows, int32_t cols, int32_t count,
+                                   double* S, double* U, double* V) {
+  return HankelSvdLeadingReal(x, rows, cols, count, S, U, V);
+}
+inline StatusCode HankelSvdLeading(const Complex* x, int32_t rows, int32_t cols, int32_t count,
+                                   double* S, Complex* U, Complex* V) {
+  return HankelSvdLeadingComplex(x, rows, cols, count, S, U, V);
+}
+inline StatusCode HankelProductFft(const double* x, int32_t rows, int32_t cols, const double* V,
+                                   int32_t k, double* Z) {
+  return HankelProductFftReal(x, rows, cols, V, k, Z);
+}
+inline StatusCode HankelProductFft(const Complex* x, int32_t rows, int32_t cols,
+                                   const Complex* V, int32_t k, Complex* Z) {
+  return HankelProductFftComplex(x, rows, cols, V, k, Z);
 }
 // Eigenvalues only of a general matrix; the matrix is left as it is.
 inline StatusCode EigenvaluesOf(double* A, int32_t n, Complex* eigenvalues) {

@@ -199,6 +199,7 @@ QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t
  * Poles of M damped exponentials from the (n - L)-by-L data matrix and its
  * one-sample shift, reduced to the M strongest singular components; amplitudes
  * by least squares. When M exceeds min(n - L, L) the order drops to that value.
+ * The leading singular triplets come by the route ::QDM_SOLVER_AUTO picks.
  * @param x             n samples
  * @param n             number of samples, >= 1
  * @param pencil        pencil parameter L, 0 <= L <= floor(2n/3) (n/3 is a common choice)
@@ -214,7 +215,7 @@ QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t
  *   ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE,
  *   ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE (a degenerate record),
  *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_ILLEGAL_ARGUMENT,
- *   ::QDM_ERR_NON_FINITE_RESULT.
+ *   ::QDM_ERR_NON_FINITE_RESULT, ::QDM_ERR_KRYLOV_NO_CONVERGENCE.
  * @{ */
 QDM_PLAIN_API int32_t qdm_matrix_pencil_real(const double* x, int32_t n, int32_t pencil,
                                              int32_t order, double fs, int32_t real_signal,
@@ -224,6 +225,43 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_complex(const qdm_complex* x, int32_t n,
                                                 int32_t order, double fs, double* amplitude,
                                                 double* phase, double* damping,
                                                 double* frequency, int32_t* modes, double* mse);
+
+/** How the matrix pencil finds the leading singular triplets of its
+ *  (n - L)-by-L data matrix. */
+typedef enum qdm_solver {
+  /** Whichever route is estimated to be faster: the Krylov route for long
+   *  records with M small beside L (at most L/4), the dense one otherwise. What
+   *  qdm_matrix_pencil_real() and qdm_matrix_pencil_complex() use. */
+  QDM_SOLVER_AUTO = 0,
+  /** Form the data matrix and its one-sample shift and decompose the first:
+   *  O(n L^2) time, O(n L) memory. The host face's route. */
+  QDM_SOLVER_DENSE = 1,
+  /** Form neither: the M leading triplets by a restarted Lanczos
+   *  bidiagonalization whose products with the data matrix are FFT
+   *  convolutions with the record. O(n log n) per product, O(n M) memory. The
+   *  same modes as the dense route to rounding wherever the M-th singular value
+   *  stands clear of the next; may end in ::QDM_ERR_KRYLOV_NO_CONVERGENCE. */
+  QDM_SOLVER_KRYLOV = 2
+} qdm_solver;
+
+/** The matrix pencil with the route chosen by the caller: the same arguments
+ *  and results as qdm_matrix_pencil_real() / qdm_matrix_pencil_complex(), with
+ *  `solver` one of ::qdm_solver (else ::QDM_ERR_SOLVER, checked after the
+ *  arguments above). The work-memory bound applies to the route taken.
+ *  Besides their statuses, ::QDM_ERR_SOLVER and
+ *  ::QDM_ERR_KRYLOV_NO_CONVERGENCE. */
+QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_real(const double* x, int32_t n, int32_t pencil,
+                                                    int32_t order, double fs,
+                                                    int32_t real_signal, int32_t solver,
+                                                    double* amplitude, double* phase,
+                                                    double* damping, double* frequency,
+                                                    int32_t* modes, double* mse);
+QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int32_t n,
+                                                       int32_t pencil, int32_t order, double fs,
+                                                       int32_t solver, double* amplitude,
+                                                       double* phase, double* damping,
+                                                       double* frequency, int32_t* modes,
+                                                       double* mse);
 /** @} */
 
 /* ---------------------------------------------------------------------------- */

@@ -3,7 +3,7 @@
  * documentation are both made from it.
  *
  * 0 is success. 20001 is a warning (the plain face only: the results are
- * complete and valid). Codes from -42401 down to -42422 are argument errors,
+ * complete and valid). Codes from -42401 down to -42423 are argument errors,
  * -424xx in the host's numbering; the plain face writes nothing when it returns
  * one. -30001 is the plain face's screen of its own results: a fit ran, but a
  * number it was about to hand back is NaN or infinite. The other negative
@@ -34,6 +34,8 @@
   X(QDM_ERR_NULL_POINTER, -42421, "a required pointer argument is null")                       \
   X(QDM_ERR_SPECTRUM_TOO_SHORT, -42422,                                                        \
     "spectrum length (the power of two at or above the points asked for) below order + 1")    \
+  X(QDM_ERR_SOLVER, -42423,                                                                    \
+    "solver not one of QDM_SOLVER_AUTO, QDM_SOLVER_DENSE, QDM_SOLVER_KRYLOV")                 \
   X(QDM_ERR_NON_FINITE_RESULT, -30001,                                                         \
     "a result of the fit is NaN or infinite (a degenerate record: zero, constant, a spike, a " \
     "ramp, or values beyond the range of double)")                                             \
@@ -43,6 +45,8 @@
   X(QDM_ERR_OPTION, -20061, "an option argument is out of range")                              \
   X(QDM_ERR_NO_CONVERGENCE, -20062,                                                            \
     "an iteration did not converge (LAPACK, or the polynomial root finder)")                   \
+  X(QDM_ERR_KRYLOV_NO_CONVERGENCE, -20070,                                                     \
+    "the Lanczos iteration of the Krylov solver did not converge within its restart bound")    \
   X(QDM_ERR_POLYNOMIAL, -20063,                                                                \
     "invalid polynomial: a NaN coefficient, or fewer than two coefficients left")              \
   X(QDM_ERR_EXTREME_VALUE, -20068,                                                             \

@@ -263,11 +263,22 @@ def prony(x, *, order, fs=1.0, real_signal=False):
     return PronyFit(*block[:, :count.value])
 
 
-def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False):
+_SOLVERS = {"auto": 0, "dense": 1, "krylov": 2}
+
+
+def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False, solver="auto"):
     """Matrix pencil method: `modes` damped exponentials from the (n - L)-by-L
     data matrix and its shift, L = `pencil` (default n // 3). When `modes`
-    exceeds min(n - L, L) fewer are returned."""
+    exceeds min(n - L, L) fewer are returned.
+
+    `solver` picks how the data matrix's leading singular triplets are found:
+    "dense" forms and decomposes it (O(n L^2)), "krylov" takes them by Lanczos
+    over FFT products without forming it (O(n log n) per product, for long
+    records), "auto" (the default) whichever is estimated to be faster."""
     x, c = _signal(x, "matrix_pencil")
+    if solver not in _SOLVERS:
+        raise ArgumentError(None, f"solver must be one of {sorted(_SOLVERS)}, not {solver!r}",
+                            "matrix_pencil")
     n = x.shape[0]
     L = n // 3 if pencil is None else _int(pencil)
     M = _int(modes)
@@ -277,8 +288,9 @@ def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False):
     flag = _real_flag(real_signal, c, "matrix_pencil")
     if not c:
         args += (flag,)
-    _check(_fn["matrix_pencil", _kind(c)](*args, *rows, _ct.byref(count), _ct.byref(mse)),
-           "matrix_pencil")
+    args += (_SOLVERS[solver],)
+    _check(_fn["matrix_pencil_solver", _kind(c)](*args, *rows, _ct.byref(count),
+                                                  _ct.byref(mse)), "matrix_pencil")
     return PencilFit(*block[:, :count.value], mse.value)
 
 

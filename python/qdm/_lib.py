@@ -54,6 +54,7 @@ _SIGNATURES = {
     "pcar": [_I, _I, _P, _P],
     "prony": [_I, _D, "R", _P, _P, _P, _P, _P],
     "matrix_pencil": [_I, _I, _D, "R", _P, _P, _P, _P, _P, _P],
+    "matrix_pencil_solver": [_I, _I, _D, "R", _I, _P, _P, _P, _P, _P, _P],
     "mdl_order": [_I, _I, _P],
     "covariance_psd": [_I, _I, _D, _P, _P, _P, _P],
     "pcar_psd": [_I, _I, _I, _D, "R", _P, _P, _P, _P, _P, _P, _P, _P],

@@ -189,3 +189,21 @@ def test_threads_get_the_single_thread_result():
     with ThreadPoolExecutor(8) as pool:
         got = list(pool.map(lambda _: qdm.matrix_pencil(COMPLEX, modes=6), range(160)))
     assert all(np.array_equal(r.frequency, want.frequency) and r.mse == want.mse for r in got)
+
+
+@pytest.mark.parametrize("dtype", [float, complex])
+def test_the_krylov_route_gives_the_dense_routes_modes(dtype):
+    # Three clear modes in noise, long enough for the automatic choice to take the
+    # Krylov route: every route gives the same modes to rounding.
+    t = np.arange(3000)
+    x = sum(a * np.exp((-1e-4 + 2j * np.pi * f) * t)
+            for a, f in [(1.0, 0.07), (0.6, 0.21), (0.3, 0.33)])
+    x = (x.real if dtype is float else x) + 1e-3 * np.random.default_rng(3).standard_normal(3000)
+    fits = {s: qdm.matrix_pencil(x, modes=6, solver=s) for s in ("dense", "krylov", "auto")}
+    order = {s: np.argsort(f.frequency) for s, f in fits.items()}
+    for s in ("krylov", "auto"):
+        for field in ("frequency", "damping", "amplitude"):
+            got, want = (getattr(fits[k], field)[order[k]] for k in (s, "dense"))
+            np.testing.assert_allclose(got, want, rtol=1e-8, atol=1e-12, err_msg=f"{s} {field}")
+    with pytest.raises(qdm.ArgumentError, match="solver"):
+        qdm.matrix_pencil(x, modes=6, solver="lanczos")

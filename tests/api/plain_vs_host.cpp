@@ -103,9 +103,21 @@ TEST(PlainApi, RefusesWhatTheHostFaceLetsThrough) {
   NumAllocFailAt(1, true);
   EXPECT_EQ(qdm_covariance_psd_real(big.data(), 64, 4, 1 << 30, 1.0, m, &f0, &df, &var),
             QDM_ERR_WORK_LIMIT);
+  // The dense pencil of 2^21 samples at L = 2^20 would hold two 2^20-square
+  // matrices; the Krylov route, which the automatic choice takes, fits in the
+  // bound and so reaches its first allocation (failed here). An unknown solver
+  // is refused before anything else.
+  EXPECT_EQ(qdm_matrix_pencil_solver_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0,
+                                          QDM_SOLVER_DENSE, m, m, m, m, &modes, &var),
+            QDM_ERR_WORK_LIMIT);
   EXPECT_EQ(
       qdm_matrix_pencil_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0, m, m, m, m, &modes, &var),
-      QDM_ERR_WORK_LIMIT);
+      QDM_ERR_NO_MEMORY);
+  for (const int32_t solver : {-1, 3}) {
+    EXPECT_EQ(qdm_matrix_pencil_solver_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0, solver, m,
+                                            m, m, m, &modes, &var),
+              QDM_ERR_SOLVER);
+  }
   NumAllocFailAt(0, false);
 }
 

@@ -142,9 +142,14 @@ PY
 -42418 pencil --rate 0 $data
 -42417 covspectrum --points 1 $data
 -42411 pencil --pencil 60 $data
+- pencil --solver lanczos $data
 EOF
   expect 1
   expect 0 pencil --points 8 --upper 3 "$data"  # options of other methods are ignored
+  # Both routes of the pencil give the same modes (7 significant digits shown).
+  expect 0 pencil --solver dense --modes 4 --pencil 20 "$data" && sed 1,2d out >dense.txt
+  expect 0 pencil --solver krylov --modes 4 --pencil 20 "$data" && sed 1,2d out >krylov.txt
+  diff dense.txt krylov.txt >/dev/null || fail "routes differ: $(diff dense.txt krylov.txt)"
   # A missing or empty value names its option, whether or not the method uses it.
   for option in --order --rate --points --column --delimiter; do
     expect 1 pencil "$data" $option

@@ -17,4 +17,10 @@ foreach(fit covariance prony pcar pencil mdl covspectrum pcarspectrum)
              COMMAND ${_memcheck} $<TARGET_FILE:qdm_cli> ${fit} --example ${kind})
   endforeach()
 endforeach()
+# The pencil's Krylov route: its FFT products and the Lanczos basis updates.
+foreach(kind real complex)
+  add_test(NAME memcheck.pencil_krylov_${kind}
+           COMMAND ${_memcheck} $<TARGET_FILE:qdm_cli> pencil --example ${kind} --solver krylov
+                   --modes 3)
+endforeach()
 add_test(NAME memcheck.work_blocks COMMAND ${_memcheck} $<TARGET_FILE:unit_work_blocks>)

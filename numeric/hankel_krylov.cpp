@@ -1,0 +1,355 @@
+// Hankel products by FFT and the leading singular triplets over them.
+//
+// Products. With X the length-N DFT of x[0 .. rows+cols-2] (zero padded,
+// N >= rows + cols - 1):
+//   (H v)_i   = sum_j x[i+cols-1-j] v_j          = (x * v)[i + cols - 1],
+//   (H^H u)_j = sum_i conj(x[i+cols-1-j]) u_i    = c[cols - 1 - j],
+//               c[k] = sum_i conj(x[i+k]) u_i     = DFT(DFT(u) . conj(X))[k] / N.
+// Every index that these sums reach stays below N, so the circular products of
+// length N give them exactly, with no wrap-around. The inverse DFT is the
+// forward one between conjugations: idft(P) = conj(dft(conj(P))) / N.
+//
+// Triplets. Golub-Kahan-Lanczos with thick restarts (Baglama and Reichel's
+// augmented form): after k steps H V_k = U_k B_k and
+// H^H U_k = V_k B_k^H + beta v_k e_k^T, with B_k upper triangular (bidiagonal
+// before the first restart, with one arrow column after each). Every entry of
+// B is taken from the reorthogonalization itself, B = U^H H V, so the restart
+// needs no special case: keeping the l best Ritz pairs makes B diagonal in its
+// first l columns, and the next step's projections fill in the arrow.
+// The SVD of the small B = P diag(s) Q^H gives the Ritz triplets
+// (s_i, U p_i, V q_i), whose residual ||H^H u - s v|| is beta |P[k-1][i]|.
+#include <algorithm>
+#include <cmath>
+#include <complex>
+#include <cstring>
+#include <type_traits>
+
+#include "fft/fft.h"
+#include "numeric/krylov.h"
+#include "numeric/lapack_boundary.h"
+#include "numeric/work.h"
+
+namespace {
+
+template <typename T>
+constexpr bool kIsComplex = std::is_same_v<T, Complex>;
+
+double Real(double v) { return v; }
+double Real(const Complex& v) { return v.real(); }
+double Imag(double) { return 0.0; }
+double Imag(const Complex& v) { return v.imag(); }
+double Conj(double v) { return v; }
+Complex Conj(const Complex& v) { return std::conj(v); }
+template <typename T>
+T Make(double re, double im) {
+  if constexpr (kIsComplex<T>) {
+    return T(re, im);
+  } else {
+    (void)im;
+    return re;
+  }
+}
+
+// The smallest 2^a 3^b 5^c not below n (the FFT engine's fastest lengths), or
+// 0 when none fits in int32.
+int32_t FastLength(int64_t n) {
+  int64_t best = INT64_MAX;
+  for (int64_t p5 = 1; p5 < 2 * n && p5 <= INT32_MAX; p5 *= 5) {
+    for (int64_t p35 = p5; p35 < 2 * n && p35 <= INT32_MAX; p35 *= 3) {
+      int64_t v = p35;
+      while (v < n) v *= 2;
+      best = std::min(best, v);
+    }
+  }
+  return best <= INT32_MAX ? static_cast<int32_t>(best) : 0;
+}
+
+// ---- the operator ---------------------------------------------------------------------
+
+// The DFT of the record and the scratch of one product.
+struct HankelFft {
+  int32_t rows = 0, cols = 0, N = 0;
+  FftPlan* plan = nullptr;
+  WorkArray<Complex> X, a, b;
+  HankelFft() = default;
+  HankelFft(const HankelFft&) = delete;
+  HankelFft& operator=(const HankelFft&) = delete;
+  ~HankelFft() { FftPlanRelease(plan); }
+};
+
+StatusCode Dft(const HankelFft& h, const Complex* in, Complex* out) {
+  const double* i = reinterpret_cast<const double*>(in);
+  double* o = reinterpret_cast<double*>(out);
+  return FftComplex(h.plan, i, i + 1, o, o + 1, 2, 2, h.N);
+}
+
+template <typename T>
+StatusCode Setup(HankelFft& h, const T* x, int32_t rows, int32_t cols) {
+  if (rows < 1 || cols < 1) return status::kBadSize;
+  const int64_t span = int64_t{rows} + cols - 1;
+  h.rows = rows;
+  h.cols = cols;
+  h.N = FastLength(span);
+  if (h.N == 0) return status::kBadSize;
+  const size_t N = static_cast<size_t>(h.N);
+  h.X = AllocWork<Complex>(N);
+  h.a = AllocWork<Complex>(N);
+  h.b = AllocWork<Complex>(N);
+  if (!h.X || !h.a || !h.b) return status::kNoMemory;
+  h.plan = FftPlanAcquire(h.N);
+  if (h.plan == nullptr) return status::kNoMemory;
+  for (int64_t t = 0; t < span; ++t) h.a[t] = Complex(Real(x[t]), Imag(x[t]));
+  return Dft(h, h.a.get(), h.X.get());
+}
+
+// z (rows values, stride zs) = H v (cols values, stride vs).
+template <typename T>
+StatusCode Apply(HankelFft& h, const T* v, int64_t vs, T* z, int64_t zs) {
+  Complex* a = h.a.get();
+  Complex* b = h.b.get();
+  std::fill(a, a + h.N, Complex(0.0, 0.0));
+  for (int32_t j = 0; j < h.cols; ++j) a[j] = Complex(Real(v[j * vs]), Imag(v[j * vs]));
+  StatusCode st = Dft(h, a, b);
+  if (st != status::kOk) return st;
+  for (int32_t f = 0; f < h.N; ++f) a[f] = std::conj(b[f] * h.X[f]);
+  st = Dft(h, a, b);
+  if (st != status::kOk) return st;
+  const double scale = 1.0 / h.N;
+  for (int32_t i = 0; i < h.rows; ++i) {
+    const Complex& c = b[i + h.cols - 1];
+    z[i * zs] = Make<T>(c.real() * scale, -c.imag() * scale);
+  }
+  return status::kOk;
+}
+
+// w (cols values, stride ws) = H^H u (rows values, stride us).
+template <typename T>
+StatusCode ApplyAdjoint(HankelFft& h, const T* u, int64_t us, T* w, int64_t ws) {
+  Complex* a = h.a.get();
+  Complex* b = h.b.get();
+  std::fill(a, a + h.N, Complex(0.0, 0.0));
+  for (int32_t i = 0; i < h.rows; ++i) a[i] = Complex(Real(u[i * us]), Imag(u[i * us]));
+  StatusCode st = Dft(h, a, b);
+  if (st != status::kOk) return st;
+  for (int32_t f = 0; f < h.N; ++f) a[f] = b[f] * std::conj(h.X[f]);
+  st = Dft(h, a, b);
+  if (st != status::kOk) return st;
+  const double scale = 1.0 / h.N;
+  for (int32_t j = 0; j < h.cols; ++j) {
+    const Complex& c = b[h.cols - 1 - j];
+    w[j * ws] = Make<T>(c.real() * scale, c.imag() * scale);
+  }
+  return status::kOk;
+}
+
+template <typename T>
+StatusCode ProductFft(const T* x, int32_t rows, int32_t cols, const T* V, int32_t k, T* Z,
+                      bool adjoint) {
+  if (k < 1) return status::kBadSize;
+  HankelFft h;
+  StatusCode st = Setup(h, x, rows, cols);
+  for (int32_t c = 0; c < k && st == status::kOk; ++c) {
+    st = adjoint ? ApplyAdjoint(h, V + c, k, Z + c, k) : Apply(h, V + c, k, Z + c, k);
+  }
+  return st;
+}
+
+// ---- the Lanczos bidiagonalization ------------------------------------------------------
+
+// A deterministic start (or breakdown) vector: a fixed pseudo-random sequence,
+// so that every run gives the same numbers.
+template <typename T>
+void Scatter(T* v, int64_t stride, int32_t n, uint64_t seed) {
+  uint64_t s = seed * 0x9E3779B97F4A7C15ull + 0x632BE59BD9B4E019ull;
+  auto next = [&s] {
+    s += 0x9E3779B97F4A7C15ull;
+    uint64_t z = s;
+    z = (z ^ (z >> 30)) * 0xBF58476D1CE4E5B9ull;
+    z = (z ^ (z >> 27)) * 0x94D049BB133111EBull;
+    z ^= z >> 31;
+    return static_cast<double>(z >> 11) * 0x1.0p-53 - 0.5;
+  };
+  for (int32_t i = 0; i < n; ++i) {
+    const double re = next();
+    v[i * stride] = Make<T>(re, kIsComplex<T> ? next() : 0.0);
+  }
+}
+
+// w minus its projection on the first `count` columns of the row-major basis Q
+// (dim rows, leading dimension ld), by classical Gram-Schmidt twice; the
+// coefficients Q^H w (before projection) into c. Then the norm of what is left.
+template <typename T>
+double Orthogonalize(const T* Q, int32_t dim, int32_t ld, int32_t count, T* w, T* c, T* c2) {
+  if (count > 0) {
+    const T one = Make<T>(1.0, 0.0), zero = Make<T>(0.0, 0.0), minus = Make<T>(-1.0, 0.0);
+    lapack::GemvLd(true, dim, count, one, Q, ld, w, zero, c);
+    lapack::GemvLd(false, dim, count, minus, Q, ld, c, one, w);
+    lapack::GemvLd(true, dim, count, one, Q, ld, w, zero, c2);
+    lapack::GemvLd(false, dim, count, minus, Q, ld, c2, one, w);
+    for (int32_t i = 0; i < count; ++i) c[i] += c2[i];
+  }
+  return lapack::Nrm2(dim, w);
+}
+
+// Column `col` of the basis (stride ld) = w / norm, or, when w has vanished
+// (the Krylov space is invariant), a fresh direction orthogonal to the basis.
+// Returns the norm kept in B: 0 after a breakdown.
+template <typename T>
+double Extend(T* Q, int32_t dim, int32_t ld, int32_t col, T* w, double norm, double scale, T* c,
+              T* c2, uint64_t seed) {
+  constexpr double kBreakdown = 1e-14;
+  double kept = norm;
+  for (int attempt = 0; !(norm > kBreakdown * scale) && attempt < 3; ++attempt) {
+    Scatter(w, 1, dim, seed + 7919u * static_cast<uint64_t>(attempt + 1));
+    norm = Orthogonalize(Q, dim, ld, col, w, c, c2);
+    kept = 0.0;
+  }
+  const double inv = norm > 0.0 ? 1.0 / norm : 0.0;
+  for (int32_t i = 0; i < dim; ++i) Q[int64_t{i} * ld + col] = w[i] * inv;
+  return kept;
+}
+
+// Row-major Q[:, 0:keep] = Q[:, 0:k] C (C k-by-keep, column-major, ldc), a
+// block of rows at a time through `tmp` (kRows x keep).
+constexpr int32_t kRows = 256;
+template <typename T>
+void Rotate(T* Q, int32_t dim, int32_t ld, int32_t k, const T* Crow, int32_t keep, T* tmp) {
+  const T one = Make<T>(1.0, 0.0), zero = Make<T>(0.0, 0.0);
+  for (int32_t r0 = 0; r0 < dim; r0 += kRows) {
+    const int32_t h = std::min(kRows, dim - r0);
+    T* rows = Q + int64_t{r0} * ld;
+    lapack::GemmLd(false, h, keep, k, one, rows, ld, Crow, keep, zero, tmp, keep);
+    for (int32_t i = 0; i < h; ++i) {
+      std::memcpy(static_cast<void*>(rows + int64_t{i} * ld), tmp + int64_t{i} * keep,
+                  static_cast<size_t>(keep) * sizeof(T));
+    }
+  }
+}
+
+template <typename T>
+StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, double* S, T* U,
+                         T* V) {
+  if (rows < 1 || cols < 1 || count < 1 || count > std::min(rows, cols)) {
+    return status::kBadSize;
+  }
+  const int32_t dim = std::min(rows, cols);
+  const int32_t k = std::min(dim, std::max(2 * count + 8, count + 16));
+  const int32_t ld = k + 1;  // V holds one vector more: the residual direction
+  const size_t kk = static_cast<size_t>(k) * static_cast<size_t>(k);
+
+  HankelFft h;
+  StatusCode st = Setup(h, x, rows, cols);
+  if (st != status::kOk) return st;
+  WorkArray<T> Vb = AllocWork<T>(static_cast<size_t>(int64_t{cols} * ld));
+  WorkArray<T> Ub = AllocWork<T>(static_cast<size_t>(int64_t{rows} * k));
+  WorkArray<T> wu = AllocWorkUninit<T>(static_cast<size_t>(rows));
+  WorkArray<T> wv = AllocWorkUninit<T>(static_cast<size_t>(cols));
+  WorkArray<T> c = AllocWorkUninit<T>(static_cast<size_t>(ld));
+  WorkArray<T> c2 = AllocWorkUninit<T>(static_cast<size_t>(ld));
+  WorkArray<T> B = AllocWork<T>(kk);
+  WorkArray<T> Bw = AllocWorkUninit<T>(kk);
+  WorkArray<T> P = AllocWorkUninit<T>(kk);
+  WorkArray<T> Qh = AllocWorkUninit<T>(kk);
+  WorkArray<T> C = AllocWorkUninit<T>(kk);
+  WorkArray<double> s = AllocWorkUninit<double>(static_cast<size_t>(k));
+  WorkArray<T> tmp = AllocWorkUninit<T>(static_cast<size_t>(kRows) * static_cast<size_t>(k));
+  if (!Vb || !Ub || !wu || !wv || !c || !c2 || !B || !Bw || !P || !Qh || !C || !s || !tmp) {
+    return status::kNoMemory;
+  }
+
+  Scatter(wv.get(), 1, cols, 1);
+  double scale = 0.0;  // largest norm met so far, a lower bound of s_1
+  (void)Extend(Vb.get(), cols, ld, 0, wv.get(), lapack::Nrm2(cols, wv.get()), 1.0, c.get(),
+               c2.get(), 2);
+  int32_t kept = 0;
+  double beta = 0.0;
+  for (int32_t restart = 0;; ++restart) {
+    for (int32_t j = kept; j < k; ++j) {
+      // u_j = H v_j minus its components along u_0 .. u_{j-1}: column j of B.
+      st = Apply(h, Vb.get() + j, ld, wu.get(), 1);
+      if (st != status::kOk) return st;
+      scale = std::max(scale, lapack::Nrm2(rows, wu.get()));
+      const double alpha = Orthogonalize(Ub.get(), rows, k, j, wu.get(), c.get(), c2.get());
+      for (int32_t i = 0; i < j; ++i) B[i + size_t(j) * k] = c[i];
+      for (int32_t i = j; i < k; ++i) B[i + size_t(j) * k] = T(0.0);
+      B[j + size_t(j) * k] = Make<T>(Extend(Ub.get(), rows, k, j, wu.get(), alpha, scale,
+                                            c.get(), c2.get(), 3 + 2 * uint64_t(j)),
+                                     0.0);
+      // v_{j+1} = H^H u_j minus its components along v_0 .. v_j.
+      st = ApplyAdjoint(h, Ub.get() + j, k, wv.get(), 1);
+      if (st != status::kOk) return st;
+      const double b = Orthogonalize(Vb.get(), cols, ld, j + 1, wv.get(), c.get(), c2.get());
+      scale = std::max(scale, b);
+      beta = Extend(Vb.get(), cols, ld, j + 1, wv.get(), b, scale, c.get(), c2.get(),
+                    4 + 2 * uint64_t(j));
+    }
+    // B = P diag(s) Q^H, column-major.
+    std::memcpy(static_cast<void*>(Bw.get()), B.get(), kk * sizeof(T));
+    st = lapack::Gesdd('S', k, k, Bw.get(), k, s.get(), P.get(), k, Qh.get(), k);
+    if (st != status::kOk) return st;
+    bool converged = true;
+    for (int32_t i = 0; i < count; ++i) {
+      converged = converged && beta * std::abs(P[(k - 1) + size_t(i) * k]) <=
+                                   kKrylovTolerance * s[0];
+    }
+    const int32_t keep = converged ? count : std::min(k - 1, count + (k - count) / 2);
+    if (!converged && restart >= kKrylovMaxRestarts) return status::kKrylovNoConvergence;
+    // V[:, 0:keep] = V Q[:, 0:keep] (row-major C = Q[:, 0:keep]: C[j][i] = conj(Qh[i][j])),
+    // the residual direction v_k moved next to them, U[:, 0:keep] = U P[:, 0:keep].
+    for (int32_t j = 0; j < k; ++j) {
+      for (int32_t i = 0; i < keep; ++i) {
+        C[size_t(j) * keep + i] = Conj(Qh[i + size_t(j) * k]);
+      }
+    }
+    Rotate(Vb.get(), cols, ld, k, C.get(), keep, tmp.get());
+    for (int32_t j = 0; j < k; ++j) {
+      for (int32_t i = 0; i < keep; ++i) C[size_t(j) * keep + i] = P[j + size_t(i) * k];
+    }
+    Rotate(Ub.get(), rows, k, k, C.get(), keep, tmp.get());
+    if (converged) break;
+    for (int32_t r = 0; r < cols; ++r) Vb[int64_t{r} * ld + keep] = Vb[int64_t{r} * ld + k];
+    std::fill(B.get(), B.get() + kk, T(0.0));
+    for (int32_t i = 0; i < keep; ++i) B[i + size_t(i) * k] = Make<T>(s[i], 0.0);
+    kept = keep;
+  }
+
+  for (int32_t i = 0; i < count; ++i) S[i] = s[i];
+  for (int32_t r = 0; r < cols; ++r) {
+    std::memcpy(static_cast<void*>(V + int64_t{r} * count), Vb.get() + int64_t{r} * ld,
+                static_cast<size_t>(count) * sizeof(T));
+  }
+  if (U != nullptr) {
+    for (int32_t r = 0; r < rows; ++r) {
+      std::memcpy(static_cast<void*>(U + int64_t{r} * count), Ub.get() + int64_t{r} * k,
+                  static_cast<size_t>(count) * sizeof(T));
+    }
+  }
+  return status::kOk;
+}
+
+}  // namespace
+
+StatusCode HankelProductFftReal(const double* x, int32_t rows, int32_t cols, const double* V,
+                                int32_t k, double* Z) {
+  return ProductFft<double>(x, rows, cols, V, k, Z, false);
+}
+StatusCode HankelProductFftComplex(const Complex* x, int32_t rows, int32_t cols, const Complex* V,
+                                   int32_t k, Complex* Z) {
+  return ProductFft<Complex>(x, rows, cols, V, k, Z, false);
+}
+StatusCode HankelAdjointProductFftReal(const double* x, int32_t rows, int32_t cols,
+                                       const double* U, int32_t k, double* W) {
+  return ProductFft<double>(x, rows, cols, U, k, W, true);
+}
+StatusCode HankelAdjointProductFftComplex(const Complex* x, int32_t rows, int32_t cols,
+                                          const Complex* U, int32_t k, Complex* W) {
+  return ProductFft<Complex>(x, rows, cols, U, k, W, true);
+}
+StatusCode HankelSvdLeadingReal(const double* x, int32_t rows, int32_t cols, int32_t count,
+                                double* S, double* U, double* V) {
+  return SvdLeadingFft<double>(x, rows, cols, count, S, U, V);
+}
+StatusCode HankelSvdLeadingComplex(const Complex* x, int32_t rows, int32_t cols, int32_t count,
+                                   double* S, Complex* U, Complex* V) {
+  return SvdLeadingFft<Complex>(x, rows, cols, count, S, U, V);
+}

@@ -1,0 +1,48 @@
+// Hankel matrices that are never formed: products by FFT convolution with the
+// record, and their leading singular triplets by a restarted Lanczos
+// bidiagonalization over those products. For long records, where the dense
+// routes of numeric.h cost O(rows * cols^2) time and O(rows * cols) memory.
+//
+// H (rows-by-cols) is H[i][j] = x[i + cols - 1 - j]: row i holds the samples
+// x[i .. i+cols-1], newest first (the forward prediction block of x). It reads
+// x[0 .. rows+cols-2]. Matrices beside it are row-major, as in numeric.h.
+#pragma once
+
+#include <cstdint>
+
+#include "core/types.h"
+
+// Z (rows-by-k) = H V for V cols-by-k: one FFT convolution per column, in
+// O(k (rows + cols) log(rows + cols)). The same numbers as HankelProduct* to
+// rounding.
+[[nodiscard]] StatusCode HankelProductFftReal(const double* x, int32_t rows, int32_t cols,
+                                              const double* V, int32_t k, double* Z);
+[[nodiscard]] StatusCode HankelProductFftComplex(const Complex* x, int32_t rows, int32_t cols,
+                                                 const Complex* V, int32_t k, Complex* Z);
+// W (cols-by-k) = H^H U for U rows-by-k (the transpose for real data).
+[[nodiscard]] StatusCode HankelAdjointProductFftReal(const double* x, int32_t rows, int32_t cols,
+                                                     const double* U, int32_t k, double* W);
+[[nodiscard]] StatusCode HankelAdjointProductFftComplex(const Complex* x, int32_t rows,
+                                                        int32_t cols, const Complex* U, int32_t k,
+                                                        Complex* W);
+
+// The `count` largest singular values of H (non-increasing) and their right
+// singular vectors V (cols-by-count), and, when U is not null, their left ones
+// (rows-by-count): H = U diag(S) V^H + the rest, as SvdLeading* gives them, to
+// rounding, for the triplets that stand clear of the next one.
+//
+// Method: Golub-Kahan-Lanczos bidiagonalization with full reorthogonalization
+// (classical Gram-Schmidt, twice) and thick restarts that keep the best Ritz
+// vectors, on a subspace of at most max(2 count + 8, count + 16) vectors. It
+// stops when every wanted triplet has ||H^H u - s v|| <= kKrylovTolerance s_1
+// (H v = s u holds by construction), and gives up with
+// status::kKrylovNoConvergence after kKrylovMaxRestarts restarts. Memory is
+// O((rows + cols) * subspace) plus the FFT buffers; nothing is shared between
+// calls but the FFT plans, so it is thread-safe. x is not screened.
+constexpr double kKrylovTolerance = 1e-13;
+constexpr int32_t kKrylovMaxRestarts = 200;
+[[nodiscard]] StatusCode HankelSvdLeadingReal(const double* x, int32_t rows, int32_t cols,
+                                              int32_t count, double* S, double* U, double* V);
+[[nodiscard]] StatusCode HankelSvdLeadingComplex(const Complex* x, int32_t rows, int32_t cols,
+                                                 int32_t count, double* S, Complex* U,
+                                                 Complex* V);

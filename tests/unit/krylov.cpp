@@ -1,0 +1,275 @@
+// The Hankel operator by FFT and its leading singular triplets, against oracles
+// that never use an FFT: products summed directly in long double, the
+// singular values of the formed matrix by the dense SVD, and the identities
+// H v = s u, H^H u = s v, V^H V = I checked by direct sums.
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <complex>
+#include <random>
+#include <vector>
+
+#include "estimation/estimation.h"
+#include "numeric/krylov.h"
+#include "numeric/numeric.h"
+#include "numeric/work.h"
+
+namespace {
+
+using Cx = std::complex<double>;
+using Lcx = std::complex<long double>;
+constexpr double kEps = 2.220446049250313e-16;
+template <typename T> constexpr bool kIsCx = !std::is_same_v<T, double>;
+
+Lcx Widen(double v) { return {v, 0.0L}; }
+Lcx Widen(Cx v) { return {v.real(), v.imag()}; }
+
+// Records: white noise, damped exponentials in noise, the same without noise
+// (rank exactly `modes`, where the bidiagonalization breaks down), and two
+// modes 1/n apart in frequency.
+enum Kind { kNoise, kModes, kNoiseFree, kClose };
+
+template <typename T>
+std::vector<T> Record(Kind kind, int64_t n, int modes, uint32_t seed) {
+  std::mt19937_64 gen(seed);
+  std::normal_distribution<double> g(0.0, 1.0);
+  std::vector<T> x(static_cast<size_t>(n));
+  const double sigma = kind == kNoise ? 1.0 : kind == kNoiseFree ? 0.0 : 0.03;
+  for (int64_t t = 0; t < n; ++t) {
+    Cx v(0.0, 0.0);
+    for (int m = 0; kind != kNoise && m < modes; ++m) {
+      const double f = kind == kClose && m == 1 ? 0.1 + 1.0 / double(n) : 0.1 + 0.37 * m / modes;
+      v += (1.0 + 0.5 * m) * std::exp(Cx(-0.5 / double(n), 2.0 * M_PI * f) * double(t));
+    }
+    v += sigma * Cx(g(gen), g(gen));
+    if constexpr (kIsCx<T>) x[static_cast<size_t>(t)] = v; else x[static_cast<size_t>(t)] = v.real() + v.imag();
+  }
+  return x;
+}
+
+// (H v)_i and (H^H u)_j summed directly.
+template <typename T>
+std::vector<Lcx> Direct(const std::vector<T>& x, int32_t rows, int32_t cols, const T* v,
+                        int32_t stride, bool adjoint) {
+  std::vector<Lcx> out(static_cast<size_t>(adjoint ? cols : rows));
+  for (int32_t i = 0; i < rows; ++i)
+    for (int32_t j = 0; j < cols; ++j) {
+      const Lcx h = Widen(x[static_cast<size_t>(i + cols - 1 - j)]);
+      if (adjoint) out[size_t(j)] += std::conj(h) * Widen(v[i * stride]);
+      else out[size_t(i)] += h * Widen(v[j * stride]);
+    }
+  return out;
+}
+
+template <typename T>
+long double Norm(const std::vector<Lcx>& v) {
+  long double s = 0;
+  for (const Lcx& e : v) s += std::norm(e);
+  return std::sqrt(s);
+}
+
+struct Shape {
+  int32_t rows, cols, count;
+  Kind kind;
+};
+const Shape kShapes[] = {
+    {1, 1, 1, kNoise},       {7, 3, 3, kNoise},      {3, 7, 2, kNoise},
+    {200, 100, 4, kModes},   {100, 200, 4, kModes},  {341, 170, 8, kModes},
+    {300, 150, 3, kNoiseFree}, {240, 120, 2, kClose}, {500, 60, 16, kNoise},
+    {1000, 499, 6, kModes},
+};
+
+template <typename T>
+void CheckProducts() {
+  for (const Shape& s : kShapes) {
+    SCOPED_TRACE(testing::Message() << s.rows << "x" << s.cols);
+    const std::vector<T> x = Record<T>(s.kind, s.rows + s.cols - 1, 3, 5);
+    const int32_t k = 3;
+    std::vector<T> V(size_t(s.cols) * k), U(size_t(s.rows) * k), Z(size_t(s.rows) * k),
+        W(size_t(s.cols) * k);
+    std::mt19937_64 gen(9);
+    std::uniform_real_distribution<double> d(-1, 1);
+    auto draw = [&]() -> T {
+      const double re = d(gen);
+      if constexpr (kIsCx<T>) return T(re, d(gen)); else return re;
+    };
+    for (T& e : V) e = draw();
+    for (T& e : U) e = draw();
+    StatusCode st;
+    if constexpr (kIsCx<T>) {
+      st = HankelProductFftComplex(x.data(), s.rows, s.cols, V.data(), k, Z.data());
+      ASSERT_EQ(st, 0);
+      st = HankelAdjointProductFftComplex(x.data(), s.rows, s.cols, U.data(), k, W.data());
+    } else {
+      st = HankelProductFftReal(x.data(), s.rows, s.cols, V.data(), k, Z.data());
+      ASSERT_EQ(st, 0);
+      st = HankelAdjointProductFftReal(x.data(), s.rows, s.cols, U.data(), k, W.data());
+    }
+    ASSERT_EQ(st, 0);
+    for (int32_t c = 0; c < k; ++c) {
+      const auto z = Direct(x, s.rows, s.cols, V.data() + c, k, false);
+      const auto w = Direct(x, s.rows, s.cols, U.data() + c, k, true);
+      const long double bz = Norm<T>(z), bw = Norm<T>(w);
+      for (int32_t i = 0; i < s.rows; ++i)
+        EXPECT_LE(std::abs(Widen(Z[size_t(i) * k + c]) - z[size_t(i)]), 64 * kEps * bz);
+      for (int32_t j = 0; j < s.cols; ++j)
+        EXPECT_LE(std::abs(Widen(W[size_t(j) * k + c]) - w[size_t(j)]), 64 * kEps * bw);
+    }
+  }
+}
+
+template <typename T>
+void CheckTriplets() {
+  for (const Shape& s : kShapes) {
+    SCOPED_TRACE(testing::Message() << s.rows << "x" << s.cols << " count " << s.count
+                                    << " kind " << s.kind);
+    const int modes = std::max(1, s.count / 2);
+    const std::vector<T> x = Record<T>(s.kind, s.rows + s.cols - 1, modes, 17);
+    std::vector<double> S(size_t(s.count));
+    std::vector<T> U(size_t(s.rows) * s.count), V(size_t(s.cols) * s.count);
+    StatusCode st;
+    if constexpr (kIsCx<T>) {
+      st = HankelSvdLeadingComplex(x.data(), s.rows, s.cols, s.count, S.data(), U.data(),
+                                   V.data());
+    } else {
+      st = HankelSvdLeadingReal(x.data(), s.rows, s.cols, s.count, S.data(), U.data(), V.data());
+    }
+    ASSERT_EQ(st, 0);
+    // The dense singular values of the formed matrix.
+    std::vector<T> H(size_t(s.rows) * s.cols);
+    for (int32_t i = 0; i < s.rows; ++i)
+      for (int32_t j = 0; j < s.cols; ++j) H[size_t(i) * s.cols + j] = x[size_t(i + s.cols - 1 - j)];
+    const int32_t r = std::min(s.rows, s.cols);
+    std::vector<double> Sd(static_cast<size_t>(r));
+    std::vector<T> Ud(size_t(s.rows) * r), Vd(size_t(s.cols) * r);
+    if constexpr (kIsCx<T>) st = SvdComplex(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0);
+    else st = SvdReal(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0);
+    ASSERT_EQ(st, 0);
+    const double s1 = Sd[0];
+    for (int32_t i = 0; i < s.count; ++i) {
+      EXPECT_NEAR(S[size_t(i)], Sd[size_t(i)], 1e-12 * s1) << "value " << i;
+      // H v = s u and H^H u = s v by direct sums; unit vectors.
+      const auto hv = Direct(x, s.rows, s.cols, V.data() + i, s.count, false);
+      const auto hu = Direct(x, s.rows, s.cols, U.data() + i, s.count, true);
+      long double r1 = 0, r2 = 0;
+      for (int32_t a = 0; a < s.rows; ++a)
+        r1 += std::norm(hv[size_t(a)] - Widen(U[size_t(a) * s.count + i]) * (long double)S[size_t(i)]);
+      for (int32_t b = 0; b < s.cols; ++b)
+        r2 += std::norm(hu[size_t(b)] - Widen(V[size_t(b) * s.count + i]) * (long double)S[size_t(i)]);
+      EXPECT_LE(std::sqrt(r1), 1e-12 * s1) << "H v - s u, triplet " << i;
+      EXPECT_LE(std::sqrt(r2), 1e-12 * s1) << "H^H u - s v, triplet " << i;
+      for (int32_t j = 0; j <= i; ++j) {
+        Lcx dot = 0;
+        for (int32_t b = 0; b < s.cols; ++b)
+          dot += std::conj(Widen(V[size_t(b) * s.count + j])) * Widen(V[size_t(b) * s.count + i]);
+        EXPECT_NEAR(double(std::abs(dot - Lcx(i == j ? 1 : 0))), 0.0, 1e-12) << i << "," << j;
+      }
+    }
+  }
+}
+
+TEST(HankelFft, ProductsMatchDirectSums) {
+  CheckProducts<double>();
+  CheckProducts<Cx>();
+}
+
+TEST(HankelFft, LeadingTripletsMatchDenseSvd) {
+  CheckTriplets<double>();
+  CheckTriplets<Cx>();
+}
+
+TEST(HankelFft, RefusesBadSizesAndCountsAllocations) {
+  std::vector<double> x(64, 1.0), S(4), V(32 * 4);
+  EXPECT_EQ(HankelSvdLeadingReal(x.data(), 33, 32, 0, S.data(), nullptr, V.data()), -20003);
+  EXPECT_EQ(HankelSvdLeadingReal(x.data(), 33, 32, 33, S.data(), nullptr, V.data()), -20003);
+  EXPECT_EQ(HankelSvdLeadingReal(x.data(), 0, 32, 1, S.data(), nullptr, V.data()), -20003);
+  // Every allocation failed in turn: the failure is returned and nothing leaks.
+  const std::vector<double> rec = Record<double>(kModes, 64, 2, 3);
+  for (int64_t fail = 1;; ++fail) {
+    NumAllocFailAt(fail, false);
+    const StatusCode st = HankelSvdLeadingReal(rec.data(), 33, 32, 4, S.data(), nullptr, V.data());
+    const bool reached = NumAllocAttempts() >= fail;
+    NumAllocFailAt(0, false);
+    EXPECT_EQ(NumAllocOutstanding(), 0);
+    if (!reached) {
+      EXPECT_EQ(st, 0);
+      break;
+    }
+    EXPECT_EQ(st, -20001) << "allocation " << fail;
+  }
+}
+
+}  // namespace
+
+// ---- the matrix pencil on the Krylov route against the dense route ------------------------
+namespace pencil {
+
+struct Case {
+  int32_t n, M;
+  Kind kind;
+  double snr_db;
+};
+
+template <typename T>
+void Agree() {
+  const Case cases[] = {{256, 2, kModes, 40},  {256, 4, kModes, 10},   {1024, 8, kModes, 30},
+                        {1024, 3, kNoiseFree, 0}, {1200, 2, kClose, 40}, {1536, 6, kModes, 20},
+                        {999, 5, kModes, 25}};
+  for (const Case& c : cases) {
+    SCOPED_TRACE(testing::Message() << "n " << c.n << " M " << c.M << " kind " << c.kind);
+    const int modes = c.kind == kClose ? 2 : c.M;
+    std::vector<T> x = Record<T>(c.kind == kModes ? kNoiseFree : c.kind, c.n, modes, 23);
+    if (c.kind == kModes) {  // noise at the asked SNR against the first mode
+      std::mt19937_64 gen(29);
+      std::normal_distribution<double> g(0.0, std::pow(10.0, -c.snr_db / 20.0));
+      for (T& v : x) {
+        if constexpr (kIsCx<T>) v += T(g(gen), g(gen)); else v += g(gen);
+      }
+    }
+    const int32_t L = c.n / 3;
+    std::vector<double> a[2], p[2], d[2], f[2], mse(2);
+    std::vector<int32_t> count(2);
+    StatusCode st[2];
+    for (int route = 0; route < 2; ++route) {
+      for (auto* v : {&a[route], &p[route], &d[route], &f[route]}) v->assign(size_t(c.M), 0.0);
+      if constexpr (kIsCx<T>) {
+        st[route] = MatrixPencilSolverComplex(
+            x.data(), c.n, L, c.M, 1.0, route ? PencilSolver::kKrylov : PencilSolver::kDense,
+            a[route].data(), p[route].data(), d[route].data(),
+            f[route].data(), &mse[route], &count[route]);
+      } else {
+        st[route] = MatrixPencilSolverReal(
+            x.data(), c.n, L, c.M, 1.0, 0, route ? PencilSolver::kKrylov : PencilSolver::kDense,
+            a[route].data(), p[route].data(), d[route].data(),
+            f[route].data(), &mse[route], &count[route]);
+      }
+    }
+    ASSERT_EQ(st[0], st[1]);
+    ASSERT_EQ(st[0], 0);
+    ASSERT_EQ(count[0], count[1]);
+    // Modes in frequency order on both routes.
+    std::vector<int> o[2];
+    for (int route = 0; route < 2; ++route) {
+      for (int i = 0; i < count[route]; ++i) o[route].push_back(i);
+      std::sort(o[route].begin(), o[route].end(),
+                [&](int i, int j) { return f[route][size_t(i)] < f[route][size_t(j)]; });
+    }
+    for (int k = 0; k < count[0]; ++k) {
+      const size_t i = size_t(o[0][size_t(k)]), j = size_t(o[1][size_t(k)]);
+      EXPECT_NEAR(f[1][j], f[0][i], 1e-9 * std::max(1e-3, std::abs(f[0][i]))) << "frequency " << k;
+      EXPECT_NEAR(d[1][j], d[0][i], 1e-9 * std::max(1e-3, std::abs(d[0][i]))) << "damping " << k;
+      EXPECT_NEAR(a[1][j], a[0][i], 1e-8 * a[0][i]) << "amplitude " << k;
+      EXPECT_NEAR(p[1][j], p[0][i], 1e-8) << "phase " << k;
+    }
+    EXPECT_NEAR(mse[1], mse[0], 1e-8 * mse[0] + 1e-20);  // noise-free: rounding level
+  }
+}
+
+}  // namespace pencil
+
+TEST(HankelFft, PencilKrylovRouteAgreesWithDense) {
+  pencil::Agree<double>();
+  pencil::Agree<Cx>();
+}
