@@ -102,21 +102,33 @@ StatusCode Setup(HankelFft& h, const T* x, int32_t rows, int32_t cols) {
   return Dft(h, h.a.get(), h.X.get());
 }
 
-// z (rows values, stride zs) = H v (cols values, stride vs).
+// b = dft(spectral(dft(in))) for `count` inputs (stride is) padded with zeros:
+// the spectral step is conj(B X) for H v (the inverse DFT between
+// conjugations), B conj(X) for H^H u (a correlation).
 template <typename T>
-StatusCode Apply(HankelFft& h, const T* v, int64_t vs, T* z, int64_t zs) {
+StatusCode Transform(HankelFft& h, const T* in, int64_t is, int32_t count, bool adjoint) {
   Complex* a = h.a.get();
   Complex* b = h.b.get();
   std::fill(a, a + h.N, Complex(0.0, 0.0));
-  for (int32_t j = 0; j < h.cols; ++j) a[j] = Complex(Real(v[j * vs]), Imag(v[j * vs]));
-  StatusCode st = Dft(h, a, b);
+  for (int32_t j = 0; j < count; ++j) a[j] = Complex(Real(in[j * is]), Imag(in[j * is]));
+  const StatusCode st = Dft(h, a, b);
   if (st != status::kOk) return st;
-  for (int32_t f = 0; f < h.N; ++f) a[f] = std::conj(b[f] * h.X[f]);
-  st = Dft(h, a, b);
+  if (adjoint) {
+    for (int32_t f = 0; f < h.N; ++f) a[f] = b[f] * std::conj(h.X[f]);
+  } else {
+    for (int32_t f = 0; f < h.N; ++f) a[f] = std::conj(b[f] * h.X[f]);
+  }
+  return Dft(h, a, b);
+}
+
+// z (rows values, stride zs) = H v (cols values, stride vs).
+template <typename T>
+StatusCode Apply(HankelFft& h, const T* v, int64_t vs, T* z, int64_t zs) {
+  const StatusCode st = Transform(h, v, vs, h.cols, false);
   if (st != status::kOk) return st;
   const double scale = 1.0 / h.N;
   for (int32_t i = 0; i < h.rows; ++i) {
-    const Complex& c = b[i + h.cols - 1];
+    const Complex& c = h.b[i + h.cols - 1];
     z[i * zs] = Make<T>(c.real() * scale, -c.imag() * scale);
   }
   return status::kOk;
@@ -125,18 +137,11 @@ StatusCode Apply(HankelFft& h, const T* v, int64_t vs, T* z, int64_t zs) {
 // w (cols values, stride ws) = H^H u (rows values, stride us).
 template <typename T>
 StatusCode ApplyAdjoint(HankelFft& h, const T* u, int64_t us, T* w, int64_t ws) {
-  Complex* a = h.a.get();
-  Complex* b = h.b.get();
-  std::fill(a, a + h.N, Complex(0.0, 0.0));
-  for (int32_t i = 0; i < h.rows; ++i) a[i] = Complex(Real(u[i * us]), Imag(u[i * us]));
-  StatusCode st = Dft(h, a, b);
-  if (st != status::kOk) return st;
-  for (int32_t f = 0; f < h.N; ++f) a[f] = b[f] * std::conj(h.X[f]);
-  st = Dft(h, a, b);
+  const StatusCode st = Transform(h, u, us, h.rows, true);
   if (st != status::kOk) return st;
   const double scale = 1.0 / h.N;
   for (int32_t j = 0; j < h.cols; ++j) {
-    const Complex& c = b[h.cols - 1 - j];
+    const Complex& c = h.b[h.cols - 1 - j];
     w[j * ws] = Make<T>(c.real() * scale, c.imag() * scale);
   }
   return status::kOk;
