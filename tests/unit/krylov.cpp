@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <cmath>
 #include <complex>
+#include <numbers>
 #include <random>
 #include <vector>
 
@@ -41,7 +42,7 @@ std::vector<T> Record(Kind kind, int64_t n, int modes, uint32_t seed) {
     Cx v(0.0, 0.0);
     for (int m = 0; kind != kNoise && m < modes; ++m) {
       const double f = kind == kClose && m == 1 ? 0.1 + 1.0 / double(n) : 0.1 + 0.37 * m / modes;
-      v += (1.0 + 0.5 * m) * std::exp(Cx(-0.5 / double(n), 2.0 * M_PI * f) * double(t));
+      v += (1.0 + 0.5 * m) * std::exp(Cx(-0.5 / double(n), 2.0 * std::numbers::pi * f) * double(t));
     }
     v += sigma * Cx(g(gen), g(gen));
     if constexpr (kIsCx<T>) x[static_cast<size_t>(t)] = v; else x[static_cast<size_t>(t)] = v.real() + v.imag();
