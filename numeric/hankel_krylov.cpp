@@ -102,47 +102,32 @@ StatusCode Setup(HankelFft& h, const T* x, int32_t rows, int32_t cols) {
   return Dft(h, h.a.get(), h.X.get());
 }
 
-// b = dft(spectral(dft(in))) for `count` inputs (stride is) padded with zeros:
-// the spectral step is conj(B X) for H v (the inverse DFT between
-// conjugations), B conj(X) for H^H u (a correlation).
+// out = H in (adjoint false: cols values in, rows out) or H^H in (rows in, cols
+// out), strides is and os. Both are two DFTs of the zero-padded input with a
+// spectral step between: conj(B X) for H v (the inverse DFT between
+// conjugations, so the output is conjugated back), B conj(X) for H^H u (a
+// correlation, read backwards).
 template <typename T>
-StatusCode Transform(HankelFft& h, const T* in, int64_t is, int32_t count, bool adjoint) {
+StatusCode Product(HankelFft& h, const T* in, int64_t is, T* out, int64_t os, bool adjoint) {
   Complex* a = h.a.get();
   Complex* b = h.b.get();
+  const int32_t count = adjoint ? h.rows : h.cols;
   std::fill(a, a + h.N, Complex(0.0, 0.0));
   for (int32_t j = 0; j < count; ++j) a[j] = Complex(Real(in[j * is]), Imag(in[j * is]));
-  const StatusCode st = Dft(h, a, b);
+  StatusCode st = Dft(h, a, b);
   if (st != status::kOk) return st;
   if (adjoint) {
     for (int32_t f = 0; f < h.N; ++f) a[f] = b[f] * std::conj(h.X[f]);
   } else {
     for (int32_t f = 0; f < h.N; ++f) a[f] = std::conj(b[f] * h.X[f]);
   }
-  return Dft(h, a, b);
-}
-
-// z (rows values, stride zs) = H v (cols values, stride vs).
-template <typename T>
-StatusCode Apply(HankelFft& h, const T* v, int64_t vs, T* z, int64_t zs) {
-  const StatusCode st = Transform(h, v, vs, h.cols, false);
+  st = Dft(h, a, b);
   if (st != status::kOk) return st;
-  const double scale = 1.0 / h.N;
-  for (int32_t i = 0; i < h.rows; ++i) {
-    const Complex& c = h.b[i + h.cols - 1];
-    z[i * zs] = Make<T>(c.real() * scale, -c.imag() * scale);
-  }
-  return status::kOk;
-}
-
-// w (cols values, stride ws) = H^H u (rows values, stride us).
-template <typename T>
-StatusCode ApplyAdjoint(HankelFft& h, const T* u, int64_t us, T* w, int64_t ws) {
-  const StatusCode st = Transform(h, u, us, h.rows, true);
-  if (st != status::kOk) return st;
-  const double scale = 1.0 / h.N;
-  for (int32_t j = 0; j < h.cols; ++j) {
-    const Complex& c = h.b[h.cols - 1 - j];
-    w[j * ws] = Make<T>(c.real() * scale, c.imag() * scale);
+  const double scale = 1.0 / h.N, imag = adjoint ? scale : -scale;
+  const int32_t outCount = adjoint ? h.cols : h.rows;
+  for (int32_t i = 0; i < outCount; ++i) {
+    const Complex& c = b[adjoint ? h.cols - 1 - i : i + h.cols - 1];
+    out[i * os] = Make<T>(c.real() * scale, c.imag() * imag);
   }
   return status::kOk;
 }
@@ -154,7 +139,7 @@ StatusCode ProductFft(const T* x, int32_t rows, int32_t cols, const T* V, int32_
   HankelFft h;
   StatusCode st = Setup(h, x, rows, cols);
   for (int32_t c = 0; c < k && st == status::kOk; ++c) {
-    st = adjoint ? ApplyAdjoint(h, V + c, k, Z + c, k) : Apply(h, V + c, k, Z + c, k);
+    st = Product(h, V + c, k, Z + c, k, adjoint);
   }
   return st;
 }
@@ -271,7 +256,7 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
   for (int32_t restart = 0;; ++restart) {
     for (int32_t j = kept; j < k; ++j) {
       // u_j = H v_j minus its components along u_0 .. u_{j-1}: column j of B.
-      st = Apply(h, Vb.get() + j, ld, wu.get(), 1);
+      st = Product(h, Vb.get() + j, int64_t{ld}, wu.get(), 1, false);
       if (st != status::kOk) return st;
       scale = std::max(scale, lapack::Nrm2(rows, wu.get()));
       const double alpha = Orthogonalize(Ub.get(), rows, k, j, wu.get(), c.get(), c2.get());
@@ -281,7 +266,7 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
                                             c.get(), c2.get(), 3 + 2 * uint64_t(j)),
                                      0.0);
       // v_{j+1} = H^H u_j minus its components along v_0 .. v_j.
-      st = ApplyAdjoint(h, Ub.get() + j, k, wv.get(), 1);
+      st = Product(h, Ub.get() + j, int64_t{k}, wv.get(), 1, true);
       if (st != status::kOk) return st;
       const double b = Orthogonalize(Vb.get(), cols, ld, j + 1, wv.get(), c.get(), c2.get());
       scale = std::max(scale, b);

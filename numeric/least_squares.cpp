@@ -483,6 +483,23 @@ double MaxAbs(const double* v, int64_t count) {
   return top;
 }
 
+// v (count values) followed by its three parts on ever finer grids and the
+// rest after the first: v1, v2, v3 and v - v1 at v + count, 2 count, 3 count
+// and 4 count. The grid follows v's largest magnitude.
+void SplitInParts(double* v, int64_t count, int32_t bits) {
+  const double sigma = SplitSigma(MaxAbs(v, count), bits);
+  const double tau = std::ldexp(sigma, -bits);
+  for (int64_t k = 0; k < count; ++k) {
+    const double v1 = (v[k] + sigma) - sigma;
+    const double rest = v[k] - v1;
+    const double v2 = (rest + tau) - tau;
+    v[count + k] = v1;
+    v[2 * count + k] = v2;
+    v[3 * count + k] = rest - v2;
+    v[4 * count + k] = rest;
+  }
+}
+
 // Doubles of scratch Gradient needs for n columns.
 template <typename Rows>
 int64_t GradientScratch(const Rows& rows, int32_t n) {
@@ -520,17 +537,7 @@ void Gradient(const Rows& rows, int32_t m, int32_t n, const Complex* w, Complex*
     wv[j] = w[j].real();
     wv[n + j] = w[j].imag();
   }
-  const double w_sigma = SplitSigma(MaxAbs(wv, 2 * int64_t{n}), bits);
-  const double w_tau = std::ldexp(w_sigma, -bits);
-  for (int32_t k = 0; k < 2 * n; ++k) {
-    const double w1 = (wv[k] + w_sigma) - w_sigma;
-    const double rest = wv[k] - w1;
-    const double w2 = (rest + w_tau) - w_tau;
-    wv[2 * n + k] = w1;
-    wv[4 * n + k] = w2;
-    wv[6 * n + k] = rest - w2;
-    wv[8 * n + k] = rest;
-  }
+  SplitInParts(wv, 2 * int64_t{n}, bits);
   std::fill(acc, acc + 16 * int64_t{n}, 0.0);
   const Tile tile{re,  im,  hre, him, mre, mim, lre, lim, rows.ColumnBase(T), rows.ColumnStride(T),
                   n};
@@ -545,17 +552,7 @@ void Gradient(const Rows& rows, int32_t m, int32_t n, const Complex* w, Complex*
     // Rows past the end: a Hankel tile's later columns still reach real samples.
     std::fill(rr + h, rr + T, 0.0);
     std::fill(ri + h, ri + T, 0.0);
-    const double r_sigma = SplitSigma(std::max(MaxAbs(rr, T), MaxAbs(ri, T)), bits);
-    const double r_tau = std::ldexp(r_sigma, -bits);
-    for (int32_t k = 0; k < 2 * T; ++k) {
-      const double r1 = (rr[k] + r_sigma) - r_sigma;
-      const double rest = rr[k] - r1;
-      const double r2 = (rest + r_tau) - r_tau;
-      rr[2 * T + k] = r1;
-      rr[4 * T + k] = r2;
-      rr[6 * T + k] = rest - r2;
-      rr[8 * T + k] = rest;
-    }
+    SplitInParts(rr, 2 * int64_t{T}, bits);
     TileGradient(tile, rr, acc);
   }
   for (int32_t j = 0; j < n; ++j) {
