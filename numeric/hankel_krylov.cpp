@@ -230,10 +230,16 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
   HankelFft h;
   StatusCode st = Setup(h, x, rows, cols);
   if (st != status::kOk) return st;
-  WorkArray<T> Vb = AllocWork<T>(static_cast<size_t>(int64_t{cols} * ld));
-  WorkArray<T> Ub = AllocWork<T>(static_cast<size_t>(int64_t{rows} * k));
-  WorkArray<T> wu = AllocWorkUninit<T>(static_cast<size_t>(rows));
-  WorkArray<T> wv = AllocWorkUninit<T>(static_cast<size_t>(cols));
+  // The bidiagonalization runs on A = H, or on A = H^H when H is wide, so that
+  // the starting side is the smaller one: after dim steps its basis is
+  // complete, the residual vanishes and the triplets are exact. A's right
+  // vectors are then H's left ones.
+  const bool flip = rows < cols;
+  const int32_t vn = flip ? rows : cols, un = flip ? cols : rows;
+  WorkArray<T> Vb = AllocWork<T>(static_cast<size_t>(int64_t{vn} * ld));
+  WorkArray<T> Ub = AllocWork<T>(static_cast<size_t>(int64_t{un} * k));
+  WorkArray<T> wu = AllocWorkUninit<T>(static_cast<size_t>(un));
+  WorkArray<T> wv = AllocWorkUninit<T>(static_cast<size_t>(vn));
   WorkArray<T> c = AllocWorkUninit<T>(static_cast<size_t>(ld));
   WorkArray<T> c2 = AllocWorkUninit<T>(static_cast<size_t>(ld));
   WorkArray<T> B = AllocWork<T>(kk);
@@ -247,30 +253,30 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
     return status::kNoMemory;
   }
 
-  Scatter(wv.get(), 1, cols, 1);
+  Scatter(wv.get(), 1, vn, 1);
   double scale = 0.0;  // largest norm met so far, a lower bound of s_1
-  (void)Extend(Vb.get(), cols, ld, 0, wv.get(), lapack::Nrm2(cols, wv.get()), 1.0, c.get(),
+  (void)Extend(Vb.get(), vn, ld, 0, wv.get(), lapack::Nrm2(vn, wv.get()), 1.0, c.get(),
                c2.get(), 2);
   int32_t kept = 0;
   double beta = 0.0;
   for (int32_t restart = 0;; ++restart) {
     for (int32_t j = kept; j < k; ++j) {
-      // u_j = H v_j minus its components along u_0 .. u_{j-1}: column j of B.
-      st = Product(h, Vb.get() + j, int64_t{ld}, wu.get(), 1, false);
+      // u_j = A v_j minus its components along u_0 .. u_{j-1}: column j of B.
+      st = Product(h, Vb.get() + j, int64_t{ld}, wu.get(), 1, flip);
       if (st != status::kOk) return st;
-      scale = std::max(scale, lapack::Nrm2(rows, wu.get()));
-      const double alpha = Orthogonalize(Ub.get(), rows, k, j, wu.get(), c.get(), c2.get());
+      scale = std::max(scale, lapack::Nrm2(un, wu.get()));
+      const double alpha = Orthogonalize(Ub.get(), un, k, j, wu.get(), c.get(), c2.get());
       for (int32_t i = 0; i < j; ++i) B[i + size_t(j) * k] = c[i];
       for (int32_t i = j; i < k; ++i) B[i + size_t(j) * k] = T(0.0);
-      B[j + size_t(j) * k] = Make<T>(Extend(Ub.get(), rows, k, j, wu.get(), alpha, scale,
+      B[j + size_t(j) * k] = Make<T>(Extend(Ub.get(), un, k, j, wu.get(), alpha, scale,
                                             c.get(), c2.get(), 3 + 2 * uint64_t(j)),
                                      0.0);
-      // v_{j+1} = H^H u_j minus its components along v_0 .. v_j.
-      st = Product(h, Ub.get() + j, int64_t{k}, wv.get(), 1, true);
+      // v_{j+1} = A^H u_j minus its components along v_0 .. v_j.
+      st = Product(h, Ub.get() + j, int64_t{k}, wv.get(), 1, !flip);
       if (st != status::kOk) return st;
-      const double b = Orthogonalize(Vb.get(), cols, ld, j + 1, wv.get(), c.get(), c2.get());
+      const double b = Orthogonalize(Vb.get(), vn, ld, j + 1, wv.get(), c.get(), c2.get());
       scale = std::max(scale, b);
-      beta = Extend(Vb.get(), cols, ld, j + 1, wv.get(), b, scale, c.get(), c2.get(),
+      beta = Extend(Vb.get(), vn, ld, j + 1, wv.get(), b, scale, c.get(), c2.get(),
                     4 + 2 * uint64_t(j));
     }
     // B = P diag(s) Q^H, column-major.
@@ -291,28 +297,32 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
         C[size_t(j) * keep + i] = Conj(Qh[i + size_t(j) * k]);
       }
     }
-    Rotate(Vb.get(), cols, ld, k, C.get(), keep, tmp.get());
+    Rotate(Vb.get(), vn, ld, k, C.get(), keep, tmp.get());
     for (int32_t j = 0; j < k; ++j) {
       for (int32_t i = 0; i < keep; ++i) C[size_t(j) * keep + i] = P[j + size_t(i) * k];
     }
-    Rotate(Ub.get(), rows, k, k, C.get(), keep, tmp.get());
+    Rotate(Ub.get(), un, k, k, C.get(), keep, tmp.get());
     if (converged) break;
-    for (int32_t r = 0; r < cols; ++r) Vb[int64_t{r} * ld + keep] = Vb[int64_t{r} * ld + k];
+    for (int32_t r = 0; r < vn; ++r) Vb[int64_t{r} * ld + keep] = Vb[int64_t{r} * ld + k];
     std::fill(B.get(), B.get() + kk, T(0.0));
     for (int32_t i = 0; i < keep; ++i) B[i + size_t(i) * k] = Make<T>(s[i], 0.0);
     kept = keep;
   }
 
   for (int32_t i = 0; i < count; ++i) S[i] = s[i];
-  for (int32_t r = 0; r < cols; ++r) {
-    std::memcpy(static_cast<void*>(V + int64_t{r} * count), Vb.get() + int64_t{r} * ld,
-                static_cast<size_t>(count) * sizeof(T));
-  }
-  if (U != nullptr) {
-    for (int32_t r = 0; r < rows; ++r) {
-      std::memcpy(static_cast<void*>(U + int64_t{r} * count), Ub.get() + int64_t{r} * k,
+  // A's right vectors (Vb, vn rows) and left ones (Ub, un rows).
+  auto copy = [count](T* to, const T* from, int32_t n, int32_t stride) {
+    for (int32_t r = 0; r < n; ++r) {
+      std::memcpy(static_cast<void*>(to + int64_t{r} * count), from + int64_t{r} * stride,
                   static_cast<size_t>(count) * sizeof(T));
     }
+  };
+  if (flip) {
+    copy(V, Ub.get(), un, k);
+    if (U != nullptr) copy(U, Vb.get(), vn, ld);
+  } else {
+    copy(V, Vb.get(), vn, ld);
+    if (U != nullptr) copy(U, Ub.get(), un, k);
   }
   return status::kOk;
 }

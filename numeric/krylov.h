@@ -33,7 +33,8 @@
 //
 // Method: Golub-Kahan-Lanczos bidiagonalization with full reorthogonalization
 // (classical Gram-Schmidt, twice) and thick restarts that keep the best Ritz
-// vectors, on a subspace of at most max(2 count + 8, count + 16) vectors. It
+// vectors, on a subspace of at most max(2 count + 8, count + 16) vectors,
+// started on the smaller side of H (on H^H when H is wide). It
 // stops when every wanted triplet has ||H^H u - s v|| <= kKrylovTolerance s_1
 // (H v = s u holds by construction), and gives up with
 // status::kKrylovNoConvergence after kKrylovMaxRestarts restarts. Memory is
