@@ -43,21 +43,30 @@ enum class Route { kDense, kKrylov };
 
 template <typename T>
 StatusCode PencilMatrixKrylov(const T* x, int32_t q, int32_t L, int32_t mr, T* full) {
-  auto Z = AllocWorkUninit<T>(static_cast<size_t>(q + 1) * static_cast<size_t>(mr));
-  auto Zh = AllocWorkUninit<T>(static_cast<size_t>(mr) * static_cast<size_t>(q));
+  auto U = AllocWorkUninit<T>(static_cast<size_t>(q) * static_cast<size_t>(mr));
   auto s = AllocWorkUninit<double>(static_cast<size_t>(mr));
   auto V = AllocWorkUninit<T>(static_cast<size_t>(L) * static_cast<size_t>(mr));
-  if (!Z || !Zh || !s || !V) return status::kNoMemory;
-  StatusCode st = HankelSvdLeading(x, q, L, mr, s.get(), nullptr, V.get());
+  auto last = AllocWorkUninit<T>(static_cast<size_t>(mr));
+  if (!U || !s || !V || !last) return status::kNoMemory;
+  StatusCode st = HankelSvdLeading(x, q, L, mr, s.get(), U.get(), V.get());
   if (st != status::kOk) return st;
-  st = HankelProductFft(x, q + 1, L, V.get(), mr, Z.get());
+  // Y2 V_M is Y1 V_M = U_M diag(s_M) moved up one row, with one new last row
+  // x[n-1-j] V_M (Y2's last row holds x[n-1] .. x[q]): so
+  //   K_M = diag(1/s) (U_M[0:q-1]^H U_M[1:q] diag(s) + conj(U_M[q-1])^T last).
+  const T* y2last = x + q;  // Y2[q-1][j] = x[q+L-1-j]
+  for (int32_t b = 0; b < mr; ++b) {
+    T sum = T(0.0);
+    for (int32_t j = 0; j < L; ++j) sum += y2last[L - 1 - j] * V[size_t(j) * mr + b];
+    last[b] = sum;
+  }
+  st = AdjointMatMul(U.get(), U.get() + mr, q - 1, mr, mr, full);
   if (st != status::kOk) return st;
-  st = AdjointInto(Z.get(), q, mr, Zh.get());
-  if (st != status::kOk) return st;
-  st = MatMul(Zh.get(), Z.get() + mr, mr, q, mr, full);
-  if (st != status::kOk) return st;
-  st = ScaleRowsByInverse(full, mr, mr, s.get());
-  if (st != status::kOk) return st;
+  const T* uq = U.get() + size_t(q - 1) * mr;
+  for (int32_t a = 0; a < mr; ++a) {
+    for (int32_t b = 0; b < mr; ++b) {
+      full[size_t(a) * mr + b] = full[size_t(a) * mr + b] * s[b] + Conjugate(uq[a]) * last[b];
+    }
+  }
   return ScaleRowsByInverse(full, mr, mr, s.get());
 }
 

@@ -6,6 +6,7 @@
 // `if constexpr (kIsComplex<T>)`.
 #pragma once
 
+#include <complex>
 #include <type_traits>
 
 #include "estimation/estimation.h"
@@ -25,6 +26,18 @@ inline StatusCode MatMul(const double* A, const double* B, int32_t m, int32_t k,
 inline StatusCode MatMul(const Complex* A, const Complex* B, int32_t m, int32_t k, int32_t n,
                          Complex* C) {
   return MatMulComplex(A, B, m, k, n, C);
+}
+// The conjugate of a value (itself for real data).
+inline double Conjugate(double v) { return v; }
+inline Complex Conjugate(const Complex& v) { return std::conj(v); }
+// C = A^H B (A k-by-m, B k-by-n).
+inline StatusCode AdjointMatMul(const double* A, const double* B, int32_t k, int32_t m, int32_t n,
+                                double* C) {
+  return AdjointMatMulReal(A, B, k, m, n, C);
+}
+inline StatusCode AdjointMatMul(const Complex* A, const Complex* B, int32_t k, int32_t m,
+                                int32_t n, Complex* C) {
+  return AdjointMatMulComplex(A, B, k, m, n, C);
 }
 // Transpose for real data, conjugate transpose for complex data.
 inline StatusCode AdjointInto(double* A, int32_t m, int32_t n, double* out) {

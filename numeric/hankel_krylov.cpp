@@ -165,53 +165,56 @@ void Scatter(T* v, int64_t stride, int32_t n, uint64_t seed) {
   }
 }
 
-// w minus its projection on the first `count` columns of the row-major basis Q
-// (dim rows, leading dimension ld), by classical Gram-Schmidt twice; the
-// coefficients Q^H w (before projection) into c. Then the norm of what is left.
+// w minus its projection on the first `count` columns of the column-major
+// basis Q (dim rows, contiguous columns) by classical Gram-Schmidt, repeated
+// once when the first pass cancelled more than 1 - 1/sqrt(2) of w's norm
+// (`norm`, before projection): "twice is enough". The coefficients Q^H w
+// (before projection) into c. Returns the norm of what is left.
 template <typename T>
-double Orthogonalize(const T* Q, int32_t dim, int32_t ld, int32_t count, T* w, T* c, T* c2) {
-  if (count > 0) {
-    const T one = Make<T>(1.0, 0.0), zero = Make<T>(0.0, 0.0), minus = Make<T>(-1.0, 0.0);
-    lapack::GemvLd(true, dim, count, one, Q, ld, w, zero, c);
-    lapack::GemvLd(false, dim, count, minus, Q, ld, c, one, w);
-    lapack::GemvLd(true, dim, count, one, Q, ld, w, zero, c2);
-    lapack::GemvLd(false, dim, count, minus, Q, ld, c2, one, w);
-    for (int32_t i = 0; i < count; ++i) c[i] += c2[i];
-  }
+double Orthogonalize(const T* Q, int32_t dim, int32_t count, T* w, double norm, T* c, T* c2) {
+  if (count == 0) return norm;
+  const T one = Make<T>(1.0, 0.0), zero = Make<T>(0.0, 0.0), minus = Make<T>(-1.0, 0.0);
+  lapack::GemvCol(true, dim, count, one, Q, dim, w, zero, c);
+  lapack::GemvCol(false, dim, count, minus, Q, dim, c, one, w);
+  const double left = lapack::Nrm2(dim, w);
+  if (left > 0.7071067811865476 * norm) return left;
+  lapack::GemvCol(true, dim, count, one, Q, dim, w, zero, c2);
+  lapack::GemvCol(false, dim, count, minus, Q, dim, c2, one, w);
+  for (int32_t i = 0; i < count; ++i) c[i] += c2[i];
   return lapack::Nrm2(dim, w);
 }
 
-// Column `col` of the basis (stride ld) = w / norm, or, when w has vanished
-// (the Krylov space is invariant), a fresh direction orthogonal to the basis.
-// Returns the norm kept in B: 0 after a breakdown.
+// Column `col` of the basis = w / norm, or, when w has vanished (the Krylov
+// space is invariant), a fresh direction orthogonal to the basis. Returns the
+// norm kept in B: 0 after a breakdown.
 template <typename T>
-double Extend(T* Q, int32_t dim, int32_t ld, int32_t col, T* w, double norm, double scale, T* c,
-              T* c2, uint64_t seed) {
+double Extend(T* Q, int32_t dim, int32_t col, T* w, double norm, double scale, T* c, T* c2,
+              uint64_t seed) {
   constexpr double kBreakdown = 1e-14;
   double kept = norm;
   for (int attempt = 0; !(norm > kBreakdown * scale) && attempt < 3; ++attempt) {
     Scatter(w, 1, dim, seed + 7919u * static_cast<uint64_t>(attempt + 1));
-    norm = Orthogonalize(Q, dim, ld, col, w, c, c2);
+    norm = Orthogonalize(Q, dim, col, w, lapack::Nrm2(dim, w), c, c2);
     kept = 0.0;
   }
   const double inv = norm > 0.0 ? 1.0 / norm : 0.0;
-  for (int32_t i = 0; i < dim; ++i) Q[int64_t{i} * ld + col] = w[i] * inv;
+  T* q = Q + int64_t{col} * dim;
+  for (int32_t i = 0; i < dim; ++i) q[i] = w[i] * inv;
   return kept;
 }
 
-// Row-major Q[:, 0:keep] = Q[:, 0:k] C (C k-by-keep, column-major, ldc), a
-// block of rows at a time through `tmp` (kRows x keep).
+// Q[:, 0:keep] = Q[:, 0:m] C (column-major, C m-by-keep with leading dimension
+// m), a block of rows at a time through `tmp` (kRows x keep): the row blocking
+// bounds the scratch, and each block is read once.
 constexpr int32_t kRows = 256;
 template <typename T>
-void Rotate(T* Q, int32_t dim, int32_t ld, int32_t k, const T* Crow, int32_t keep, T* tmp) {
-  const T one = Make<T>(1.0, 0.0), zero = Make<T>(0.0, 0.0);
+void Rotate(T* Q, int32_t dim, int32_t m, const T* C, int32_t keep, T* tmp) {
   for (int32_t r0 = 0; r0 < dim; r0 += kRows) {
     const int32_t h = std::min(kRows, dim - r0);
-    T* rows = Q + int64_t{r0} * ld;
-    lapack::GemmLd(false, h, keep, k, one, rows, ld, Crow, keep, zero, tmp, keep);
-    for (int32_t i = 0; i < h; ++i) {
-      std::memcpy(static_cast<void*>(rows + int64_t{i} * ld), tmp + int64_t{i} * keep,
-                  static_cast<size_t>(keep) * sizeof(T));
+    lapack::GemmCol(h, keep, m, Q + r0, dim, C, m, tmp, h);
+    for (int32_t j = 0; j < keep; ++j) {
+      std::memcpy(static_cast<void*>(Q + int64_t{j} * dim + r0), tmp + int64_t{j} * h,
+                  static_cast<size_t>(h) * sizeof(T));
     }
   }
 }
@@ -224,7 +227,6 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
   }
   const int32_t dim = std::min(rows, cols);
   const int32_t k = std::min(dim, std::max(2 * count + 8, count + 16));
-  const int32_t ld = k + 1;  // V holds one vector more: the residual direction
   const size_t kk = static_cast<size_t>(k) * static_cast<size_t>(k);
 
   HankelFft h;
@@ -236,12 +238,15 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
   // vectors are then H's left ones.
   const bool flip = rows < cols;
   const int32_t vn = flip ? rows : cols, un = flip ? cols : rows;
-  WorkArray<T> Vb = AllocWork<T>(static_cast<size_t>(int64_t{vn} * ld));
-  WorkArray<T> Ub = AllocWork<T>(static_cast<size_t>(int64_t{un} * k));
+  // Column-major bases, one contiguous vector per column, touched only as far
+  // as the bidiagonalization gets: V holds one vector more, the residual
+  // direction.
+  WorkArray<T> Vb = AllocWorkUninit<T>(static_cast<size_t>(int64_t{vn} * (k + 1)));
+  WorkArray<T> Ub = AllocWorkUninit<T>(static_cast<size_t>(int64_t{un} * k));
   WorkArray<T> wu = AllocWorkUninit<T>(static_cast<size_t>(un));
   WorkArray<T> wv = AllocWorkUninit<T>(static_cast<size_t>(vn));
-  WorkArray<T> c = AllocWorkUninit<T>(static_cast<size_t>(ld));
-  WorkArray<T> c2 = AllocWorkUninit<T>(static_cast<size_t>(ld));
+  WorkArray<T> c = AllocWorkUninit<T>(static_cast<size_t>(k + 1));
+  WorkArray<T> c2 = AllocWorkUninit<T>(static_cast<size_t>(k + 1));
   WorkArray<T> B = AllocWork<T>(kk);
   WorkArray<T> Bw = AllocWorkUninit<T>(kk);
   WorkArray<T> P = AllocWorkUninit<T>(kk);
@@ -252,77 +257,85 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
   if (!Vb || !Ub || !wu || !wv || !c || !c2 || !B || !Bw || !P || !Qh || !C || !s || !tmp) {
     return status::kNoMemory;
   }
+  T* Vq = Vb.get();
+  T* Uq = Ub.get();
 
   Scatter(wv.get(), 1, vn, 1);
   double scale = 0.0;  // largest norm met so far, a lower bound of s_1
-  (void)Extend(Vb.get(), vn, ld, 0, wv.get(), lapack::Nrm2(vn, wv.get()), 1.0, c.get(),
-               c2.get(), 2);
+  (void)Extend(Vq, vn, 0, wv.get(), lapack::Nrm2(vn, wv.get()), 1.0, c.get(), c2.get(), 2);
   int32_t kept = 0;
   double beta = 0.0;
   for (int32_t restart = 0;; ++restart) {
-    for (int32_t j = kept; j < k; ++j) {
+    // Steps kept .. k-1; from `count` columns on, the Ritz triplets of the
+    // leading m x m block of B are tested after every step, so a subspace
+    // with a clear gap stops long before k.
+    int32_t m = kept;
+    bool converged = false;
+    while (m < k && !converged) {
+      const int32_t j = m;
       // u_j = A v_j minus its components along u_0 .. u_{j-1}: column j of B.
-      st = Product(h, Vb.get() + j, int64_t{ld}, wu.get(), 1, flip);
+      st = Product(h, Vq + int64_t{j} * vn, 1, wu.get(), 1, flip);
       if (st != status::kOk) return st;
-      scale = std::max(scale, lapack::Nrm2(un, wu.get()));
-      const double alpha = Orthogonalize(Ub.get(), un, k, j, wu.get(), c.get(), c2.get());
+      const double au = lapack::Nrm2(un, wu.get());
+      scale = std::max(scale, au);
+      const double alpha = Orthogonalize(Uq, un, j, wu.get(), au, c.get(), c2.get());
       for (int32_t i = 0; i < j; ++i) B[i + size_t(j) * k] = c[i];
-      for (int32_t i = j; i < k; ++i) B[i + size_t(j) * k] = T(0.0);
-      B[j + size_t(j) * k] = Make<T>(Extend(Ub.get(), un, k, j, wu.get(), alpha, scale,
-                                            c.get(), c2.get(), 3 + 2 * uint64_t(j)),
-                                     0.0);
+      B[j + size_t(j) * k] = Make<T>(
+          Extend(Uq, un, j, wu.get(), alpha, scale, c.get(), c2.get(), 3 + 2 * uint64_t(j)), 0.0);
       // v_{j+1} = A^H u_j minus its components along v_0 .. v_j.
-      st = Product(h, Ub.get() + j, int64_t{k}, wv.get(), 1, !flip);
+      st = Product(h, Uq + int64_t{j} * un, 1, wv.get(), 1, !flip);
       if (st != status::kOk) return st;
-      const double b = Orthogonalize(Vb.get(), vn, ld, j + 1, wv.get(), c.get(), c2.get());
+      const double b = Orthogonalize(Vq, vn, j + 1, wv.get(), lapack::Nrm2(vn, wv.get()),
+                                     c.get(), c2.get());
       scale = std::max(scale, b);
-      beta = Extend(Vb.get(), vn, ld, j + 1, wv.get(), b, scale, c.get(), c2.get(),
-                    4 + 2 * uint64_t(j));
-    }
-    // B = P diag(s) Q^H, column-major.
-    std::memcpy(static_cast<void*>(Bw.get()), B.get(), kk * sizeof(T));
-    st = lapack::Gesdd('S', k, k, Bw.get(), k, s.get(), P.get(), k, Qh.get(), k);
-    if (st != status::kOk) return st;
-    bool converged = true;
-    for (int32_t i = 0; i < count; ++i) {
-      converged = converged && beta * std::abs(P[(k - 1) + size_t(i) * k]) <=
-                                   kKrylovTolerance * s[0];
+      beta = Extend(Vq, vn, j + 1, wv.get(), b, scale, c.get(), c2.get(), 4 + 2 * uint64_t(j));
+      m = j + 1;
+      if (m < count) continue;
+      // B[0:m, 0:m] = P diag(s) Q^H, column-major with leading dimension m.
+      for (int32_t col = 0; col < m; ++col) {
+        std::memcpy(static_cast<void*>(Bw.get() + size_t(col) * m), B.get() + size_t(col) * k,
+                    static_cast<size_t>(m) * sizeof(T));
+      }
+      st = lapack::Gesdd('S', m, m, Bw.get(), m, s.get(), P.get(), m, Qh.get(), m);
+      if (st != status::kOk) return st;
+      converged = true;
+      for (int32_t i = 0; i < count; ++i) {
+        converged = converged &&
+                    beta * std::abs(P[(m - 1) + size_t(i) * m]) <= kKrylovTolerance * s[0];
+      }
     }
     const int32_t keep = converged ? count : std::min(k - 1, count + (k - count) / 2);
     if (!converged && restart >= kKrylovMaxRestarts) return status::kKrylovNoConvergence;
-    // V[:, 0:keep] = V Q[:, 0:keep] (row-major C = Q[:, 0:keep]: C[j][i] = conj(Qh[i][j])),
-    // the residual direction v_k moved next to them, U[:, 0:keep] = U P[:, 0:keep].
-    for (int32_t j = 0; j < k; ++j) {
-      for (int32_t i = 0; i < keep; ++i) {
-        C[size_t(j) * keep + i] = Conj(Qh[i + size_t(j) * k]);
-      }
+    // V[:, 0:keep] = V Q[:, 0:keep] (C[j][i] = conj(Qh[i][j]), column-major),
+    // U[:, 0:keep] = U P[:, 0:keep], and the residual direction v_m moved next
+    // to them.
+    for (int32_t i = 0; i < keep; ++i) {
+      for (int32_t j = 0; j < m; ++j) C[j + size_t(i) * m] = Conj(Qh[i + size_t(j) * m]);
     }
-    Rotate(Vb.get(), vn, ld, k, C.get(), keep, tmp.get());
-    for (int32_t j = 0; j < k; ++j) {
-      for (int32_t i = 0; i < keep; ++i) C[size_t(j) * keep + i] = P[j + size_t(i) * k];
-    }
-    Rotate(Ub.get(), un, k, k, C.get(), keep, tmp.get());
+    Rotate(Vq, vn, m, C.get(), keep, tmp.get());
+    Rotate(Uq, un, m, P.get(), keep, tmp.get());
     if (converged) break;
-    for (int32_t r = 0; r < vn; ++r) Vb[int64_t{r} * ld + keep] = Vb[int64_t{r} * ld + k];
+    std::memcpy(static_cast<void*>(Vq + int64_t{keep} * vn), Vq + int64_t{m} * vn,
+                static_cast<size_t>(vn) * sizeof(T));
     std::fill(B.get(), B.get() + kk, T(0.0));
     for (int32_t i = 0; i < keep; ++i) B[i + size_t(i) * k] = Make<T>(s[i], 0.0);
     kept = keep;
   }
 
   for (int32_t i = 0; i < count; ++i) S[i] = s[i];
-  // A's right vectors (Vb, vn rows) and left ones (Ub, un rows).
-  auto copy = [count](T* to, const T* from, int32_t n, int32_t stride) {
-    for (int32_t r = 0; r < n; ++r) {
-      std::memcpy(static_cast<void*>(to + int64_t{r} * count), from + int64_t{r} * stride,
-                  static_cast<size_t>(count) * sizeof(T));
+  // A's right vectors (Vq, vn rows) and left ones (Uq, un rows), row-major out.
+  auto copy = [count](T* to, const T* from, int32_t n) {
+    for (int32_t i = 0; i < count; ++i) {
+      const T* col = from + int64_t{i} * n;
+      for (int32_t r = 0; r < n; ++r) to[int64_t{r} * count + i] = col[r];
     }
   };
   if (flip) {
-    copy(V, Ub.get(), un, k);
-    if (U != nullptr) copy(U, Vb.get(), vn, ld);
+    copy(V, Uq, un);
+    if (U != nullptr) copy(U, Vq, vn);
   } else {
-    copy(V, Vb.get(), vn, ld);
-    if (U != nullptr) copy(U, Ub.get(), un, k);
+    copy(V, Vq, vn);
+    if (U != nullptr) copy(U, Uq, un);
   }
   return status::kOk;
 }

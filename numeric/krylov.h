@@ -32,11 +32,13 @@
 // rounding, for the triplets that stand clear of the next one.
 //
 // Method: Golub-Kahan-Lanczos bidiagonalization with full reorthogonalization
-// (classical Gram-Schmidt, twice) and thick restarts that keep the best Ritz
-// vectors, on a subspace of at most max(2 count + 8, count + 16) vectors,
-// started on the smaller side of H (on H^H when H is wide). It
-// stops when every wanted triplet has ||H^H u - s v|| <= kKrylovTolerance s_1
-// (H v = s u holds by construction), and gives up with
+// (classical Gram-Schmidt, a second pass when the first cancels much) and
+// thick restarts that keep the best Ritz vectors, on a subspace of at most
+// max(2 count + 8, count + 16) vectors, started on the smaller side of H (on
+// H^H when H is wide). The Ritz triplets are tested after every step from
+// `count` on; it stops as soon as every wanted triplet has
+// ||H^H u - s v|| <= kKrylovTolerance s_1 (H v = s u holds by construction),
+// and gives up with
 // status::kKrylovNoConvergence after kKrylovMaxRestarts restarts. Memory is
 // O((rows + cols) * subspace) plus the FFT buffers; nothing is shared between
 // calls but the FFT plans, so it is thread-safe. x is not screened.

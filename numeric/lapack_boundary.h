@@ -53,32 +53,30 @@ inline void Gemv(int32_t m, int32_t k, const Complex* A, const Complex* x, Compl
   cblas_zgemv(CblasRowMajor, CblasNoTrans, m, k, &one, A, k, x, 1, &zero, y, 1);
 }
 
-// Row-major C (m-by-n, ldc) = alpha op(A) B + beta C with leading dimensions:
-// op(A) is A (m-by-k, lda) or, with adjointA, the adjoint of A (k-by-m, lda);
-// B is k-by-n (ldb). For work on the columns of a wider array.
-inline void GemmLd(bool adjointA, int32_t m, int32_t n, int32_t k, double alpha, const double* A,
-                   int32_t lda, const double* B, int32_t ldb, double beta, double* C,
-                   int32_t ldc) {
-  cblas_dgemm(CblasRowMajor, adjointA ? CblasTrans : CblasNoTrans, CblasNoTrans, m, n, k, alpha,
-              A, lda, B, ldb, beta, C, ldc);
-}
-inline void GemmLd(bool adjointA, int32_t m, int32_t n, int32_t k, Complex alpha,
-                   const Complex* A, int32_t lda, const Complex* B, int32_t ldb, Complex beta,
-                   Complex* C, int32_t ldc) {
-  cblas_zgemm(CblasRowMajor, adjointA ? CblasConjTrans : CblasNoTrans, CblasNoTrans, m, n, k,
-              &alpha, A, lda, B, ldb, &beta, C, ldc);
-}
-// Row-major y = alpha op(A) x + beta y for the m-by-n A (lda): op(A) x has m
-// values, or n with adjointA.
-inline void GemvLd(bool adjointA, int32_t m, int32_t n, double alpha, const double* A,
-                   int32_t lda, const double* x, double beta, double* y) {
-  cblas_dgemv(CblasRowMajor, adjointA ? CblasTrans : CblasNoTrans, m, n, alpha, A, lda, x, 1,
+// Column-major y = alpha op(A) x + beta y for the m-by-n A (lda >= m): op(A) x
+// has m values, op(A)^H x (adjointA) n. For a basis kept as contiguous columns.
+inline void GemvCol(bool adjointA, int32_t m, int32_t n, double alpha, const double* A,
+                    int32_t lda, const double* x, double beta, double* y) {
+  cblas_dgemv(CblasColMajor, adjointA ? CblasTrans : CblasNoTrans, m, n, alpha, A, lda, x, 1,
               beta, y, 1);
 }
-inline void GemvLd(bool adjointA, int32_t m, int32_t n, Complex alpha, const Complex* A,
-                   int32_t lda, const Complex* x, Complex beta, Complex* y) {
-  cblas_zgemv(CblasRowMajor, adjointA ? CblasConjTrans : CblasNoTrans, m, n, &alpha, A, lda, x,
+inline void GemvCol(bool adjointA, int32_t m, int32_t n, Complex alpha, const Complex* A,
+                    int32_t lda, const Complex* x, Complex beta, Complex* y) {
+  cblas_zgemv(CblasColMajor, adjointA ? CblasConjTrans : CblasNoTrans, m, n, &alpha, A, lda, x,
               1, &beta, y, 1);
+}
+// Column-major C (m-by-n, ldc) = A (m-by-k, lda) B (k-by-n, ldb).
+inline void GemmCol(int32_t m, int32_t n, int32_t k, const double* A, int32_t lda,
+                    const double* B, int32_t ldb, double* C, int32_t ldc) {
+  cblas_dgemm(CblasColMajor, CblasNoTrans, CblasNoTrans, m, n, k, 1.0, A, lda, B, ldb, 0.0, C,
+              ldc);
+}
+inline void GemmCol(int32_t m, int32_t n, int32_t k, const Complex* A, int32_t lda,
+                    const Complex* B, int32_t ldb, Complex* C, int32_t ldc) {
+  const Complex one(1.0, 0.0);
+  const Complex zero(0.0, 0.0);
+  cblas_zgemm(CblasColMajor, CblasNoTrans, CblasNoTrans, m, n, k, &one, A, lda, B, ldb, &zero,
+              C, ldc);
 }
 // Euclidean norm of x (n values), without overflow or underflow on the way.
 inline double Nrm2(int32_t n, const double* x) { return cblas_dnrm2(n, x, 1); }

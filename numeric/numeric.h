@@ -16,6 +16,13 @@
                                     int32_t n, double* C);
 [[nodiscard]] StatusCode MatMulComplex(const Complex* A, const Complex* B, int32_t m, int32_t k,
                                        int32_t n, Complex* C);
+// C (m-by-n) = A^H B for A k-by-m and B k-by-n (the transpose for real data):
+// the Gram-type product of two tall blocks, with no transposed copy. k >= 0
+// (k = 0 gives zeros). C must not overlap A or B.
+[[nodiscard]] StatusCode AdjointMatMulReal(const double* A, const double* B, int32_t k, int32_t m,
+                                           int32_t n, double* C);
+[[nodiscard]] StatusCode AdjointMatMulComplex(const Complex* A, const Complex* B, int32_t k,
+                                              int32_t m, int32_t n, Complex* C);
 // Z (rows-by-k, row-major) = H V for the Hankel H[i][j] = x[i + cols - 1 - j]
 // (rows-by-cols, reading x[0 .. rows+cols-2]; the forward prediction block of
 // x, with rows past its last), V cols-by-k row-major. H is never formed whole.

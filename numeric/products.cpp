@@ -125,6 +125,29 @@ StatusCode MatMulComplex(const Complex* A, const Complex* B, int32_t m, int32_t 
   return MatMul<Complex>(A, B, m, k, n, C, false);
 }
 
+namespace {
+template <typename T>
+StatusCode AdjointMatMul(const T* A, const T* B, int32_t k, int32_t m, int32_t n, T* C) {
+  if (m < 0 || k < 0 || n < 0) return status::kNegativeDim;
+  if (m == 0 || n == 0) return status::kOk;
+  if (k == 0) {
+    std::fill(C, C + int64_t{m} * n, T(0.0));
+    return status::kOk;
+  }
+  lapack::Gemm(m, n, k, A, B, C, true);
+  return status::kOk;
+}
+}  // namespace
+
+StatusCode AdjointMatMulReal(const double* A, const double* B, int32_t k, int32_t m, int32_t n,
+                             double* C) {
+  return AdjointMatMul<double>(A, B, k, m, n, C);
+}
+StatusCode AdjointMatMulComplex(const Complex* A, const Complex* B, int32_t k, int32_t m,
+                                int32_t n, Complex* C) {
+  return AdjointMatMul<Complex>(A, B, k, m, n, C);
+}
+
 // ---- Hankel products -------------------------------------------------------------------
 // H is formed a block of rows at a time, each row a run of the reversed record:
 // H[i][j] = x[i + cols - 1 - j] = reversed[rows - 1 - i + j].
