@@ -165,6 +165,23 @@ void Scatter(T* v, int64_t stride, int32_t n, uint64_t seed) {
   }
 }
 
+// ||w||: the square root of w^H w, which streams w once at full speed, or the
+// BLAS's scaled norm when the sum of squares leaves the safe range.
+template <typename T>
+double Norm(int32_t dim, const T* w) {
+  double part[4] = {0.0, 0.0, 0.0, 0.0};  // four chains keep the adds in flight
+  int32_t i = 0;
+  for (; i + 4 <= dim; i += 4) {
+    for (int32_t l = 0; l < 4; ++l) {
+      part[l] += Real(w[i + l]) * Real(w[i + l]) + Imag(w[i + l]) * Imag(w[i + l]);
+    }
+  }
+  for (; i < dim; ++i) part[0] += Real(w[i]) * Real(w[i]) + Imag(w[i]) * Imag(w[i]);
+  const double sum = (part[0] + part[1]) + (part[2] + part[3]);
+  if (sum > 0x1p-900 && sum < 0x1p900) return std::sqrt(sum);
+  return lapack::Nrm2(dim, w);
+}
+
 // w minus its projection on the first `count` columns of the column-major
 // basis Q (dim rows, contiguous columns) by classical Gram-Schmidt, repeated
 // once when the first pass cancelled more than 1 - 1/sqrt(2) of w's norm
@@ -176,12 +193,12 @@ double Orthogonalize(const T* Q, int32_t dim, int32_t count, T* w, double norm, 
   const T one = Make<T>(1.0, 0.0), zero = Make<T>(0.0, 0.0), minus = Make<T>(-1.0, 0.0);
   lapack::GemvCol(true, dim, count, one, Q, dim, w, zero, c);
   lapack::GemvCol(false, dim, count, minus, Q, dim, c, one, w);
-  const double left = lapack::Nrm2(dim, w);
+  const double left = Norm(dim, w);
   if (left > 0.7071067811865476 * norm) return left;
   lapack::GemvCol(true, dim, count, one, Q, dim, w, zero, c2);
   lapack::GemvCol(false, dim, count, minus, Q, dim, c2, one, w);
   for (int32_t i = 0; i < count; ++i) c[i] += c2[i];
-  return lapack::Nrm2(dim, w);
+  return Norm(dim, w);
 }
 
 // Column `col` of the basis = w / norm, or, when w has vanished (the Krylov
@@ -194,7 +211,7 @@ double Extend(T* Q, int32_t dim, int32_t col, T* w, double norm, double scale, T
   double kept = norm;
   for (int attempt = 0; !(norm > kBreakdown * scale) && attempt < 3; ++attempt) {
     Scatter(w, 1, dim, seed + 7919u * static_cast<uint64_t>(attempt + 1));
-    norm = Orthogonalize(Q, dim, col, w, lapack::Nrm2(dim, w), c, c2);
+    norm = Orthogonalize(Q, dim, col, w, Norm(dim, w), c, c2);
     kept = 0.0;
   }
   const double inv = norm > 0.0 ? 1.0 / norm : 0.0;
@@ -262,7 +279,7 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
 
   Scatter(wv.get(), 1, vn, 1);
   double scale = 0.0;  // largest norm met so far, a lower bound of s_1
-  (void)Extend(Vq, vn, 0, wv.get(), lapack::Nrm2(vn, wv.get()), 1.0, c.get(), c2.get(), 2);
+  (void)Extend(Vq, vn, 0, wv.get(), Norm(vn, wv.get()), 1.0, c.get(), c2.get(), 2);
   int32_t kept = 0;
   double beta = 0.0;
   for (int32_t restart = 0;; ++restart) {
@@ -276,7 +293,7 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
       // u_j = A v_j minus its components along u_0 .. u_{j-1}: column j of B.
       st = Product(h, Vq + int64_t{j} * vn, 1, wu.get(), 1, flip);
       if (st != status::kOk) return st;
-      const double au = lapack::Nrm2(un, wu.get());
+      const double au = Norm(un, wu.get());
       scale = std::max(scale, au);
       const double alpha = Orthogonalize(Uq, un, j, wu.get(), au, c.get(), c2.get());
       for (int32_t i = 0; i < j; ++i) B[i + size_t(j) * k] = c[i];
@@ -285,7 +302,7 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
       // v_{j+1} = A^H u_j minus its components along v_0 .. v_j.
       st = Product(h, Uq + int64_t{j} * un, 1, wv.get(), 1, !flip);
       if (st != status::kOk) return st;
-      const double b = Orthogonalize(Vq, vn, j + 1, wv.get(), lapack::Nrm2(vn, wv.get()),
+      const double b = Orthogonalize(Vq, vn, j + 1, wv.get(), Norm(vn, wv.get()),
                                      c.get(), c2.get());
       scale = std::max(scale, b);
       beta = Extend(Vq, vn, j + 1, wv.get(), b, scale, c.get(), c2.get(), 4 + 2 * uint64_t(j));
