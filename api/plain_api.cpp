@@ -239,10 +239,11 @@ double PencilWork(int32_t n, int32_t L, size_t element) {
   return static_cast<double>(element) * (8.0 * double(n - L) * L + 8.0 * n);
 }
 // The Krylov route holds two Lanczos bases of at most max(2M + 8, M + 16)
-// vectors (n values between them), the FFT buffers and Z = H V (n by M).
+// vectors (n values between them), the FFT buffers and the M triplets (n
+// values each between left and right).
 double PencilKrylovWork(int32_t n, int32_t M, size_t element) {
   const double k = std::max(2.0 * M + 8.0, M + 16.0);
-  return static_cast<double>(element) * (k + 1.0 + 2.0 * M) * n + kCx * 6.0 * n;
+  return static_cast<double>(element) * (k + 1.0 + M) * n + kCx * 6.0 * n;
 }
 double SpectrumWork(int32_t length) { return 48.0 * length; }
 

@@ -28,8 +28,11 @@
 // multiply-adds anywhere, so every variant gives bit-identical results. Not
 // on Windows: GCC there does not align the stack for 32-byte spills. Not with
 // clang (the fuzzing build): it ignores the pragma regions, and clang 14 names
-// the target_clones resolvers of C++ functions apart from their callers.
-#if defined(__GNUC__) && !defined(__clang__) && defined(__x86_64__) && defined(__ELF__)
+// the target_clones resolvers of C++ functions apart from their callers. Not
+// under ThreadSanitizer: in an executable linked with the kernels the loader
+// runs the resolvers, instrumented, before the sanitizer's run-time is up.
+#if defined(__GNUC__) && !defined(__clang__) && defined(__x86_64__) && defined(__ELF__) && \
+    !defined(__SANITIZE_THREAD__)
 #define FFTK_WIDE 1
 #define FFTK_CLONES __attribute__((target_clones("avx", "default")))
 #else

@@ -312,9 +312,11 @@ StatusCode FoldQr(const Rows& rows, int32_t m, int32_t n, int32_t nrhs, T* R, T*
 constexpr int32_t kTileRows = 64;
 
 // The tile kernels run in 32-byte vectors of four rows. On x86-64 ELF targets
-// with GCC they are also built for AVX and picked by the loader; without fused
-// multiply-adds both variants give the same bits.
-#if defined(__GNUC__) && !defined(__clang__) && defined(__x86_64__) && defined(__ELF__)
+// with GCC they are also built for AVX and picked by the loader (not under
+// ThreadSanitizer, whose run-time is not up when the loader runs the
+// resolvers); without fused multiply-adds both variants give the same bits.
+#if defined(__GNUC__) && !defined(__clang__) && defined(__x86_64__) && defined(__ELF__) && \
+    !defined(__SANITIZE_THREAD__)
 #define QDM_TILE_CLONES __attribute__((target_clones("avx", "default")))
 #else
 #define QDM_TILE_CLONES

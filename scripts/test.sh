@@ -51,8 +51,9 @@ suite release -DCMAKE_BUILD_TYPE=Release || failed=1
 tsan() {
   cmake -S . -B build/tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_TSAN=ON -DQDM_BLAS=reference \
     -DQDM_BUILD_EXAMPLE=OFF "${launcher[@]}" >/dev/null || return 1
-  cmake --build build/tsan -j"$jobs" --target e2e_concurrency >/dev/null || return 1
-  TSAN_OPTIONS="halt_on_error=1 suppressions=$PWD/tests/tsan.supp" ctest --test-dir build/tsan -R '^e2e\.Concurrency' \
+  cmake --build build/tsan -j"$jobs" --target e2e_concurrency api_plain_threads >/dev/null || return 1
+  TSAN_OPTIONS="halt_on_error=1 suppressions=$PWD/tests/tsan.supp" ctest --test-dir build/tsan \
+    -R '^(e2e\.Concurrency|api\.PlainThreads)' \
     --output-on-failure --timeout 900 | tail -n 3
 }
 # The fuzzer: every corpus and regression input once, then a minute of fuzzing

@@ -16,3 +16,17 @@ if(TARGET qdm_api)
   gtest_discover_tests(api_plain_vs_host DISCOVERY_MODE PRE_TEST TEST_PREFIX "api."
                        DISCOVERY_TIMEOUT 120)
 endif()
+
+# The plain face from many threads at once (also built alone for the
+# ThreadSanitizer run).
+if(TARGET qdm_api)
+  add_executable(api_plain_threads ${CMAKE_SOURCE_DIR}/tests/api/plain_threads.cpp
+                 $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})
+  target_include_directories(api_plain_threads PRIVATE ${CMAKE_SOURCE_DIR}
+                             ${CMAKE_SOURCE_DIR}/include ${QDM_GENERATED_INCLUDE})
+  target_compile_definitions(api_plain_threads PRIVATE QDM_BUILDING_API)
+  target_link_libraries(api_plain_threads PRIVATE ${QDM_LINALG_LIBS} GTest::gtest_main
+                        Threads::Threads ${CMAKE_DL_LIBS})
+  gtest_discover_tests(api_plain_threads DISCOVERY_MODE PRE_TEST TEST_PREFIX "api."
+                       DISCOVERY_TIMEOUT 120)
+endif()

@@ -5,7 +5,8 @@
 //   face (1 byte: even the host face, odd the plain C API), export (1 byte),
 //   flags (1 byte: bit 0 the real-signal flag, bit 1 fail a work allocation,
 //   bit 2 from then on, bit 3 fail a host resize, bit 4 make a LAPACK call
-//   report INFO (plain face), bit 5 its sign), the three integer arguments
+//   report INFO (plain face), bit 5 its sign, bit 6 the pencil's Krylov route
+//   (plain face)), the three integer arguments
 //   (each a selector byte, maybe four more), n (2 bytes, up to 256), the
 //   sampling rate, the fault position (2 bytes), then the n data values (two per
 //   complex element). A value is a selector byte, maybe followed by its bits:
@@ -96,6 +97,7 @@ const QdmApi& HostApi() {
 void PlainFace(const Export& x, const Scalars& s, const double* data, uint8_t flags,
                uint16_t faultAt) {
   PlainCall clean, faulted;
+  clean.solver = faulted.solver = (flags & 64) ? QDM_SOLVER_KRYLOV : QDM_SOLVER_AUTO;
   const int32_t cleanStatus = CallPlain(x, data, s, clean);
   Require(kPlainStatuses.count(cleanStatus) != 0, "undocumented plain status", x, cleanStatus);
   Require(NumAllocOutstanding() == 0, "work memory left allocated", x, cleanStatus);

@@ -16,6 +16,7 @@ struct PlainCall {
   std::vector<double> out[4];
   double d[3] = {kStale, kStale, kStale};
   int32_t count = kStaleOrder;
+  int32_t solver = QDM_SOLVER_AUTO;  // the pencil's route
 };
 
 inline qdm_complex* Cx(std::vector<double>& v) { return reinterpret_cast<qdm_complex*>(v.data()); }
@@ -39,10 +40,10 @@ inline int32_t CallPlain(const Export& e, const double* data, const Scalars& sc,
                 Cx(c.out[0]), c.d),
       QDM_PLAIN("QdmRePCARH", qdm_pcar_real, x, s.n, s.a, s.b, c.out[1].data(), Cx(c.out[0])),
       QDM_PLAIN("QdmCxPCARH", qdm_pcar_complex, Cx(x), s.n, s.a, s.b, Cx(c.out[1]), Cx(c.out[0])),
-      QDM_PLAIN("QdmReMatrixPencilH", qdm_matrix_pencil_real, x, s.n, s.a, s.b, s.fs, 1, QDM_O4,
-                &c.count, c.d),
-      QDM_PLAIN("QdmCxMatrixPencilH", qdm_matrix_pencil_complex, Cx(x), s.n, s.a, s.b, s.fs, QDM_O4,
-                &c.count, c.d),
+      QDM_PLAIN("QdmReMatrixPencilH", qdm_matrix_pencil_solver_real, x, s.n, s.a, s.b, s.fs, 1,
+                c.solver, QDM_O4, &c.count, c.d),
+      QDM_PLAIN("QdmCxMatrixPencilH", qdm_matrix_pencil_solver_complex, Cx(x), s.n, s.a, s.b, s.fs,
+                c.solver, QDM_O4, &c.count, c.d),
       QDM_PLAIN("QdmReMinDescriptLenH", qdm_mdl_order_real, x, s.n, s.a, s.b, &c.count),
       QDM_PLAIN("QdmCxMinDescriptLenH", qdm_mdl_order_complex, Cx(x), s.n, s.a, s.b, &c.count),
       QDM_PLAIN("QdmReCovPowerSpectrH", qdm_covariance_psd_real, x, s.n, s.a, s.b, s.fs,
