@@ -112,14 +112,20 @@ StatusCode Product(HankelFft& h, const T* in, int64_t is, T* out, int64_t os, bo
   Complex* a = h.a.get();
   Complex* b = h.b.get();
   const int32_t count = adjoint ? h.rows : h.cols;
-  std::fill(a, a + h.N, Complex(0.0, 0.0));
   for (int32_t j = 0; j < count; ++j) a[j] = Complex(Real(in[j * is]), Imag(in[j * is]));
+  std::fill(a + count, a + h.N, Complex(0.0, 0.0));
   StatusCode st = Dft(h, a, b);
   if (st != status::kOk) return st;
-  if (adjoint) {
-    for (int32_t f = 0; f < h.N; ++f) a[f] = b[f] * std::conj(h.X[f]);
-  } else {
-    for (int32_t f = 0; f < h.N; ++f) a[f] = std::conj(b[f] * h.X[f]);
+  // The spectral step in plain arithmetic (std::complex's product checks for
+  // NaN parts element by element), on interleaved doubles.
+  const double* B = reinterpret_cast<const double*>(b);
+  const double* X = reinterpret_cast<const double*>(h.X.get());
+  double* A = reinterpret_cast<double*>(a);
+  const double sign = adjoint ? 1.0 : -1.0;  // B conj(X), or conj(B X)
+  for (int64_t f = 0; f < 2 * int64_t{h.N}; f += 2) {
+    const double br = B[f], bi = B[f + 1], xr = X[f], xi = X[f + 1];
+    A[f] = br * xr + sign * (bi * xi);
+    A[f + 1] = sign * (bi * xr) - br * xi;
   }
   st = Dft(h, a, b);
   if (st != status::kOk) return st;
