@@ -142,15 +142,10 @@ StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K,
     if (st != status::kOk) return st;
   }
 
-  if (r >= M) {
-    // Leading M x M block, row stride M.
-    std::memcpy(static_cast<void*>(K), full.get(),
-                static_cast<size_t>(M) * static_cast<size_t>(M) * sizeof(T));
-  } else {
-    // Fewer components than modes: the whole r x r matrix, row stride r.
-    std::memcpy(static_cast<void*>(K), full.get(),
-                static_cast<size_t>(r) * static_cast<size_t>(r) * sizeof(T));
-  }
+  // The leading M x M block, or with fewer components than modes the whole
+  // r x r matrix: mr x mr either way, row stride mr.
+  std::memcpy(static_cast<void*>(K), full.get(),
+              static_cast<size_t>(mr) * static_cast<size_t>(mr) * sizeof(T));
   return status::kOk;
 }
 

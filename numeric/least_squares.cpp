@@ -107,7 +107,7 @@ template <typename T>
 StatusCode FormPinv(Factors<T>& f, int32_t m, int32_t n, int32_t k, T* P) {
   const StatusCode st = AdjointInPlace(f.U, m, k);
   if (st != status::kOk) return st;
-  return MatMul<T>(f.V, f.U, n, k, m, P, false);
+  return MatMul<T>(f.V, f.U, n, k, m, P);
 }
 
 template <typename T>

@@ -4,9 +4,8 @@
 template <typename T>
 void TransposeTo(const T* A, int32_t m, int32_t n, T* out, bool conjugate);
 
-// The common worker behind MatMulReal and MatMulComplex. With copyInputs set, A
-// and B are copied to scratch and the product is formed in scratch before it is
-// copied to C, so that C may alias A or B. Instantiated for double and Complex.
+// The common worker behind MatMulReal and MatMulComplex: C (m-by-n) = A B, C
+// not overlapping A or B. Instantiated for double and Complex.
 #pragma once
 
 #include <cstdint>
@@ -14,5 +13,4 @@ void TransposeTo(const T* A, int32_t m, int32_t n, T* out, bool conjugate);
 #include "core/types.h"
 
 template <typename T>
-[[nodiscard]] StatusCode MatMul(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C,
-                                bool copyInputs);
+[[nodiscard]] StatusCode MatMul(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C);

@@ -80,49 +80,32 @@ void GemmInto(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C) {
 // ---- products ----------------------------------------------------------------------
 
 template <typename T>
-StatusCode MatMul(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C,
-                  bool copyInputs) {
+StatusCode MatMul(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C) {
   if (m < 0 || k < 0 || n < 0) return status::kNegativeDim;
   if (m == 0 || n == 0) return status::kOk;
-  const int64_t mn = int64_t{m} * n;
   if (k == 0) {
     // A product over an empty inner dimension is reported as NaN, not zeros.
-    FillQuietNaN(C, mn);
+    FillQuietNaN(C, int64_t{m} * n);
     return status::kOk;
   }
-  if (!copyInputs) {
-    // beta = 0: the BLAS writes every element of C without reading it.
-    GemmInto(A, B, m, k, n, C);
-    return status::kOk;
-  }
-  const int64_t mk = int64_t{m} * k;
-  const int64_t kn = int64_t{k} * n;
-  WorkArray<T> a_copy = AllocWorkUninit<T>(static_cast<size_t>(mk));
-  if (!a_copy) return status::kNoMemory;
-  WorkArray<T> b_copy = AllocWorkUninit<T>(static_cast<size_t>(kn));
-  if (!b_copy) return status::kNoMemory;
-  WorkArray<T> product = AllocWorkUninit<T>(static_cast<size_t>(mn));
-  if (!product) return status::kNoMemory;
-  std::memcpy(static_cast<void*>(a_copy.get()), A, static_cast<size_t>(mk) * sizeof(T));
-  std::memcpy(static_cast<void*>(b_copy.get()), B, static_cast<size_t>(kn) * sizeof(T));
-  GemmInto(a_copy.get(), b_copy.get(), m, k, n, product.get());
-  std::memcpy(static_cast<void*>(C), product.get(), static_cast<size_t>(mn) * sizeof(T));
+  // beta = 0: the BLAS writes every element of C without reading it.
+  GemmInto(A, B, m, k, n, C);
   return status::kOk;
 }
 
 template StatusCode MatMul<double>(const double*, const double*, int32_t, int32_t, int32_t,
-                                   double*, bool);
+                                   double*);
 template StatusCode MatMul<Complex>(const Complex*, const Complex*, int32_t, int32_t, int32_t,
-                                    Complex*, bool);
+                                    Complex*);
 
 StatusCode MatMulReal(const double* A, const double* B, int32_t m, int32_t k, int32_t n,
                       double* C) {
-  return MatMul<double>(A, B, m, k, n, C, false);
+  return MatMul<double>(A, B, m, k, n, C);
 }
 
 StatusCode MatMulComplex(const Complex* A, const Complex* B, int32_t m, int32_t k, int32_t n,
                          Complex* C) {
-  return MatMul<Complex>(A, B, m, k, n, C, false);
+  return MatMul<Complex>(A, B, m, k, n, C);
 }
 
 namespace {

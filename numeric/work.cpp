@@ -34,9 +34,8 @@ std::atomic<int64_t> g_outstanding{0};
 // than 64 bytes.
 //
 // Layout: [front guard | block | back guard]. The 16 bytes just before the
-// block hold the front guard's length and the block's, for NumFree and
-// NumRealloc; the rest of both guards is zeroed, so what a kernel reads there
-// is always the same.
+// block hold the front guard's length and the block's, for NumFree; the rest
+// of both guards is zeroed, so what a kernel reads there is always the same.
 constexpr size_t kElement = 16;
 constexpr size_t kMinGuard = 64;
 
@@ -112,27 +111,6 @@ StatusCode NumFree(void* ptr) {
   return status::kOk;
 }
 
-// A new guarded block and a copy: the guards' lengths change with the size, so
-// growing in place would move the block within its allocation anyway.
-StatusCode NumRealloc(void** slot, size_t bytes) {
-  void* old = *slot;
-  void* p = InjectFailure() ? nullptr : GuardedAlloc(bytes);
-  if (p == nullptr) {
-    (void)NumFree(old);
-    *slot = nullptr;
-    call_record::Note(status::kNoMemory);
-    return status::kNoMemory;
-  }
-  if (old == nullptr) {
-    g_outstanding.fetch_add(1, std::memory_order_relaxed);
-  } else {
-    const size_t kept = HeaderOf(old).bytes;
-    std::memcpy(p, old, kept < bytes ? kept : bytes);
-    GuardedFree(old);
-  }
-  *slot = p;
-  return status::kOk;
-}
 
 void NumAllocFailAt(int64_t k, bool persistent) {
   g_fail_persistent.store(persistent, std::memory_order_relaxed);

@@ -13,11 +13,8 @@
 
 // Allocates `bytes` uninitialised bytes into *slot (null on failure).
 [[nodiscard]] StatusCode NumAlloc(void** slot, size_t bytes);
-// Releases a block from NumAlloc/NumRealloc; null is allowed. Always 0.
+// Releases a block from NumAlloc; null is allowed. Always 0.
 StatusCode NumFree(void* ptr);
-// Resizes *slot to `bytes`. On failure the old block is released, *slot is
-// null and the result is kNoMemory.
-[[nodiscard]] StatusCode NumRealloc(void** slot, size_t bytes);
 
 // ---- fault injection and accounting, for tests ------------------------------
 // Makes the k-th allocation from now (k >= 1) fail; with `persistent` every
