@@ -41,14 +41,4 @@ TEST(Bounds, PredictionBlocksAndRootSelectionWriteExactlyTheirCells) {
   }
 }
 
-// Modes 0, 1 and 2 window the coefficients; outside 0..3 the evaluator refuses.
-TEST(Bounds, EveryWindowModeIsAccepted) {
-  for (int32_t mode = -1; mode <= 4; ++mode) {
-    std::vector<double> a = {1.0, -0.5, 0.25}, values(8);
-    SpectrumResult r{0, 0, values.data()};
-    const StatusCode st = ArSpectrumReal(a.data(), 3, 1, 1.0, 8, mode, &r);
-    EXPECT_EQ(st == 0, mode >= 0 && mode <= 3) << mode;
-  }
-}
-
 }  // namespace
