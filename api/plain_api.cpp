@@ -245,6 +245,14 @@ double PencilKrylovWork(int32_t n, int32_t M, size_t element) {
   const double k = std::max(2.0 * M + 8.0, M + 16.0);
   return static_cast<double>(element) * (k + 1.0 + M) * n + kCx * 6.0 * n;
 }
+// PCAR's Krylov route: two Lanczos bases of at most max(2k + 10, k + 17)
+// vectors and the k + 1 triplets over the 2(n - p) + p sides of the
+// forward-backward matrix, the FFT buffers, and the fit's vectors.
+double PcarKrylovWork(int32_t n, int32_t p, int32_t k, size_t element) {
+  const double m = std::max(2.0 * k + 10.0, k + 17.0);
+  const double sides = 2.0 * double(n - p) + p;
+  return static_cast<double>(element) * ((m + k + 2.0) * sides + 8.0 * n) + kCx * 6.0 * n;
+}
 double SpectrumWork(int32_t length) { return 48.0 * length; }
 
 const Complex* AsComplex(const qdm_complex* x) { return reinterpret_cast<const Complex*>(x); }
@@ -276,19 +284,31 @@ int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles,
       });
 }
 
+// PCAR on either route; the automatic choice also sets the work estimate.
 template <typename T>
-int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, T* a, qdm_complex* roots) {
+int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t solver, T* a,
+             qdm_complex* roots) {
   constexpr bool cx = std::is_same_v<T, Complex>;
-  const StatusCode check = checks::Pcar(n, order, components, kWide);
+  StatusCode check = checks::Pcar(n, order, components, kWide);
+  if (check == status::kOk && (solver < QDM_SOLVER_AUTO || solver > QDM_SOLVER_KRYLOV)) {
+    check = kBadSolver;
+  }
   const size_t e = cx ? kCx : kReal;
   const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check, {x, n, cx}, {a, roots}, LinearPredictionWork(n, p, e, 8), nullptr,
+  const int32_t k = check == status::kOk ? components : 0;
+  PcarSolver route = static_cast<PcarSolver>(check == status::kOk ? solver : 0);
+  if (route == PcarSolver::kAuto) {
+    route = PcarPrefersKrylov(n, p, k, cx) ? PcarSolver::kKrylov : PcarSolver::kDense;
+  }
+  const double work = route == PcarSolver::kKrylov ? PcarKrylovWork(n, p, k, e)
+                                                   : LinearPredictionWork(n, p, e, 8);
+  return RunPlain({check, {x, n, cx}, {a, roots}, work, nullptr,
                    {{a, Bytes(p + int64_t{1}, e)}, {roots, Bytes(p, kCx)}}, {}, nullptr},
                   [&](const void* xs) {
                     if constexpr (cx) {
-                      return PcarEstimateComplex(As<T>(xs), n, p, components, a, AsComplex(roots));
+                      return PcarSolverComplex(As<T>(xs), n, p, k, route, a, AsComplex(roots));
                     } else {
-                      return PcarEstimateReal(As<T>(xs), n, p, components, a, AsComplex(roots));
+                      return PcarSolverReal(As<T>(xs), n, p, k, route, a, AsComplex(roots));
                     }
                   });
 }
@@ -399,13 +419,26 @@ QDM_PLAIN_API int32_t qdm_covariance_complex(const qdm_complex* x, int32_t n, in
 QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order,
                                     int32_t components, double* coefficients,
                                     qdm_complex* roots) {
-  return Pcar(x, n, order, components, coefficients, roots);
+  return Pcar(x, n, order, components, QDM_SOLVER_AUTO, coefficients, roots);
 }
 
 QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t order,
                                        int32_t components, qdm_complex* coefficients,
                                        qdm_complex* roots) {
-  return Pcar(AsComplex(x), n, order, components, AsComplex(coefficients), roots);
+  return Pcar(AsComplex(x), n, order, components, QDM_SOLVER_AUTO, AsComplex(coefficients),
+              roots);
+}
+
+QDM_PLAIN_API int32_t qdm_pcar_solver_real(const double* x, int32_t n, int32_t order,
+                                           int32_t components, int32_t solver,
+                                           double* coefficients, qdm_complex* roots) {
+  return Pcar(x, n, order, components, solver, coefficients, roots);
+}
+
+QDM_PLAIN_API int32_t qdm_pcar_solver_complex(const qdm_complex* x, int32_t n, int32_t order,
+                                              int32_t components, int32_t solver,
+                                              qdm_complex* coefficients, qdm_complex* roots) {
+  return Pcar(AsComplex(x), n, order, components, solver, AsComplex(coefficients), roots);
 }
 
 // ---- Prony --------------------------------------------------------------------------------

@@ -201,7 +201,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     if (kIntOptions[i].methods & Bit(m)) par[kIntOptions[i].key] = resolved[i];
   if (m != kMdl) par["rate_hz"] = rate;
   if ((kModal & Bit(m)) && !s.complex) par["real_signal"] = flag;
-  if (m == kPencil) par["solver"] = o.solver;
+  if (m == kPencil || m == kPcar) par["solver"] = o.solver;
   // Outputs are sized from parameters the library accepts (orders below n) and,
   // for a spectrum, from the library's own length for the points asked.
   const size_t room = std::clamp(std::max({p, k, M}), 1, std::max(n, 1)) + 1;
@@ -212,7 +212,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   int32_t count = 0, order = 0;
   switch (m) {
     case kCovariance: QDM_TWIN(qdm_covariance, n, p, a, z, &variance); break;
-    case kPcar: QDM_TWIN(qdm_pcar, n, p, k, a, z); break;
+    case kPcar: QDM_TWIN(qdm_pcar_solver, n, p, k, SolverOf(o), a, z); break;
     case kMdl: QDM_TWIN(qdm_mdl_order, n, upper, minOrder, &order); break;
     case kCovSpectrum:
       QDM_TWIN(qdm_covariance_psd, n, p, points, rate, db.get(), &f0, &df, &variance);
@@ -621,10 +621,10 @@ int Main(int argc, char** argv) {
         ->check(kNonEmpty)
         ->group(m == kMdl ? kIgnored : "Parameters");
     sub->add_option("--solver", o.solver,
-                    "how the pencil finds its singular triplets: auto, dense, or krylov (Lanczos "
-                    "over FFT products, for long records) [auto]")
+                    "how the pencil or pcar finds its singular triplets: auto, dense, or krylov "
+                    "(Lanczos over FFT products, for long records) [auto]")
         ->check(CLI::IsMember({"auto", "dense", "krylov"}))
-        ->group(m == kPencil ? "Parameters" : kIgnored);
+        ->group(m == kPencil || m == kPcar ? "Parameters" : kIgnored);
     sub->add_flag("--real-signal", o.realSignal,
                   "real data: one mode per conjugate pair, at its non-negative frequency")
         ->group(kModal & bit ? "Parameters" : kIgnored);

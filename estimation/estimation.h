@@ -55,6 +55,23 @@ StatusCode ModeParameters(const Complex* A, int32_t kA, const Complex* z, int32_
                                           double* a, Complex* roots);
 [[nodiscard]] StatusCode PcarEstimateComplex(const Complex* x, int32_t n, int32_t p, int32_t k,
                                              Complex* a, Complex* roots);
+// The route of the truncated solve, as the pencil's (PencilSolver below):
+// kDense forms the 2q x p forward-backward matrix and takes its SVD (the
+// fit above); kKrylov forms neither and takes its k + 1 leading triplets by
+// Lanczos over FFT products (numeric/krylov.h), for long records and large
+// orders: the same coefficients to rounding wherever the k-th singular value
+// stands clear of the next. kAuto takes whichever PcarPrefersKrylov says is
+// cheaper.
+enum class PencilSolver : int32_t;
+using PcarSolver = PencilSolver;
+// True when the Krylov route's estimated time is under half the dense one's
+// and k is at most p/4 (where the dense route stays, its numbers are the
+// reference).
+bool PcarPrefersKrylov(int32_t n, int32_t p, int32_t k, bool complex);
+[[nodiscard]] StatusCode PcarSolverReal(const double* x, int32_t n, int32_t p, int32_t k,
+                                        PcarSolver solver, double* a, Complex* roots);
+[[nodiscard]] StatusCode PcarSolverComplex(const Complex* x, int32_t n, int32_t p, int32_t k,
+                                           PcarSolver solver, Complex* a, Complex* roots);
 [[nodiscard]] StatusCode PcarThresholdReal(const double* A, int32_t rows, int32_t cols, int32_t k,
                                            double* tau);
 [[nodiscard]] StatusCode PcarThresholdComplex(const Complex* A, int32_t rows, int32_t cols,

@@ -119,6 +119,18 @@ inline StatusCode HankelSvdLeading(const Complex* x, int32_t rows, int32_t cols,
                                    double* S, Complex* U, Complex* V) {
   return HankelSvdLeadingComplex(x, rows, cols, count, S, U, V);
 }
+// The forward-backward matrix's leading triplets (numeric/krylov.h).
+inline StatusCode ForwardBackwardSvdLeading(const double* x, int32_t n, int32_t p, int32_t count,
+                                            double* S, double* U, double* V) {
+  return ForwardBackwardSvdLeadingReal(x, n, p, count, S, U, V);
+}
+inline StatusCode ForwardBackwardSvdLeading(const Complex* x, int32_t n, int32_t p,
+                                            int32_t count, double* S, Complex* U, Complex* V) {
+  return ForwardBackwardSvdLeadingComplex(x, n, p, count, S, U, V);
+}
+// Non-zero when any value is a NaN or an infinity.
+inline bool HasNonFinite(const double* x, int64_t n) { return HasNonFiniteReal(x, n) != 0; }
+inline bool HasNonFinite(const Complex* x, int64_t n) { return HasNonFiniteComplex(x, n) != 0; }
 inline StatusCode HankelProductFft(const double* x, int32_t rows, int32_t cols, const double* V,
                                    int32_t k, double* Z) {
   return HankelProductFftReal(x, rows, cols, V, k, Z);

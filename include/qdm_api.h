@@ -146,6 +146,8 @@ QDM_PLAIN_API int32_t qdm_covariance_complex(const qdm_complex* x, int32_t n, in
  * Forward-backward linear prediction (the backward equations conjugated for
  * complex data), solved through the pseudo-inverse truncated to the
  * `components` strongest singular components of the 2(n - p)-by-p data matrix.
+ * The singular triplets come by the route ::QDM_SOLVER_AUTO picks (see
+ * qdm_pcar_solver_real()).
  * @param x             n samples
  * @param n             number of samples, >= 1
  * @param order         model order p, 0 <= p <= floor(2n/3)
@@ -157,7 +159,7 @@ QDM_PLAIN_API int32_t qdm_covariance_complex(const qdm_complex* x, int32_t n, in
  *   (components > order), ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT,
  *   ::QDM_ERR_NON_FINITE, ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE,
  *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL, ::QDM_ERR_ROOT_NAN,
- *   ::QDM_ERR_NON_FINITE_RESULT.
+ *   ::QDM_ERR_NON_FINITE_RESULT, ::QDM_ERR_KRYLOV_NO_CONVERGENCE.
  * @{ */
 QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order,
                                     int32_t components, double* coefficients,
@@ -165,6 +167,29 @@ QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order,
 QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t order,
                                        int32_t components, qdm_complex* coefficients,
                                        qdm_complex* roots);
+
+/** Principal-component AR with the route chosen by the caller: the same
+ *  arguments and results as qdm_pcar_real() / qdm_pcar_complex(), with
+ *  `solver` one of ::qdm_solver (else ::QDM_ERR_SOLVER, checked after the
+ *  arguments above). ::QDM_SOLVER_DENSE forms the data matrix and takes its
+ *  SVD: O(n p^2) time, O(n p) memory (the host face's route).
+ *  ::QDM_SOLVER_KRYLOV forms neither and takes the k + 1 leading singular
+ *  triplets (k = `components`) by Lanczos over FFT products with the record,
+ *  O(n log n) per product and O(n k) memory: the same coefficients and roots
+ *  to rounding wherever the k-th singular value stands clear of the next and
+ *  of rounding noise, with the same rank decision (values above the midpoint
+ *  of the k-th and the next). ::QDM_SOLVER_AUTO takes the Krylov route only
+ *  for long records at large orders with k small beside p (at most p/4),
+ *  where its estimated time is under half the dense one's. The roots of the
+ *  degree-p polynomial cost the same on both routes. The work-memory bound
+ *  applies to the route taken. Besides their statuses, ::QDM_ERR_SOLVER and
+ *  ::QDM_ERR_KRYLOV_NO_CONVERGENCE. */
+QDM_PLAIN_API int32_t qdm_pcar_solver_real(const double* x, int32_t n, int32_t order,
+                                           int32_t components, int32_t solver,
+                                           double* coefficients, qdm_complex* roots);
+QDM_PLAIN_API int32_t qdm_pcar_solver_complex(const qdm_complex* x, int32_t n, int32_t order,
+                                              int32_t components, int32_t solver,
+                                              qdm_complex* coefficients, qdm_complex* roots);
 /** @} */
 
 /* ---------------------------------------------------------------------------- */
@@ -227,7 +252,8 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_complex(const qdm_complex* x, int32_t n,
                                                 double* frequency, int32_t* modes, double* mse);
 
 /** How the matrix pencil finds the leading singular triplets of its
- *  (n - L)-by-L data matrix. */
+ *  (n - L)-by-L data matrix (and principal-component AR those of its
+ *  2(n - p)-by-p one: qdm_pcar_solver_real()). */
 typedef enum qdm_solver {
   /** Whichever route is estimated to be faster: the Krylov route for long
    *  records with M small beside L (at most L/4), the dense one otherwise. What

@@ -150,6 +150,73 @@ StatusCode ProductFft(const T* x, int32_t rows, int32_t cols, const T* V, int32_
   return st;
 }
 
+// The operators the bidiagonalization runs over: their two dimensions, and
+// out = A in (adjoint false: Cols() values in, Rows() out) or A^H in (Rows()
+// in, Cols() out) on contiguous vectors.
+
+// A = H of x.
+template <typename T>
+struct HankelOperator {
+  HankelFft h;
+  int32_t Rows() const { return h.rows; }
+  int32_t Cols() const { return h.cols; }
+  StatusCode Init(const T* x, int32_t rows, int32_t cols) { return Setup(h, x, rows, cols); }
+  StatusCode Apply(const T* in, T* out, bool adjoint) {
+    return Product(h, in, 1, out, 1, adjoint);
+  }
+};
+
+// A = [F; Bk] (2q x p, q = n - p), the forward-backward prediction matrix of
+// the n samples x: F[i][j] = x[i+p-1-j], Bk[i][j] = conj(x[i+1+j]). With G the
+// (q+1) x p Hankel G[i][j] = x[i+p-1-j] (all of x), F is G's first q rows, and
+// G's last q rows hold x[i+p-j] = Bk's entries in reversed column order,
+// unconjugated: Bk = conj(G[1:q+1]) J, J the column reversal. So
+//   F v    = (G v)[0:q],               Bk v    = conj(G conj(J v))[1:q+1],
+//   F^H u  = G^H [u; 0],               Bk^H u  = J conj(G^H [0; conj(u)]),
+// four products with the one G, whose record DFT serves both blocks.
+template <typename T>
+struct ForwardBackwardOperator {
+  HankelFft h;
+  int32_t q = 0, p = 0;
+  WorkArray<T> s, t;  // max(q + 1, p) values each
+  int32_t Rows() const { return 2 * q; }
+  int32_t Cols() const { return p; }
+  StatusCode Init(const T* x, int32_t n, int32_t order) {
+    if (order < 1 || order >= n) return status::kBadSize;
+    q = n - order;
+    p = order;
+    const size_t len = static_cast<size_t>(std::max(q + 1, p));
+    s = AllocWorkUninit<T>(len);
+    t = AllocWorkUninit<T>(len);
+    if (!s || !t) return status::kNoMemory;
+    return Setup(h, x, q + 1, p);
+  }
+  StatusCode Apply(const T* in, T* out, bool adjoint) {
+    T* a = s.get();
+    T* b = t.get();
+    if (!adjoint) {
+      StatusCode st = Product(h, in, 1, b, 1, false);
+      if (st != status::kOk) return st;
+      std::copy(b, b + q, out);
+      for (int32_t j = 0; j < p; ++j) a[j] = Conj(in[p - 1 - j]);
+      st = Product(h, a, 1, b, 1, false);
+      if (st != status::kOk) return st;
+      for (int32_t i = 0; i < q; ++i) out[q + i] = Conj(b[i + 1]);
+      return status::kOk;
+    }
+    std::copy(in, in + q, a);
+    a[q] = T(0.0);
+    StatusCode st = Product(h, a, 1, out, 1, true);
+    if (st != status::kOk) return st;
+    a[0] = T(0.0);
+    for (int32_t i = 0; i < q; ++i) a[i + 1] = Conj(in[q + i]);
+    st = Product(h, a, 1, b, 1, true);
+    if (st != status::kOk) return st;
+    for (int32_t j = 0; j < p; ++j) out[j] += Conj(b[p - 1 - j]);
+    return status::kOk;
+  }
+};
+
 // ---- the Lanczos bidiagonalization ------------------------------------------------------
 
 // A deterministic start (or breakdown) vector: a fixed pseudo-random sequence,
@@ -242,23 +309,20 @@ void Rotate(T* Q, int32_t dim, int32_t m, const T* C, int32_t keep, T* tmp) {
   }
 }
 
-template <typename T>
-StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, double* S, T* U,
-                         T* V) {
-  if (rows < 1 || cols < 1 || count < 1 || count > std::min(rows, cols)) {
-    return status::kBadSize;
-  }
+// The leading triplets of op's matrix M (rows x cols), set up; count is in
+// range.
+template <typename T, typename Op>
+StatusCode SvdLeadingOf(Op& op, int32_t count, double* S, T* U, T* V) {
+  const int32_t rows = op.Rows(), cols = op.Cols();
   const int32_t dim = std::min(rows, cols);
   const int32_t k = std::min(dim, std::max(2 * count + 8, count + 16));
   const size_t kk = static_cast<size_t>(k) * static_cast<size_t>(k);
+  StatusCode st = status::kOk;
 
-  HankelFft h;
-  StatusCode st = Setup(h, x, rows, cols);
-  if (st != status::kOk) return st;
-  // The bidiagonalization runs on A = H, or on A = H^H when H is wide, so that
+  // The bidiagonalization runs on A = M, or on A = M^H when M is wide, so that
   // the starting side is the smaller one: after dim steps its basis is
   // complete, the residual vanishes and the triplets are exact. A's right
-  // vectors are then H's left ones.
+  // vectors are then M's left ones.
   const bool flip = rows < cols;
   const int32_t vn = flip ? rows : cols, un = flip ? cols : rows;
   // Column-major bases, one contiguous vector per column, touched only as far
@@ -297,7 +361,7 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
     while (m < k && !converged) {
       const int32_t j = m;
       // u_j = A v_j minus its components along u_0 .. u_{j-1}: column j of B.
-      st = Product(h, Vq + int64_t{j} * vn, 1, wu.get(), 1, flip);
+      st = op.Apply(Vq + int64_t{j} * vn, wu.get(), flip);
       if (st != status::kOk) return st;
       const double au = Norm(un, wu.get());
       scale = std::max(scale, au);
@@ -306,7 +370,7 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
       B[j + size_t(j) * k] = Make<T>(
           Extend(Uq, un, j, wu.get(), alpha, scale, c.get(), c2.get(), 3 + 2 * uint64_t(j)), 0.0);
       // v_{j+1} = A^H u_j minus its components along v_0 .. v_j.
-      st = Product(h, Uq + int64_t{j} * un, 1, wv.get(), 1, !flip);
+      st = op.Apply(Uq + int64_t{j} * un, wv.get(), !flip);
       if (st != status::kOk) return st;
       const double b = Orthogonalize(Vq, vn, j + 1, wv.get(), Norm(vn, wv.get()),
                                      c.get(), c2.get());
@@ -363,6 +427,30 @@ StatusCode SvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, 
   return status::kOk;
 }
 
+template <typename T>
+StatusCode HankelSvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, double* S,
+                               T* U, T* V) {
+  if (rows < 1 || cols < 1 || count < 1 || count > std::min(rows, cols)) {
+    return status::kBadSize;
+  }
+  HankelOperator<T> op;
+  const StatusCode st = op.Init(x, rows, cols);
+  if (st != status::kOk) return st;
+  return SvdLeadingOf(op, count, S, U, V);
+}
+
+template <typename T>
+StatusCode ForwardBackwardSvdLeadingFft(const T* x, int32_t n, int32_t p, int32_t count,
+                                        double* S, T* U, T* V) {
+  if (p < 1 || p >= n || count < 1 || count > std::min(int64_t{2} * (n - p), int64_t{p})) {
+    return status::kBadSize;
+  }
+  ForwardBackwardOperator<T> op;
+  const StatusCode st = op.Init(x, n, p);
+  if (st != status::kOk) return st;
+  return SvdLeadingOf(op, count, S, U, V);
+}
+
 }  // namespace
 
 StatusCode HankelProductFftReal(const double* x, int32_t rows, int32_t cols, const double* V,
@@ -383,9 +471,17 @@ StatusCode HankelAdjointProductFftComplex(const Complex* x, int32_t rows, int32_
 }
 StatusCode HankelSvdLeadingReal(const double* x, int32_t rows, int32_t cols, int32_t count,
                                 double* S, double* U, double* V) {
-  return SvdLeadingFft<double>(x, rows, cols, count, S, U, V);
+  return HankelSvdLeadingFft<double>(x, rows, cols, count, S, U, V);
 }
 StatusCode HankelSvdLeadingComplex(const Complex* x, int32_t rows, int32_t cols, int32_t count,
                                    double* S, Complex* U, Complex* V) {
-  return SvdLeadingFft<Complex>(x, rows, cols, count, S, U, V);
+  return HankelSvdLeadingFft<Complex>(x, rows, cols, count, S, U, V);
+}
+StatusCode ForwardBackwardSvdLeadingReal(const double* x, int32_t n, int32_t p, int32_t count,
+                                         double* S, double* U, double* V) {
+  return ForwardBackwardSvdLeadingFft<double>(x, n, p, count, S, U, V);
+}
+StatusCode ForwardBackwardSvdLeadingComplex(const Complex* x, int32_t n, int32_t p,
+                                            int32_t count, double* S, Complex* U, Complex* V) {
+  return ForwardBackwardSvdLeadingFft<Complex>(x, n, p, count, S, U, V);
 }

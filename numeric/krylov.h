@@ -6,6 +6,12 @@
 // H (rows-by-cols) is H[i][j] = x[i + cols - 1 - j]: row i holds the samples
 // x[i .. i+cols-1], newest first (the forward prediction block of x). It reads
 // x[0 .. rows+cols-2]. Matrices beside it are row-major, as in numeric.h.
+//
+// The forward-backward prediction matrix of the n samples x for order p
+// (q = n - p) stacks two such blocks, 2q-by-p:
+//   F  (rows 0 .. q-1)   F[i][j]  = x[i + p - 1 - j]
+//   Bk (rows q .. 2q-1)  Bk[i][j] = conj(x[i + 1 + j])
+// (the backward equations predict conj(x[i]) from conj(x[i+1 .. i+p])).
 #pragma once
 
 #include <cstdint>
@@ -49,3 +55,15 @@ constexpr int32_t kKrylovMaxRestarts = 200;
 [[nodiscard]] StatusCode HankelSvdLeadingComplex(const Complex* x, int32_t rows, int32_t cols,
                                                  int32_t count, double* S, Complex* U,
                                                  Complex* V);
+
+// The same for the forward-backward matrix [F; Bk] of x (n samples, order p,
+// 1 <= p < n, 1 <= count <= min(2(n - p), p)): its products are four Hankel
+// products over one DFT of x, and the triplets come from the same
+// bidiagonalization, with the same tolerance, restarts and statuses. U, when
+// not null, is 2(n - p)-by-count.
+[[nodiscard]] StatusCode ForwardBackwardSvdLeadingReal(const double* x, int32_t n, int32_t p,
+                                                       int32_t count, double* S, double* U,
+                                                       double* V);
+[[nodiscard]] StatusCode ForwardBackwardSvdLeadingComplex(const Complex* x, int32_t n, int32_t p,
+                                                          int32_t count, double* S, Complex* U,
+                                                          Complex* V);

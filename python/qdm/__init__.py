@@ -234,16 +234,35 @@ def covariance(x, *, order):
     return CovarianceFit(coef, poles[:m], nv.value)
 
 
-def pcar(x, *, order, components):
+_SOLVERS = {"auto": 0, "dense": 1, "krylov": 2}
+
+
+def _solver(solver, where):
+    if not isinstance(solver, str) or solver not in _SOLVERS:
+        raise ArgumentError(None, f"solver must be one of {sorted(_SOLVERS)}, not {solver!r}",
+                            where)
+
+
+def pcar(x, *, order, components, solver="auto"):
     """Principal-component AR model: forward-backward linear prediction solved
     through the pseudo-inverse kept to the `components` strongest singular
-    components."""
+    components.
+
+    `solver` picks how the 2(n - order)-by-order data matrix's leading
+    singular triplets are found: "dense" forms it and takes its SVD
+    (O(n order^2)), "krylov" takes the components + 1 leading ones by Lanczos
+    over FFT products without forming it (O(n log n) per product, for long
+    records at large orders), "auto" (the default) whichever is estimated to
+    be faster. Both give the same coefficients to rounding wherever the
+    kept components stand clear of the next."""
     x, c = _signal(x, "pcar")
+    _solver(solver, "pcar")
     n, p, k = x.shape[0], _int(order), _int(components)
     m = _room(p, n)
     coef = _np.empty(m + 1, _C128 if c else _F64)
     roots = _np.empty(max(m, 1), _C128)
-    _check(_fn["pcar", _kind(c)](_addr(x), n, p, k, _addr(coef), _addr(roots)), "pcar")
+    _check(_fn["pcar_solver", _kind(c)](_addr(x), n, p, k, _SOLVERS[solver], _addr(coef),
+                                        _addr(roots)), "pcar")
     return PcarFit(coef, roots[:m])
 
 
@@ -263,9 +282,6 @@ def prony(x, *, order, fs=1.0, real_signal=False):
     return PronyFit(*block[:, :count.value])
 
 
-_SOLVERS = {"auto": 0, "dense": 1, "krylov": 2}
-
-
 def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False, solver="auto"):
     """Matrix pencil method: `modes` damped exponentials from the (n - L)-by-L
     data matrix and its shift, L = `pencil` (default n // 3). When `modes`
@@ -276,9 +292,7 @@ def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False, solver="a
     over FFT products without forming it (O(n log n) per product, for long
     records), "auto" (the default) whichever is estimated to be faster."""
     x, c = _signal(x, "matrix_pencil")
-    if solver not in _SOLVERS:
-        raise ArgumentError(None, f"solver must be one of {sorted(_SOLVERS)}, not {solver!r}",
-                            "matrix_pencil")
+    _solver(solver, "matrix_pencil")
     n = x.shape[0]
     L = n // 3 if pencil is None else _int(pencil)
     M = _int(modes)

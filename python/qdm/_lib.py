@@ -52,6 +52,7 @@ _D = ctypes.c_double
 _SIGNATURES = {
     "covariance": [_I, _P, _P, _P],
     "pcar": [_I, _I, _P, _P],
+    "pcar_solver": [_I, _I, _I, _P, _P],
     "prony": [_I, _D, "R", _P, _P, _P, _P, _P],
     "matrix_pencil": [_I, _I, _D, "R", _P, _P, _P, _P, _P, _P],
     "matrix_pencil_solver": [_I, _I, _D, "R", _I, _P, _P, _P, _P, _P, _P],

@@ -217,3 +217,25 @@ def test_the_krylov_route_gives_the_dense_routes_modes(dtype):
             np.testing.assert_allclose(got, want, rtol=1e-8, atol=1e-12, err_msg=f"{s} {field}")
     with pytest.raises(qdm.ArgumentError, match="solver"):
         qdm.matrix_pencil(x, modes=6, solver="lanczos")
+
+
+@pytest.mark.parametrize("dtype", [float, complex])
+def test_pcar_gives_the_same_model_on_every_route(dtype):
+    # Four modes in noise at a large order, where the automatic choice takes
+    # the Krylov route: the same coefficients and roots to rounding.
+    t = np.arange(1500)
+    x = sum(a * np.exp((-2e-4 + 2j * np.pi * f) * t)
+            for a, f in [(1.0, 0.07), (0.6, 0.21), (0.3, 0.33), (0.2, 0.41)])
+    x = (x.real if dtype is float else x) + 0.05 * np.random.default_rng(5).standard_normal(1500)
+    k = 8 if dtype is float else 4
+    fits = {s: qdm.pcar(x, order=500, components=k, solver=s) for s in ("dense", "krylov", "auto")}
+    for s in ("krylov", "auto"):
+        np.testing.assert_allclose(fits[s].coefficients, fits["dense"].coefficients, rtol=0,
+                                   atol=1e-9 * np.linalg.norm(fits["dense"].coefficients))
+        got, want = fits[s].roots, fits["dense"].roots
+        nearest = np.abs(got[:, None] - want[None, :]).min(axis=1)
+        assert nearest.max() < 1e-9, s
+    with pytest.raises(qdm.ArgumentError, match="solver"):
+        qdm.pcar(x, order=500, components=k, solver="lanczos")
+    with pytest.raises(qdm.ArgumentError, match="solver"):
+        qdm.pcar(x, order=500, components=k, solver=["dense"])

@@ -1,11 +1,12 @@
-// The matrix pencil's Krylov route through the plain face: the same statuses as
-// the dense route at the edges of its arguments, the face's promise (finite
-// results or an error with zeroed outputs) on degenerate records, and
-// every allocation or LAPACK failure inside it reported, with zeroed outputs
-// and nothing left allocated.
+// The Krylov routes of the matrix pencil and of principal-component AR through
+// the plain face: the same statuses as the dense route at the edges of their
+// arguments, the face's promise (finite results or an error with zeroed
+// outputs) on degenerate records, and every allocation or LAPACK failure
+// inside them reported, with zeroed outputs and nothing left allocated.
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <complex>
 #include <cstring>
@@ -153,6 +154,123 @@ TEST(PlainKrylov, EveryFaultIsReported) {
     }
   }
   std::printf("Krylov route: %lld faulted calls, none reported as success\n",
+              static_cast<long long>(faulted));
+}
+
+// ---- principal-component AR ------------------------------------------------------------
+
+// One PCAR call on either data type: the coefficients (interleaved when
+// complex) and the roots (interleaved).
+struct Ar {
+  int32_t status = 0;
+  std::vector<double> a, z;
+};
+
+Ar Pcar(const std::vector<double>& x, bool complex, int32_t p, int32_t k, int32_t solver) {
+  Ar f;
+  const size_t room = static_cast<size_t>(std::max(p, 1));
+  f.a.assign((room + 1) * (complex ? 2 : 1), -7.0);
+  f.z.assign(room * 2, -7.0);
+  const int32_t n = static_cast<int32_t>(complex ? x.size() / 2 : x.size());
+  auto* z = reinterpret_cast<qdm_complex*>(f.z.data());
+  f.status = complex ? qdm_pcar_solver_complex(reinterpret_cast<const qdm_complex*>(x.data()), n,
+                                               p, k, solver,
+                                               reinterpret_cast<qdm_complex*>(f.a.data()), z)
+                     : qdm_pcar_solver_real(x.data(), n, p, k, solver, f.a.data(), z);
+  return f;
+}
+
+bool Zeroed(const Ar& f, int32_t p, bool complex) {
+  for (size_t i = 0; i < size_t(p + 1) * (complex ? 2 : 1); ++i)
+    if (f.a[i] != 0.0) return false;
+  for (size_t i = 0; i < size_t(p) * 2; ++i)
+    if (f.z[i] != 0.0) return false;
+  return true;
+}
+
+TEST(PlainKrylov, PcarSameStatusesAsTheDenseRoute) {
+  struct Row {
+    Kind kind;
+    int32_t n, p, k;
+  };
+  const Row rows[] = {
+      {kModes, 300, 100, 4},  {kModes, 300, 200, 4},   // p = 2n/3: 2q = p
+      {kModes, 300, 200, 200}, {kModes, 12, 8, 8},     // k = p: every component
+      {kModes, 3, 2, 1},      {kModes, 3, 2, 2},       // the smallest record
+      {kModes, 300, 201, 4},  {kModes, 300, -1, 4},    // order out of range
+      {kModes, 300, 100, 0},  {kModes, 300, 100, 101}, // count out of range
+      {kModes, 0, 0, 1},                               // no samples
+      {kZeros, 200, 66, 3},   {kConstant, 200, 66, 3}, {kSpike, 200, 66, 3},
+      {kRamp, 200, 66, 3},    {kAlternating, 200, 66, 3},
+  };
+  for (const bool complex : {false, true}) {
+    for (const Row& r : rows) {
+      const std::string where = std::string(complex ? "complex" : "real") + " kind " +
+                                std::to_string(r.kind) + " n " + std::to_string(r.n) + " p " +
+                                std::to_string(r.p) + " k " + std::to_string(r.k);
+      const std::vector<double> x = Record(r.kind, std::max(r.n, 1), complex);
+      const Ar dense = Pcar(x, complex, r.p, r.k, QDM_SOLVER_DENSE);
+      const Ar krylov = Pcar(x, complex, r.p, r.k, QDM_SOLVER_KRYLOV);
+      // Degenerate records have tied or zero singular values, where which
+      // components pass the threshold is a matter of rounding on either
+      // route: there, a clean result or a clean error.
+      if (r.kind == kModes || r.kind == kZeros) {
+        EXPECT_EQ(krylov.status, dense.status) << where;
+      }
+      // Refused arguments leave the outputs alone; a failed fit zeroes them.
+      const bool valid = r.n >= 1 && r.p >= 0 && r.p <= 2 * r.n / 3 && r.k >= 1 && r.k <= r.p;
+      const int32_t p = std::max(r.p, 0);
+      if (!valid) {
+        EXPECT_LT(krylov.status, 0) << where;
+        EXPECT_TRUE(krylov.a == dense.a && krylov.z == dense.z && krylov.a[0] == -7.0) << where;
+      } else if (krylov.status < 0) {
+        EXPECT_TRUE(Zeroed(krylov, p, complex)) << where;
+      } else {
+        for (size_t i = 0; i < size_t(p + 1) * (complex ? 2 : 1); ++i)
+          EXPECT_TRUE(std::isfinite(krylov.a[i])) << where;
+      }
+    }
+    const std::vector<double> x = Record(kModes, 60, complex);
+    for (const int32_t solver : {-1, 3}) {
+      EXPECT_EQ(Pcar(x, complex, 20, 2, solver).status, QDM_ERR_SOLVER);
+      // The argument checks come first.
+      EXPECT_EQ(Pcar(x, complex, 20, 0, solver).status, QDM_ERR_COUNT);
+    }
+  }
+}
+
+// As for the pencil: each allocation failed in turn and each LAPACK driver
+// call made to report INFO 1 or -1.
+TEST(PlainKrylov, PcarEveryFaultIsReported) {
+  int64_t faulted = 0;
+  for (const bool complex : {false, true}) {
+    const std::vector<double> x = Record(kModes, 240, complex);
+    const Ar clean = Pcar(x, complex, 80, 4, QDM_SOLVER_KRYLOV);
+    ASSERT_EQ(clean.status, 0);
+    for (int fault = 0; fault < 4; ++fault) {
+      for (int64_t k = 1;; ++k) {
+        if (fault < 2) NumAllocFailAt(k, fault == 1);
+        if (fault >= 2) LapackFailAt(k, fault == 3 ? -1 : 1, false);
+        const Ar f = Pcar(x, complex, 80, 4, QDM_SOLVER_KRYLOV);
+        const bool reached = (fault < 2 ? NumAllocAttempts() : LapackCalls()) >= k;
+        NumAllocFailAt(0, false);
+        LapackFailAt(0, 0, false);
+        const std::string where = std::string(complex ? "complex" : "real") + " fault " +
+                                  std::to_string(fault) + " k " + std::to_string(k);
+        ASSERT_EQ(NumAllocOutstanding(), 0) << where;
+        if (!reached) {
+          EXPECT_EQ(f.status, clean.status) << where;
+          EXPECT_EQ(f.a, clean.a) << where;
+          EXPECT_EQ(f.z, clean.z) << where;
+          break;
+        }
+        EXPECT_LT(f.status, 0) << where;
+        EXPECT_TRUE(Zeroed(f, 80, complex)) << where;
+        ++faulted;
+      }
+    }
+  }
+  std::printf("PCAR's Krylov route: %lld faulted calls, none reported as success\n",
               static_cast<long long>(faulted));
 }
 

@@ -143,6 +143,7 @@ PY
 -42417 covspectrum --points 1 $data
 -42411 pencil --pencil 60 $data
 - pencil --solver lanczos $data
+- pcar --solver lanczos $data
 EOF
   expect 1
   expect 0 pencil --points 8 --upper 3 "$data"  # options of other methods are ignored
@@ -150,6 +151,10 @@ EOF
   expect 0 pencil --solver dense --modes 4 --pencil 20 "$data" && sed 1,2d out >dense.txt
   expect 0 pencil --solver krylov --modes 4 --pencil 20 "$data" && sed 1,2d out >krylov.txt
   diff dense.txt krylov.txt >/dev/null || fail "routes differ: $(diff dense.txt krylov.txt)"
+  # And so do both routes of PCAR (the parameters line names the route).
+  expect 0 pcar --solver dense --order 30 --components 4 "$data" && sed 1,2d out >dense.txt
+  expect 0 pcar --solver krylov --order 30 --components 4 "$data" && sed 1,2d out >krylov.txt
+  diff dense.txt krylov.txt >/dev/null || fail "PCAR routes differ: $(diff dense.txt krylov.txt)"
   # A missing or empty value names its option, whether or not the method uses it.
   for option in --order --rate --points --column --delimiter; do
     expect 1 pencil "$data" $option
