@@ -4,6 +4,7 @@
 // The list and the counts are guarded by the plan mutex; everything built here
 // is read-only once the plan is published, so transforms run without the lock.
 
+#include <atomic>
 #include <cmath>
 
 #include "fft/plan.h"
@@ -78,6 +79,9 @@ void FreeStage(FftStage* st) {
 
 void FreePlan(FftPlan* plan) {
   for (int32_t s = 0; s < plan->factorCount; ++s) FreeStage(plan->stage[s]);
+  FftPlanReleaseLocked(plan->half);
+  (void)NumFree(plan->halfCos);
+  (void)NumFree(plan->halfSin);
   (void)NumFree(plan);
 }
 
@@ -256,6 +260,42 @@ void FftPlanReleaseLocked(FftPlan* plan) {
   }
   if (plan->next != nullptr) plan->next->prev = plan->prev;
   FreePlan(plan);
+}
+
+FftPlan* FftRealHalf(const FftPlan* plan) {
+  // The plan is shared read-only; `half` is its one field written after it
+  // was published, always under the mutex, and read through an atomic view.
+  FftPlan* owner = const_cast<FftPlan*>(plan);
+  std::atomic_ref<FftPlan*> half(owner->half);
+  FftPlan* h = half.load(std::memory_order_acquire);
+  if (h != nullptr || plan->n % 2 != 0) return h;
+  platform::PlanMutexLock();
+  h = half.load(std::memory_order_relaxed);
+  if (h == nullptr) {
+    const int32_t n = plan->n;
+    const int32_t quarter = n / 4;
+    double* c = AllocRaw<double>(static_cast<size_t>(quarter) + 1);
+    double* s = AllocRaw<double>(static_cast<size_t>(quarter) + 1);
+    FftPlan* sub = c != nullptr && s != nullptr ? FftPlanAcquireLocked(n / 2) : nullptr;
+    if (sub == nullptr) {
+      (void)NumFree(c);
+      (void)NumFree(s);
+    } else {
+      // Direct values: the table is read at every k, so no recurrence error
+      // is allowed to build up along it.
+      for (int32_t k = 0; k <= quarter; ++k) {
+        const double angle = kTwoPi * static_cast<double>(k) / static_cast<double>(n);
+        c[k] = std::cos(angle);
+        s[k] = -std::sin(angle);
+      }
+      owner->halfCos = c;
+      owner->halfSin = s;
+      h = sub;
+      half.store(sub, std::memory_order_release);
+    }
+  }
+  platform::PlanMutexUnlock();
+  return h;
 }
 
 FftPlan* FftPlanAcquire(int32_t n) {

@@ -61,6 +61,12 @@ struct FftPlan {
   FftComplexTwiddleFn complexTwiddle[kFftMaxFactors];
   FftPlan* prev;
   FftPlan* next;
+  // Real transforms of even n: the shared plan of length n/2 and the twiddles
+  // cos(2 pi k/n), -sin(2 pi k/n), k = 0..n/4, made on first use and read
+  // through FftRealHalf (null until then).
+  FftPlan* half;
+  double* halfCos;
+  double* halfSin;
 };
 
 // Generated radix-indexed kernel tables (kernel_table.cpp, written at build
@@ -74,6 +80,11 @@ extern const FftRealTwiddleFn kFftRealTwiddle[kFftMaxRadix + 1];
 // Plan list internals: the caller already holds the plan mutex.
 FftPlan* FftPlanAcquireLocked(int32_t n);
 void FftPlanReleaseLocked(FftPlan* plan);
+
+// The half-length plan of an even-length plan (its twiddles filled in),
+// made under the plan mutex the first time it is asked for; null when memory
+// ran out. Thread-safe; the plan keeps it until its last release.
+FftPlan* FftRealHalf(const FftPlan* plan);
 
 // Factorisation of n (n >= 2) into ascending factors with their kinds; returns
 // the factor count (0 for n = 1).

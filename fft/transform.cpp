@@ -5,6 +5,7 @@
 // recursion and differ only in the kernels they call.
 
 #include "fft/plan.h"
+#include "numeric/work.h"
 
 namespace {
 
@@ -99,6 +100,110 @@ StatusCode Run(const FftPlan* p, const double* inRe, const double* inIm, double*
   return Stage<kReal>(p, 0, inRe, inIm, outRe, outIm, is, os, p->n);
 }
 
+// Even lengths from this one up take the forward real transform through the
+// complex one of half the length (below, the real kernels are as fast).
+constexpr int32_t kRealByHalfMin = 2;
+
+// Real transform of even n = 2h through the complex one of length h: with
+// z_j = x_2j + i x_(2j+1) and Z = DFT_h(z), the transforms of the even and
+// odd samples are E_k = (Z_k + conj Z_(h-k))/2 and O_k = (Z_k - conj Z_(h-k))/2i,
+// and X_k = E_k + W^k O_k, X_(h-k) = conj(E_k - W^k O_k), W = exp(-2 pi i/n).
+StatusCode RealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t is,
+                      ptrdiff_t os) {
+  const FftPlan* half = FftRealHalf(p);
+  const ptrdiff_t n = p->n;
+  const ptrdiff_t h = n / 2;
+  WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
+  if (half == nullptr || !work) return status::kNoMemory;
+  double* z = work.get();
+  const StatusCode st = Run<false>(half, in, in + is, z, z + 1, 2 * is, 2);
+  if (st < 0) return st;
+  const double* wc = p->halfCos;
+  const double* ws = p->halfSin;
+  out[0] = z[0] + z[1];
+  out[h * os] = z[0] - z[1];
+  for (ptrdiff_t k = 1; 2 * k < h; ++k) {
+    const double a = z[2 * k], b = z[2 * k + 1];
+    const double c = z[2 * (h - k)], d = z[2 * (h - k) + 1];
+    const double er = 0.5 * (a + c), ei = 0.5 * (b - d);
+    const double orr = 0.5 * (b + d), oi = 0.5 * (c - a);
+    const double tr = wc[k] * orr - ws[k] * oi;
+    const double ti = wc[k] * oi + ws[k] * orr;
+    out[k * os] = er + tr;
+    out[(n - k) * os] = ei + ti;
+    out[(h - k) * os] = er - tr;
+    out[(h + k) * os] = ti - ei;
+  }
+  if (h % 2 == 0) {  // X_(h/2) = conj Z_(h/2): W^(h/2) = -i
+    out[(h / 2) * os] = z[h];
+    out[(n - h / 2) * os] = -z[h + 1];
+  }
+  return status::kOk;
+}
+
+// Inverse of RealByHalf: Z'_k = 2E_k + 2i O_k is formed from the packed X
+// (2E_k = X_k + conj X_(h-k), 2O_k = (X_k - conj X_(h-k)) conj W^k), stored
+// at index (h-k) mod h, so that the forward DFT of the stored sequence is the
+// unnormalised inverse of Z', n (x_2j + i x_(2j+1)).
+StatusCode HalfComplexToRealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t is,
+                                   ptrdiff_t os) {
+  const FftPlan* half = FftRealHalf(p);
+  const ptrdiff_t n = p->n;
+  const ptrdiff_t h = n / 2;
+  WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
+  if (half == nullptr || !work) return status::kNoMemory;
+  double* y = work.get();
+  const double* wc = p->halfCos;
+  const double* ws = p->halfSin;
+  const double x0 = in[0], xh = in[h * is];
+  y[0] = x0 + xh;
+  y[1] = x0 - xh;
+  for (ptrdiff_t k = 1; 2 * k < h; ++k) {
+    const double pr = in[k * is], pi = in[(n - k) * is];  // X_k
+    const double ur = in[(h - k) * is], ui = in[(h + k) * is];  // X_(h-k)
+    const double ar = pr + ur, ai = pi - ui;
+    const double br = pr - ur, bi = pi + ui;
+    const double orr = br * wc[k] + bi * ws[k];
+    const double oi = bi * wc[k] - br * ws[k];
+    y[2 * (h - k)] = ar - oi;  // Z'_k
+    y[2 * (h - k) + 1] = ai + orr;
+    y[2 * k] = ar + oi;  // Z'_(h-k) = conj(2E_k) + i conj(2O_k)
+    y[2 * k + 1] = orr - ai;
+  }
+  if (h % 2 == 0) {  // Z'_(h/2) = 2 conj X_(h/2)
+    y[h] = 2.0 * in[(h / 2) * is];
+    y[h + 1] = -2.0 * in[(n - h / 2) * is];
+  }
+  return Run<false>(half, y, y + 1, out, out + os, 2, 2 * os);
+}
+
+// Inverse of odd n through the forward real transform: with u_k = Re X_k -
+// Im X_k over the whole Hermitian X (u_(n-k) = Re X_k + Im X_k), U = DFT(u)
+// has Re U_j = sum Re X_k cos, Im U_j = sum Im X_k sin, so n x_j = Re U_j -
+// Im U_j and n x_(n-j) = Re U_j + Im U_j.
+StatusCode HalfComplexToRealByHartley(const FftPlan* p, const double* in, double* out,
+                                      ptrdiff_t is, ptrdiff_t os) {
+  const ptrdiff_t n = p->n;
+  WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
+  if (!work) return status::kNoMemory;
+  double* u = work.get();
+  u[0] = in[0];
+  for (ptrdiff_t k = 1; 2 * k < n; ++k) {
+    const double re = in[k * is], im = in[(n - k) * is];
+    u[k] = re - im;
+    u[n - k] = re + im;
+  }
+  if (n % 2 == 0) u[n / 2] = in[(n / 2) * is];
+  const StatusCode st = Run<true>(p, u, nullptr, out, nullptr, 1, os);
+  if (st < 0) return st;
+  for (ptrdiff_t j = 1; 2 * j < n; ++j) {
+    const double re = out[j * os], im = out[(n - j) * os];
+    out[j * os] = re - im;
+    out[(n - j) * os] = re + im;
+  }
+  return status::kOk;
+}
+
 }  // namespace
 
 StatusCode FftComplex(const FftPlan* plan, const double* inRe, const double* inIm, double* outRe,
@@ -110,5 +215,17 @@ StatusCode FftComplex(const FftPlan* plan, const double* inRe, const double* inI
 StatusCode FftReal(const FftPlan* plan, const double* in, double* out, int32_t inStride,
                    int32_t outStride, int32_t n) {
   if (plan == nullptr || n != plan->n) return status::kFftRealLengthMismatch;
+  if (n % 2 == 0 && n >= kRealByHalfMin) return RealByHalf(plan, in, out, inStride, outStride);
   return Run<true>(plan, in, nullptr, out, nullptr, inStride, outStride);
+}
+
+StatusCode FftHalfComplexToReal(const FftPlan* plan, const double* in, double* out,
+                                int32_t inStride, int32_t outStride, int32_t n) {
+  if (plan == nullptr || n != plan->n) return status::kFftRealLengthMismatch;
+  if (n == 1) {
+    out[0] = in[0];
+    return status::kOk;
+  }
+  if (n % 2 == 0) return HalfComplexToRealByHalf(plan, in, out, inStride, outStride);
+  return HalfComplexToRealByHartley(plan, in, out, inStride, outStride);
 }
