@@ -21,9 +21,11 @@ constexpr int32_t kFftKindKernel = 0;  // specialised straight-line kernel
 constexpr int32_t kFftKindGeneric = 1;  // generic odd prime below 50
 constexpr int32_t kFftKindRader = 2;   // prime of 50 or more, by Rader's method
 
-// for t = 0..c-1: DFT of inputs (t*is + q*c*is), q = 0..r-1, to outputs (t*r + q)*os.
+// for t = 0..c-1: DFT of inputs t*li + q*ls, q = 0..r-1, to outputs t*lo + q*os
+// (the recursion's leaves: li = is, ls = c*is, lo = r*os).
 using FftComplexLeafFn = void (*)(const double* inRe, const double* inIm, double* outRe,
-                                  double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);
+                                  double* outIm, ptrdiff_t li, ptrdiff_t ls, ptrdiff_t lo,
+                                  ptrdiff_t os, ptrdiff_t c);
 // In place, for k = 0..m-1 on legs (k + j*m)*os: twiddle legs j >= 1 of
 // butterflies k >= 1 by entry (k-1)*(r-1) + (j-1), then a DFT of size r.
 using FftComplexTwiddleFn = void (*)(double* re, double* im, const double* twCos,

@@ -28,7 +28,7 @@ StatusCode Leaf(const FftPlan* p, int32_t L, const double* inRe, const double* i
   } else {
     switch (p->kind[L]) {
       case kFftKindKernel:
-        p->complexLeaf[L](inRe, inIm, outRe, outIm, is, os, c);
+        p->complexLeaf[L](inRe, inIm, outRe, outIm, is, c * is, r * os, os, c);
         return status::kOk;
       case kFftKindGeneric:
         return FftGenericLeafComplex(st, r, inRe, inIm, outRe, outIm, is, os, c);
@@ -88,9 +88,69 @@ StatusCode Stage(const FftPlan* p, int32_t s, const double* inRe, const double* 
   return Combine<kReal>(p, s, outRe, outIm, os, m);
 }
 
+// Complex lengths from this one up run their leaves in one pass over the
+// input before any combining (LeafFirst); below, everything fits in cache.
+constexpr int32_t kLeafFirstMin = 16384;
+
+// The combining passes of the recursion below stage s, on leaves already done.
+StatusCode CombineTree(const FftPlan* p, int32_t s, double* re, double* im, ptrdiff_t os,
+                       ptrdiff_t len) {
+  const ptrdiff_t m = len / p->factor[s];
+  if (s + 2 < p->factorCount) {
+    for (int32_t j = 0; j < p->factor[s]; ++j) {
+      const StatusCode st = CombineTree(p, s + 1, re + j * m * os, im + j * m * os, os, m);
+      if (st < 0) return st;
+    }
+  }
+  return Combine<false>(p, s, re, im, os, m);
+}
+
+// Complex transform whose leaves all run first, in input order: the leaf of
+// decimation path (j0, ..., j(L-1)) reads x[B + q n/rL], q = 0..rL-1, with
+// B = j0 + r0 (j1 + r1 (j2 + ...)), and writes its place in the recursion's
+// output, j0 n/r0 + j1 n/(r0 r1) + ... + j(L-1) rL. One kernel call takes
+// the r0 leaves of consecutive B, so four-lane groups read whole cache lines
+// and the rL input streams run forward; the recursion's own order would read
+// them at the largest strides, a line per leg, and again for each j0.
+StatusCode LeafFirst(const FftPlan* p, const double* inRe, const double* inIm, double* outRe,
+                     double* outIm, ptrdiff_t is, ptrdiff_t os) {
+  const int32_t last = p->factorCount - 1;
+  const ptrdiff_t n = p->n;
+  const ptrdiff_t r0 = p->factor[0];
+  const ptrdiff_t rl = p->factor[last];
+  const ptrdiff_t ls = (n / rl) * is;
+  const ptrdiff_t lo = (n / r0) * os;
+  ptrdiff_t weight[kFftMaxFactors];  // output step of digit s, in elements
+  int32_t digit[kFftMaxFactors] = {};
+  ptrdiff_t span = n / r0;
+  for (int32_t s = 1; s < last; ++s) {
+    span /= p->factor[s];
+    weight[s] = span;
+  }
+  const ptrdiff_t blocks = n / (r0 * rl);
+  ptrdiff_t place = 0;
+  for (ptrdiff_t b = 0; b < blocks; ++b) {
+    const ptrdiff_t at = b * r0 * is;
+    p->complexLeaf[last](inRe + at, inIm + at, outRe + place * os, outIm + place * os, is, ls,
+                         lo, os, r0);
+    for (int32_t s = 1; s < last; ++s) {  // next block: count up the digits j1, j2, ...
+      place += weight[s];
+      if (++digit[s] < p->factor[s]) break;
+      place -= weight[s] * p->factor[s];
+      digit[s] = 0;
+    }
+  }
+  return CombineTree(p, 0, outRe, outIm, os, n);
+}
+
 template <bool kReal>
 StatusCode Run(const FftPlan* p, const double* inRe, const double* inIm, double* outRe,
                double* outIm, ptrdiff_t is, ptrdiff_t os) {
+  if constexpr (!kReal) {
+    if (p->n >= kLeafFirstMin && p->factorCount >= 3 &&
+        p->kind[p->factorCount - 1] == kFftKindKernel)
+      return LeafFirst(p, inRe, inIm, outRe, outIm, is, os);
+  }
   if (p->n == 1) {
     outRe[0] = inRe[0];
     if constexpr (!kReal) outIm[0] = inIm[0];

@@ -469,12 +469,12 @@ def radix_file(r):
     cores = (c_lines, t_lines, r_lines, g_lines, h_lines)
     tw = r - 1
     leaf_args = ("const double* inRe, const double* inIm, double* outRe, double* outIm, "
-                 "ptrdiff_t is, ptrdiff_t os, ptrdiff_t c")
+                 "ptrdiff_t li, ptrdiff_t ls, ptrdiff_t lo, ptrdiff_t os, ptrdiff_t c")
     tw_args = ("double* re, double* im, const double* twCos, const double* twSin, "
                "ptrdiff_t os, ptrdiff_t m")
     rleaf_args = "const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c"
     rtw_args = "double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m"
-    leaf_call = "Dft%s(%%s, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r)
+    leaf_call = "Dft%s(%%s, inRe + t * li, inIm + t * li, ls, outRe + t * lo, outIm + t * lo, os);" % rr
     tw_call = "DftTw%s(%%s, re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, tw, tw)
     rleaf_call = "RealDft%s(%%s, in + t * is, ls, out + t * %d * os, os);" % (rr, r)
     rtw_call = ("RealTw%s(%%s, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d, "
@@ -529,16 +529,15 @@ def radix_file(r):
         "// Transforms 0, 1, ... four at a time, three left run as four with one repeated;",
         "// returns how many ran.",
         "ptrdiff_t ComplexLeafGroups(%s) {" % leaf_args,
-        "  const ptrdiff_t ls = c * is;",
         "  ptrdiff_t t = 0;",
         "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
-        "    const Interleaved4Access p{is, %d * os, 0, 0};" % r,
+        "    const Interleaved4Access p{li, lo, 0, 0};",
         "    for (; t + 3 < c; t += 4) " + leaf_call % "p",
-        "    if (c - t == 3) " + leaf_call % "Interleaved4Access{is, %d * os, 0, 0, 2}" % r,
+        "    if (c - t == 3) " + leaf_call % "Interleaved4Access{li, lo, 0, 0, 2}",
         "  } else {",
-        "    const Lane4Access p{is, %d * os, 0, 0};" % r,
+        "    const Lane4Access p{li, lo, 0, 0};",
         "    for (; t + 3 < c; t += 4) " + leaf_call % "p",
-        "    if (c - t == 3) " + leaf_call % "Lane4Access{is, %d * os, 0, 0, 2}" % r,
+        "    if (c - t == 3) " + leaf_call % "Lane4Access{li, lo, 0, 0, 2}",
         "  }",
         "  return c - t == 3 ? c : t;",
         "}",
@@ -595,14 +594,13 @@ def radix_file(r):
     out += [
         "FFTK_CLONES",
         "void FftComplexLeaf%s(%s) {" % (rr, leaf_args),
-        "  const ptrdiff_t ls = c * is;",
         "  ptrdiff_t t = 0;",
-    ] + dispatch("c >= 3", "t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c)") + [
+    ] + dispatch("c >= 3", "t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, li, ls, lo, os, c)") + [
         "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
-        "    const InterleavedAccess p{is, %d * os, 0, 0};" % r,
+        "    const InterleavedAccess p{li, lo, 0, 0};",
         "    for (; t + 1 < c; t += 2) " + leaf_call % "p",
         "  } else {",
-        "    const LaneAccess p{is, %d * os, 0, 0};" % r,
+        "    const LaneAccess p{li, lo, 0, 0};",
         "    for (; t + 1 < c; t += 2) " + leaf_call % "p",
         "  }",
         "  for (; t < c; ++t) " + leaf_call % "ScalarAccess{}",
@@ -663,7 +661,7 @@ def header_file():
         rr = "%02d" % r
         out += [
             "void FftComplexLeaf%s(const double* inRe, const double* inIm, double* outRe, double* outIm," % rr,
-            "                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);",
+            "                      ptrdiff_t li, ptrdiff_t ls, ptrdiff_t lo, ptrdiff_t os, ptrdiff_t c);",
             "void FftComplexTwiddle%s(double* re, double* im, const double* twCos, const double* twSin," % rr,
             "                         ptrdiff_t os, ptrdiff_t m);",
             "void FftRealLeaf%s(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);" % rr,

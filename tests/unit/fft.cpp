@@ -131,6 +131,16 @@ TEST(Fft, MatchesDirectDftLargeLengths) {
   for (int32_t n : {1763, 1849, 2021, 2491, 2438, 3127, 4096, 4999, 10007, 30030, 65536})
     CheckLength(n);
 }
+// From 16384 up, complex transforms with three or more factors and a
+// specialised leaf run every leaf before combining: just below and at that
+// length, first factors 2, 3, 5 and 32, leaf radices 32, 16 and 10, the
+// largest 2*3*5 lengths, a generic-prime leaf (which keeps the recursion),
+// and 2^20.
+TEST(Fft, MatchesDirectDftLeafFirstLengths) {
+  for (int32_t n : {16383, 16384, 3 * 8192, 5 * 4096, 15 * 2048, 81 * 625, 2 * 3 * 5 * 4096,
+                    23 * 1024, 786432, 1048576})
+    CheckLength(n);
+}
 
 // ---- the inverse real transform ----------------------------------------------------------
 // A random packed half-complex X (any such array is a Hermitian spectrum)
