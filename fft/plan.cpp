@@ -69,6 +69,7 @@ void FreeStage(FftStage* st) {
   (void)NumFree(st->primeSin);
   (void)NumFree(st->twCos);
   (void)NumFree(st->twSin);
+  (void)NumFree(st->twGrouped);
   FftPlanReleaseLocked(st->raderPlan);
   (void)NumFree(st->raderKernelRe);
   (void)NumFree(st->raderKernelIm);
@@ -125,6 +126,24 @@ StatusCode BuildRader(FftStage* st, int32_t r) {
   return status::kOk;
 }
 
+// The grouped table of a kernel stage (FftStage::twGrouped) from its plain one.
+StatusCode GroupTwiddles(FftStage* stage, int32_t r, int64_t m) {
+  const int64_t tw = r - 1;
+  const int64_t groups = (m + 3) / 4;
+  double* g = AllocRaw<double>(static_cast<size_t>(8 * tw * groups));
+  if (g == nullptr) return status::kNoMemory;
+  for (int64_t k = 0; k < 4 * groups; ++k) {
+    double* at = g + (k / 4) * 8 * tw + (k % 2) * 2 + (k % 4) / 2;
+    for (int64_t j = 1; j <= tw; ++j) {
+      const bool inside = k >= 1 && k < m;
+      at[8 * (j - 1)] = inside ? stage->twCos[(k - 1) * tw + (j - 1)] : 1.0;
+      at[8 * (j - 1) + 4] = inside ? stage->twSin[(k - 1) * tw + (j - 1)] : 0.0;
+    }
+  }
+  stage->twGrouped = g;
+  return status::kOk;
+}
+
 // Allocates and fills a plan of length n >= 1; null when memory ran out.
 FftPlan* CreatePlan(int32_t n) {
   FftPlan* plan = AllocRaw<FftPlan>(1);
@@ -161,6 +180,17 @@ FftPlan* CreatePlan(int32_t n) {
       const double theta = kTwoPi / static_cast<double>(len);
       for (int32_t j = 1; j < r; ++j) {
         TwiddleRecurrence(j * theta, m - 1, r - 1, stage->twCos + (j - 1), stage->twSin + (j - 1));
+      }
+      if (plan->kind[s] == kFftKindKernel) {
+        st = GroupTwiddles(stage, r, m);
+        if (st != status::kOk) break;
+        // The plain table stays for the real kernels, which only odd n reach
+        // (even real lengths run on the half-length complex plan).
+        if (n % 2 == 0) {
+          (void)NumFree(stage->twCos);
+          (void)NumFree(stage->twSin);
+          stage->twCos = stage->twSin = nullptr;
+        }
       }
     }
     if (plan->kind[s] == kFftKindGeneric) {

@@ -27,7 +27,9 @@ using FftComplexLeafFn = void (*)(const double* inRe, const double* inIm, double
                                   double* outIm, ptrdiff_t li, ptrdiff_t ls, ptrdiff_t lo,
                                   ptrdiff_t os, ptrdiff_t c);
 // In place, for k = 0..m-1 on legs (k + j*m)*os: twiddle legs j >= 1 of
-// butterflies k >= 1 by entry (k-1)*(r-1) + (j-1), then a DFT of size r.
+// butterflies k >= 1, then a DFT of size r. The kernels read the grouped
+// table (FftStage::twGrouped, its sines at twCos + 4; twSin is not used), the
+// prime passes entry (k-1)*(r-1) + (j-1) of twCos and twSin.
 using FftComplexTwiddleFn = void (*)(double* re, double* im, const double* twCos,
                                      const double* twSin, ptrdiff_t os, ptrdiff_t m);
 // Real-input DFTs of size r written in packed half-complex order.
@@ -41,8 +43,14 @@ using FftRealTwiddleFn = void (*)(double* data, const double* twCos, const doubl
 struct FftStage {
   double* primeCos;  // kind 1: cos(2 pi k/r), k = 0..r-1
   double* primeSin;  // kind 1: -sin(2 pi k/r)
-  double* twCos;     // all but the last stage: (r-1)*(m-1) twiddles
-  double* twSin;
+  double* twCos;     // all but the last stage, except kernel stages of even n:
+  double* twSin;     // (r-1)*(m-1) twiddles at (k-1)*(r-1) + (j-1)
+  // Kernel stages but the last: the grouped table of the complex combining
+  // kernels. Butterflies k = 4g..4g+3 form group g of 8*(r-1) doubles; leg j's
+  // four cosines start at 8*(j-1) and its four sines 4 doubles later, with
+  // butterfly 4g + i at place 0, 2, 1, 3 for i = 0..3 (the lane order of the
+  // four-lane interleaved loads). Butterfly 0 and those past m - 1 hold (1, 0).
+  double* twGrouped;
   FftPlan* raderPlan;  // kind 2: plan of length r-1
   double* raderKernelRe;  // kind 2: transformed convolution kernel, r-1 values
   double* raderKernelIm;

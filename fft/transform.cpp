@@ -57,7 +57,7 @@ StatusCode Combine(const FftPlan* p, int32_t s, double* re, double* im, ptrdiff_
   } else {
     switch (p->kind[s]) {
       case kFftKindKernel:
-        p->complexTwiddle[s](re, im, st->twCos, st->twSin, os, m);
+        p->complexTwiddle[s](re, im, st->twGrouped, st->twGrouped + 4, os, m);
         return status::kOk;
       case kFftKindGeneric:
         return FftGenericTwiddleComplex(st, r, re, im, st->twCos, st->twSin, os, m);
