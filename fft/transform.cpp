@@ -4,6 +4,9 @@
 // of length m in place on the output. Complex and real input share the
 // recursion and differ only in the kernels they call.
 
+#include <cstring>
+
+#include "fft/kernel_access.h"
 #include "fft/plan.h"
 #include "numeric/work.h"
 
@@ -164,25 +167,45 @@ StatusCode Run(const FftPlan* p, const double* inRe, const double* inIm, double*
 // complex one of half the length (below, the real kernels are as fast).
 constexpr int32_t kRealByHalfMin = 2;
 
-// Real transform of even n = 2h through the complex one of length h: with
-// z_j = x_2j + i x_(2j+1) and Z = DFT_h(z), the transforms of the even and
-// odd samples are E_k = (Z_k + conj Z_(h-k))/2 and O_k = (Z_k - conj Z_(h-k))/2i,
-// and X_k = E_k + W^k O_k, X_(h-k) = conj(E_k - W^k O_k), W = exp(-2 pi i/n).
-StatusCode RealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t is,
-                      ptrdiff_t os) {
-  const FftPlan* half = FftRealHalf(p);
-  const ptrdiff_t n = p->n;
+using fftk::V2;
+V2 Load2(const double* p) {
+  V2 v;
+  std::memcpy(&v, p, sizeof v);
+  return v;
+}
+void Store2(double* p, V2 v) { std::memcpy(p, &v, sizeof v); }
+V2 Swap(V2 v) { return __builtin_shufflevector(v, v, 1, 0); }
+
+// RealByHalf's pass from Z to the packed X. With unit output stride, k and
+// k + 1 run together in the two lanes of a vector (the same operations, so
+// the same results as one at a time).
+template <bool kUnit>
+void SplitHalves(const double* z, double* out, ptrdiff_t os, ptrdiff_t n, const double* wc,
+                 const double* ws) {
+  if constexpr (kUnit) os = 1;
   const ptrdiff_t h = n / 2;
-  WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
-  if (half == nullptr || !work) return status::kNoMemory;
-  double* z = work.get();
-  const StatusCode st = Run<false>(half, in, in + is, z, z + 1, 2 * is, 2);
-  if (st < 0) return st;
-  const double* wc = p->halfCos;
-  const double* ws = p->halfSin;
   out[0] = z[0] + z[1];
   out[h * os] = z[0] - z[1];
-  for (ptrdiff_t k = 1; 2 * k < h; ++k) {
+  ptrdiff_t k = 1;
+  if constexpr (kUnit) {
+    const V2 half = {0.5, 0.5};
+    for (; 2 * (k + 1) < h; k += 2) {
+      const V2 p0 = Load2(z + 2 * k), p1 = Load2(z + 2 * k + 2);
+      const V2 q0 = Load2(z + 2 * (h - k)), q1 = Load2(z + 2 * (h - k) - 2);
+      const V2 a = __builtin_shufflevector(p0, p1, 0, 2), b = __builtin_shufflevector(p0, p1, 1, 3);
+      const V2 c = __builtin_shufflevector(q0, q1, 0, 2), d = __builtin_shufflevector(q0, q1, 1, 3);
+      const V2 er = half * (a + c), ei = half * (b - d);
+      const V2 orr = half * (b + d), oi = half * (c - a);
+      const V2 w = Load2(wc + k), v = Load2(ws + k);
+      const V2 tr = w * orr - v * oi;
+      const V2 ti = w * oi + v * orr;
+      Store2(out + k, er + tr);
+      Store2(out + n - k - 1, Swap(ei + ti));
+      Store2(out + h - k - 1, Swap(er - tr));
+      Store2(out + h + k, ti - ei);
+    }
+  }
+  for (; 2 * k < h; ++k) {
     const double a = z[2 * k], b = z[2 * k + 1];
     const double c = z[2 * (h - k)], d = z[2 * (h - k) + 1];
     const double er = 0.5 * (a + c), ei = 0.5 * (b - d);
@@ -198,27 +221,36 @@ StatusCode RealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t
     out[(h / 2) * os] = z[h];
     out[(n - h / 2) * os] = -z[h + 1];
   }
-  return status::kOk;
 }
 
-// Inverse of RealByHalf: Z'_k = 2E_k + 2i O_k is formed from the packed X
-// (2E_k = X_k + conj X_(h-k), 2O_k = (X_k - conj X_(h-k)) conj W^k), stored
-// at index (h-k) mod h, so that the forward DFT of the stored sequence is the
-// unnormalised inverse of Z', n (x_2j + i x_(2j+1)).
-StatusCode HalfComplexToRealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t is,
-                                   ptrdiff_t os) {
-  const FftPlan* half = FftRealHalf(p);
-  const ptrdiff_t n = p->n;
+// The inverse's pass from the packed X to the stored Z' (kUnit: is is 1).
+template <bool kUnit>
+void MergeHalves(const double* in, double* y, ptrdiff_t is, ptrdiff_t n, const double* wc,
+                 const double* ws) {
+  if constexpr (kUnit) is = 1;
   const ptrdiff_t h = n / 2;
-  WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
-  if (half == nullptr || !work) return status::kNoMemory;
-  double* y = work.get();
-  const double* wc = p->halfCos;
-  const double* ws = p->halfSin;
   const double x0 = in[0], xh = in[h * is];
   y[0] = x0 + xh;
   y[1] = x0 - xh;
-  for (ptrdiff_t k = 1; 2 * k < h; ++k) {
+  ptrdiff_t k = 1;
+  if constexpr (kUnit) {  // k and k + 1 in the two lanes, as in SplitHalves
+    for (; 2 * (k + 1) < h; k += 2) {
+      const V2 pr = Load2(in + k), pi = Swap(Load2(in + n - k - 1));
+      const V2 ur = Swap(Load2(in + h - k - 1)), ui = Load2(in + h + k);
+      const V2 ar = pr + ur, ai = pi - ui;
+      const V2 br = pr - ur, bi = pi + ui;
+      const V2 w = Load2(wc + k), v = Load2(ws + k);
+      const V2 orr = br * w + bi * v;
+      const V2 oi = bi * w - br * v;
+      const V2 zr = ar - oi, zi = ai + orr;
+      Store2(y + 2 * (h - k), __builtin_shufflevector(zr, zi, 0, 2));
+      Store2(y + 2 * (h - k) - 2, __builtin_shufflevector(zr, zi, 1, 3));
+      const V2 mr = ar + oi, mi = orr - ai;
+      Store2(y + 2 * k, __builtin_shufflevector(mr, mi, 0, 2));
+      Store2(y + 2 * k + 2, __builtin_shufflevector(mr, mi, 1, 3));
+    }
+  }
+  for (; 2 * k < h; ++k) {
     const double pr = in[k * is], pi = in[(n - k) * is];  // X_k
     const double ur = in[(h - k) * is], ui = in[(h + k) * is];  // X_(h-k)
     const double ar = pr + ur, ai = pi - ui;
@@ -233,6 +265,45 @@ StatusCode HalfComplexToRealByHalf(const FftPlan* p, const double* in, double* o
   if (h % 2 == 0) {  // Z'_(h/2) = 2 conj X_(h/2)
     y[h] = 2.0 * in[(h / 2) * is];
     y[h + 1] = -2.0 * in[(n - h / 2) * is];
+  }
+}
+
+// Real transform of even n = 2h through the complex one of length h: with
+// z_j = x_2j + i x_(2j+1) and Z = DFT_h(z), the transforms of the even and
+// odd samples are E_k = (Z_k + conj Z_(h-k))/2 and O_k = (Z_k - conj Z_(h-k))/2i,
+// and X_k = E_k + W^k O_k, X_(h-k) = conj(E_k - W^k O_k), W = exp(-2 pi i/n).
+StatusCode RealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t is,
+                      ptrdiff_t os) {
+  const FftPlan* half = FftRealHalf(p);
+  const ptrdiff_t n = p->n;
+  WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
+  if (half == nullptr || !work) return status::kNoMemory;
+  double* z = work.get();
+  const StatusCode st = Run<false>(half, in, in + is, z, z + 1, 2 * is, 2);
+  if (st < 0) return st;
+  if (os == 1) {
+    SplitHalves<true>(z, out, 1, n, p->halfCos, p->halfSin);
+  } else {
+    SplitHalves<false>(z, out, os, n, p->halfCos, p->halfSin);
+  }
+  return status::kOk;
+}
+
+// Inverse of RealByHalf: Z'_k = 2E_k + 2i O_k is formed from the packed X
+// (2E_k = X_k + conj X_(h-k), 2O_k = (X_k - conj X_(h-k)) conj W^k), stored
+// at index (h-k) mod h, so that the forward DFT of the stored sequence is the
+// unnormalised inverse of Z', n (x_2j + i x_(2j+1)).
+StatusCode HalfComplexToRealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t is,
+                                   ptrdiff_t os) {
+  const FftPlan* half = FftRealHalf(p);
+  const ptrdiff_t n = p->n;
+  WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
+  if (half == nullptr || !work) return status::kNoMemory;
+  double* y = work.get();
+  if (is == 1) {
+    MergeHalves<true>(in, y, 1, n, p->halfCos, p->halfSin);
+  } else {
+    MergeHalves<false>(in, y, is, n, p->halfCos, p->halfSin);
   }
   return Run<false>(half, y, y + 1, out, out + os, 2, 2 * os);
 }
