@@ -1,5 +1,6 @@
-// FFT engine: forward DFTs of any length by recursive mixed-radix decimation in
-// time, on plans shared per length in a process-wide list.
+// FFT engine: forward DFTs of any length by mixed-radix decimation in time,
+// and the inverse of the real one, on plans shared per length in a
+// process-wide list.
 #pragma once
 
 #include <cstdint>

@@ -150,6 +150,22 @@ FftPlan* CreatePlan(int32_t n) {
   if (plan == nullptr) return nullptr;
   plan->n = n;
   plan->factorCount = FftFactorize(n, plan->factor, plan->kind);
+  const int32_t fc = plan->factorCount;
+  if (n >= kFftLeafFirstMin && fc >= 3 && plan->kind[fc - 1] == kFftKindKernel &&
+      plan->factor[0] < 4) {
+    // The leaf pass runs the first factor's leaves in the lanes of one kernel
+    // call: a first factor below 4 would leave lanes empty, so the largest
+    // middle factor goes first and the small one takes its place.
+    int32_t big = 1;
+    for (int32_t s = 2; s < fc - 1; ++s) {
+      if (plan->factor[s] > plan->factor[big]) big = s;
+    }
+    const int32_t f = plan->factor[0], k = plan->kind[0];
+    plan->factor[0] = plan->factor[big];
+    plan->kind[0] = plan->kind[big];
+    plan->factor[big] = f;
+    plan->kind[big] = k;
+  }
   for (int32_t s = 0; s < plan->factorCount; ++s) {
     plan->stage[s] = AllocRaw<FftStage>(1);
     if (plan->stage[s] == nullptr) {

@@ -16,6 +16,11 @@
 constexpr int kFftMaxFactors = 20;
 constexpr int kFftMaxRadix = 43;  // kernel tables are indexed 0..kFftMaxRadix
 
+// Complex lengths from this one up run all their leaves in one pass before
+// any combining, when they have three or more factors and a kernel leaf
+// (fft/transform.cpp, LeafFirst).
+constexpr int32_t kFftLeafFirstMin = 16384;
+
 // Factor kinds.
 constexpr int32_t kFftKindKernel = 0;  // specialised straight-line kernel
 constexpr int32_t kFftKindGeneric = 1;  // generic odd prime below 50

@@ -1,8 +1,11 @@
 // Transform drivers: recursive mixed-radix decimation in time over a plan's
-// ascending factors. The first (smallest) factor is the outermost decimation,
-// the largest one the leaf transform; each stage combines its r sub-transforms
-// of length m in place on the output. Complex and real input share the
-// recursion and differ only in the kernels they call.
+// factors, ascending but for long transforms whose smallest factor is below 4
+// (CreatePlan moves a large one first). The first factor is the outermost
+// decimation, the last (largest) one the leaf transform; each stage combines its r sub-transforms
+// of length m in place on the output. Long complex transforms run all their
+// leaves first (LeafFirst). Real transforms of even length run on the complex
+// plan of half the length (RealByHalf and its inverse); odd ones share the
+// recursion with the complex driver and differ only in the kernels they call.
 
 #include <cstring>
 
@@ -91,10 +94,6 @@ StatusCode Stage(const FftPlan* p, int32_t s, const double* inRe, const double* 
   return Combine<kReal>(p, s, outRe, outIm, os, m);
 }
 
-// Complex lengths from this one up run their leaves in one pass over the
-// input before any combining (LeafFirst); below, everything fits in cache.
-constexpr int32_t kLeafFirstMin = 16384;
-
 // The combining passes of the recursion below stage s, on leaves already done.
 StatusCode CombineTree(const FftPlan* p, int32_t s, double* re, double* im, ptrdiff_t os,
                        ptrdiff_t len) {
@@ -150,7 +149,7 @@ template <bool kReal>
 StatusCode Run(const FftPlan* p, const double* inRe, const double* inIm, double* outRe,
                double* outIm, ptrdiff_t is, ptrdiff_t os) {
   if constexpr (!kReal) {
-    if (p->n >= kLeafFirstMin && p->factorCount >= 3 &&
+    if (p->n >= kFftLeafFirstMin && p->factorCount >= 3 &&
         p->kind[p->factorCount - 1] == kFftKindKernel)
       return LeafFirst(p, inRe, inIm, outRe, outIm, is, os);
   }

@@ -133,9 +133,9 @@ TEST(Fft, MatchesDirectDftLargeLengths) {
 }
 // From 16384 up, complex transforms with three or more factors and a
 // specialised leaf run every leaf before combining: just below and at that
-// length, first factors 2, 3, 5 and 32, leaf radices 32, 16 and 10, the
-// largest 2*3*5 lengths, a generic-prime leaf (which keeps the recursion),
-// and 2^20.
+// length, smallest factors 2, 3 and 5 (moved behind a large first one) and
+// 32, leaf radices 32, 16 and 10, the largest 2*3*5 lengths, a generic-prime
+// leaf (which keeps the recursion), and 2^20.
 TEST(Fft, MatchesDirectDftLeafFirstLengths) {
   for (int32_t n : {16383, 16384, 3 * 8192, 5 * 4096, 15 * 2048, 81 * 625, 2 * 3 * 5 * 4096,
                     23 * 1024, 786432, 1048576})
@@ -261,9 +261,10 @@ TEST(Fft, PlansAreSharedCountedAndFreed) {
   EXPECT_TRUE(factor[0] == 46327 && factor[1] == 46337);
 }
 
-// Every allocation of planning and of the prime kernels' per-call scratch
-// fails in turn (once, then from there on): null or -20001, never a leak, and
-// the run that no longer reaches the failure completes.
+// Every allocation of planning, of the half-length plan the real transforms
+// of even n build on first use, and of the per-call scratch fails in turn
+// (once, then from there on): null or -20001, never a leak, and the run that
+// no longer reaches the failure completes.
 TEST(Fft, AllocationFailuresGiveNullOrNoMemoryAndLeakNothing) {
   for (int32_t n : {46, 107, 3127}) {
     const std::vector<double> x = Random(2 * static_cast<size_t>(n), n);
@@ -274,34 +275,39 @@ TEST(Fft, AllocationFailuresGiveNullOrNoMemoryAndLeakNothing) {
       for (int64_t k = 1; !completed; ++k) {
         NumAllocFailAt(k, persistent);
         FftPlan* plan = FftPlanAcquire(n);
-        StatusCode sc = 0, sr = 0;
+        StatusCode sc = 0, sr = 0, si = 0;
         if (plan != nullptr) {
           sc = FftComplex(plan, x.data(), x.data() + 1, y.data(), y.data() + 1, 2, 2, n);
           sr = FftReal(plan, x.data(), y.data(), 1, 1, n);
+          si = FftHalfComplexToReal(plan, x.data(), y.data(), 1, 1, n);
           FftPlanRelease(plan);
         }
         completed = NumAllocAttempts() < k;
         NumAllocFailAt(0, false);
         ASSERT_EQ(NumAllocOutstanding(), before) << "n = " << n << " k = " << k;
-        ASSERT_TRUE((sc == 0 || sc == -20001) && (sr == 0 || sr == -20001)) << sc << " " << sr;
-        EXPECT_TRUE(!completed || (plan != nullptr && sc == 0 && sr == 0));
+        ASSERT_TRUE((sc == 0 || sc == -20001) && (sr == 0 || sr == -20001) &&
+                    (si == 0 || si == -20001))
+            << sc << " " << sr << " " << si;
+        EXPECT_TRUE(!completed || (plan != nullptr && sc == 0 && sr == 0 && si == 0));
       }
     }
   }
 }
 
 // Threads acquire, transform and release generic, Rader and nested Rader
-// lengths at once, so plans are built and freed under one another's feet;
-// every result must be the one computed alone.
+// lengths at once, so plans (and the half-length plans of the even real
+// transforms, made on first use) are built and freed under one another's
+// feet; every result must be the one computed alone.
 TEST(Fft, ConcurrentUseGivesSingleThreadedResults) {
   const int32_t lengths[] = {106, 53, 107, 2438, 47, 736, 1000};
   auto run = [](int32_t n) {
     const std::vector<double> x = Random(2 * static_cast<size_t>(n), n);
-    std::vector<double> y(3 * static_cast<size_t>(n));
+    std::vector<double> y(4 * static_cast<size_t>(n));
     FftPlan* plan = FftPlanAcquire(n);
     if (plan == nullptr ||
         FftComplex(plan, x.data(), x.data() + 1, y.data(), y.data() + 1, 2, 2, n) != 0 ||
-        FftReal(plan, x.data(), y.data() + 2 * n, 1, 1, n) != 0)
+        FftReal(plan, x.data(), y.data() + 2 * n, 1, 1, n) != 0 ||
+        FftHalfComplexToReal(plan, x.data(), y.data() + 3 * n, 1, 1, n) != 0)
       y.clear();
     FftPlanRelease(plan);
     return y;
