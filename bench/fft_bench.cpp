@@ -1,9 +1,14 @@
 // FFT benchmark: our forward complex (interleaved, stride 2) and real
-// (packed half-complex) transforms against FFTW's out-of-place dft/r2c plans
+// (packed half-complex) transforms and the inverse real one (packed
+// half-complex to real) against FFTW's out-of-place dft/r2c/c2r plans
 // (FFTW_ESTIMATE, and FFTW_MEASURE as a further column), in one run.
 //
-//   fft_bench [--csv] [--quick] [--only n] [--narrow]
+//   fft_bench [--csv] [--quick] [--only n] [--narrow] [--profile kind]
 // --narrow keeps the kernels on their SSE2 variant (for comparing the two).
+// --profile runs only our transform of that kind (complex, real, inverse)
+// at the --only length for about five seconds, for perf record.
+// FFTW's c2r plans overwrite their input, so each of their calls restores it
+// first and the time of that copy (measured alone) is taken off.
 //
 // --csv prints rows kind,n,qdm_ns,fftw_ns,ratio,fftw_measure_ns (ratio =
 // ours / FFTW_ESTIMATE). Each time is the best of several batches of calls,
@@ -114,11 +119,78 @@ Row BenchReal(int n) {
   return {"real", n, qdm, fe, fm};
 }
 
+Row BenchInverse(int n) {
+  fftw_complex* cin = fftw_alloc_complex(n / 2 + 1);
+  fftw_complex* keep = fftw_alloc_complex(n / 2 + 1);
+  double* packed = fftw_alloc_real(n);
+  double* out = fftw_alloc_real(n);
+  // The same spectrum in both layouts: Re X_k, Im X_k at k and n - k packed.
+  for (int k = 0; 2 * k <= n; ++k) {
+    const double re = std::sin(0.37 * k) + 0.1;
+    const double im = k == 0 || 2 * k == n ? 0.0 : std::cos(1.13 * k);
+    keep[k][0] = re;
+    keep[k][1] = im;
+    packed[k] = re;
+    if (k > 0 && 2 * k < n) packed[n - k] = im;
+  }
+  const size_t bytes = sizeof(fftw_complex) * static_cast<size_t>(n / 2 + 1);
+  FftPlan* plan = FftPlanAcquire(n);
+  const double qdm = TimeNs([&] { (void)FftHalfComplexToReal(plan, packed, out, 1, 1, n); });
+  FftPlanRelease(plan);
+  const double copy = TimeNs([&] { std::memcpy(cin, keep, bytes); });
+  fftw_plan pe = fftw_plan_dft_c2r_1d(n, cin, out, FFTW_ESTIMATE);
+  const double fe = TimeNs([&] {
+    std::memcpy(cin, keep, bytes);
+    fftw_execute(pe);
+  });
+  fftw_destroy_plan(pe);
+  fftw_plan pm = fftw_plan_dft_c2r_1d(n, cin, out, FFTW_MEASURE);
+  const double fm = TimeNs([&] {
+    std::memcpy(cin, keep, bytes);
+    fftw_execute(pm);
+  });
+  fftw_destroy_plan(pm);
+  fftw_free(cin);
+  fftw_free(keep);
+  fftw_free(packed);
+  fftw_free(out);
+  return {"inverse", n, qdm, std::max(fe - copy, 1.0), std::max(fm - copy, 1.0)};
+}
+
+// Our transform of one kind alone, about five seconds of calls.
+int Profile(const char* kind, int n) {
+  std::vector<double> x(2 * static_cast<size_t>(n)), y(2 * static_cast<size_t>(n));
+  for (size_t i = 0; i < x.size(); ++i) x[i] = std::sin(0.37 * static_cast<double>(i)) + 0.1;
+  FftPlan* plan = FftPlanAcquire(n);
+  if (plan == nullptr) return 1;
+  std::function<void()> call;
+  if (std::strcmp(kind, "complex") == 0) {
+    call = [&] { (void)FftComplex(plan, x.data(), x.data() + 1, y.data(), y.data() + 1, 2, 2, n); };
+  } else if (std::strcmp(kind, "real") == 0) {
+    call = [&] { (void)FftReal(plan, x.data(), y.data(), 1, 1, n); };
+  } else if (std::strcmp(kind, "inverse") == 0) {
+    call = [&] { (void)FftHalfComplexToReal(plan, x.data(), y.data(), 1, 1, n); };
+  } else {
+    FftPlanRelease(plan);
+    return 2;
+  }
+  const double t0 = ThreadSeconds();
+  int64_t calls = 0;
+  while (ThreadSeconds() - t0 < 5.0) {
+    for (int i = 0; i < 16; ++i) call();
+    calls += 16;
+  }
+  std::printf("%s %d: %.1f ns per call\n", kind, n, (ThreadSeconds() - t0) * 1e9 / calls);
+  FftPlanRelease(plan);
+  return 0;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
   bool csv = false;
   int only = 0;
+  const char* profile = nullptr;
   for (int i = 1; i < argc; ++i) {
     if (std::strcmp(argv[i], "--csv") == 0) {
       csv = true;
@@ -129,14 +201,31 @@ int main(int argc, char** argv) {
       fftk::SetWideLanes(false);
     } else if (std::strcmp(argv[i], "--only") == 0 && i + 1 < argc) {
       only = std::atoi(argv[++i]);
+    } else if (std::strcmp(argv[i], "--profile") == 0 && i + 1 < argc) {
+      profile = argv[++i];
     } else {
-      std::fprintf(stderr, "usage: %s [--csv] [--quick] [--only n] [--narrow]\n", argv[0]);
+      std::fprintf(stderr,
+                   "usage: %s [--csv] [--quick] [--only n] [--narrow] [--profile kind]\n",
+                   argv[0]);
       return 2;
     }
   }
+  if (profile != nullptr) {
+    if (only <= 0 || Profile(profile, only) != 0) {
+      std::fprintf(stderr, "--profile takes complex, real or inverse and needs --only n\n");
+      return 2;
+    }
+    return 0;
+  }
+  // Powers of two to 2^20; the 2*3*5 lengths the long-record products take
+  // (3, 5 and 15 times powers of two, and mixed 2^a 3^b 5^c); other lengths.
   std::vector<int> lengths;
-  for (int n = 8; n <= 65536; n *= 2) lengths.push_back(n);
-  for (int n : {1000, 1536, 1763, 2438, 30030, 1009, 4999, 10007}) lengths.push_back(n);
+  for (int n = 8; n <= (1 << 20); n *= 2) lengths.push_back(n);
+  for (int n : {1536, 3072, 12288, 49152, 196608, 786432, 1280, 5120, 20480, 81920, 327680,
+                1310720, 3840, 15360, 61440, 245760, 983040, 1000, 2160, 6750, 18000, 50625,
+                93312, 253125, 472392, 1000000})
+    lengths.push_back(n);
+  for (int n : {1763, 2438, 30030, 1009, 4999, 10007}) lengths.push_back(n);
   if (only > 0) lengths.assign(1, only);
 
   if (csv) {
@@ -145,9 +234,11 @@ int main(int argc, char** argv) {
     std::printf("%-8s %7s %12s %12s %7s %14s %7s\n", "kind", "n", "qdm ns", "fftw est ns",
                 "ratio", "fftw meas ns", "ratio");
   }
-  for (const char* kind : {"complex", "real"}) {
+  for (const char* kind : {"complex", "real", "inverse"}) {
     for (int n : lengths) {
-      const Row r = std::strcmp(kind, "complex") == 0 ? BenchComplex(n) : BenchReal(n);
+      const Row r = std::strcmp(kind, "complex") == 0 ? BenchComplex(n)
+                    : std::strcmp(kind, "real") == 0  ? BenchReal(n)
+                                                      : BenchInverse(n);
       if (csv) {
         std::printf("%s,%d,%.1f,%.1f,%.3f,%.1f\n", r.kind, r.n, r.qdm, r.fftw, r.qdm / r.fftw,
                     r.fftw_measure);

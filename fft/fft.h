@@ -1,5 +1,6 @@
-// FFT engine: forward DFTs of any length by recursive mixed-radix decimation in
-// time, on plans shared per length in a process-wide list.
+// FFT engine: forward DFTs of any length by mixed-radix decimation in time,
+// and the inverse of the real one, on plans shared per length in a
+// process-wide list.
 #pragma once
 
 #include <cstdint>
@@ -26,6 +27,13 @@ void FftPlanRelease(FftPlan* plan);
 // even n. -20999 when n differs from the plan's length.
 [[nodiscard]] StatusCode FftReal(const FftPlan* plan, const double* in, double* out,
                                  int32_t inStride, int32_t outStride, int32_t n);
+// Inverse of FftReal, unnormalised: from X in FftReal's packed half-complex
+// order (Im X0 and, for even n, Im X(n/2) taken as 0) to the real sequence
+// x[j] = sum_k X[k] exp(+2 pi i jk/n) = n times the sequence FftReal took.
+// Input and output must not overlap. -20999 when n differs from the plan's
+// length; -20001 when work memory ran out.
+[[nodiscard]] StatusCode FftHalfComplexToReal(const FftPlan* plan, const double* in, double* out,
+                                              int32_t inStride, int32_t outStride, int32_t n);
 // x replaced by |X[k]|^2 / n^2, k = 0..n-1 (two-sided).
 [[nodiscard]] StatusCode PowerSpectrumReal(double* x, int32_t n);
 // Multiplies x by the periodic cosine-sum window of the given kind (0..9, 11).

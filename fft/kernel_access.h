@@ -158,9 +158,10 @@ struct Lane4Access {
 };
 
 // Interleaved complex data, four (re, im) pairs per pair of vectors. The
-// in-lane unpacks leave the lanes in the order 0, 2, 1, 3, so the twiddles
-// are gathered in that order and the stores undo it with the same unpacks.
-// l3 as in Lane4Access.
+// in-lane unpacks leave the lanes in the order 0, 2, 1, 3, which is the order
+// of a group in the grouped twiddle table (fft/plan.h), so a twiddle is one
+// 32-byte load; the stores undo the order with the same unpacks. l3 as in
+// Lane4Access.
 struct Interleaved4Access {
   using T = V4;
   ptrdiff_t li, lo, lb, lw;
@@ -177,7 +178,11 @@ struct Interleaved4Access {
     std::memcpy(a, &x, sizeof x);
     std::memcpy(b, &y, sizeof y);
   }
-  T LdW(const double* p) const { return T{p[0], p[2 * lw], p[lw], p[l3 * lw]}; }
+  static T LdW(const double* p) {
+    T v;
+    std::memcpy(&v, p, sizeof v);
+    return v;
+  }
   static T Tw0(T, T v) { return v; }
   void LdC(const double* re, const double*, T& r, T& i) const {
     const V4 a = Join(re, re + li);
@@ -191,18 +196,21 @@ struct Interleaved4Access {
   }
 };
 
-// The first group of a combining pass (l3 = 3): butterflies 0..3, where butterfly 0
+// Lane4Access in a complex combining pass: lanes 0..3 are butterflies
+// k..k+3, whose twiddles sit at places 0, 2, 1, 3 of their group.
+struct Lane4TwAccess : Lane4Access {
+  static T LdW(const double* p) { return T{p[0], p[2], p[1], p[3]}; }
+};
+
+// The first group of a combining pass: butterflies 0..3, where butterfly 0
 // takes no twiddle. Its lane keeps the untwiddled value (so the result is
-// exactly that of the plain DFT), and the twiddle pointer is that of
-// butterfly 1, whose entry also fills lane 0 (never used).
-struct Lane4FirstAccess : Lane4Access {
-  T LdW(const double* p) const { return T{p[0], p[0], p[lw], p[2 * lw]}; }
+// exactly that of the plain DFT); its table entry (1, 0) is never used.
+struct Lane4TwFirstAccess : Lane4TwAccess {
   static T Tw0(T x, T v) { return __builtin_shufflevector(x, v, 0, 5, 6, 7); }
 };
 
-// As Lane4FirstAccess, lanes in the order 0, 2, 1, 3.
+// As Lane4TwFirstAccess, lanes in the order 0, 2, 1, 3 (butterfly 0 in lane 0).
 struct Interleaved4FirstAccess : Interleaved4Access {
-  T LdW(const double* p) const { return T{p[0], p[lw], p[0], p[2 * lw]}; }
   static T Tw0(T x, T v) { return __builtin_shufflevector(x, v, 0, 5, 6, 7); }
 };
 

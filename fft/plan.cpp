@@ -4,6 +4,7 @@
 // The list and the counts are guarded by the plan mutex; everything built here
 // is read-only once the plan is published, so transforms run without the lock.
 
+#include <atomic>
 #include <cmath>
 
 #include "fft/plan.h"
@@ -68,6 +69,7 @@ void FreeStage(FftStage* st) {
   (void)NumFree(st->primeSin);
   (void)NumFree(st->twCos);
   (void)NumFree(st->twSin);
+  (void)NumFree(st->twGrouped);
   FftPlanReleaseLocked(st->raderPlan);
   (void)NumFree(st->raderKernelRe);
   (void)NumFree(st->raderKernelIm);
@@ -78,6 +80,9 @@ void FreeStage(FftStage* st) {
 
 void FreePlan(FftPlan* plan) {
   for (int32_t s = 0; s < plan->factorCount; ++s) FreeStage(plan->stage[s]);
+  FftPlanReleaseLocked(plan->half);
+  (void)NumFree(plan->halfCos);
+  (void)NumFree(plan->halfSin);
   (void)NumFree(plan);
 }
 
@@ -121,12 +126,46 @@ StatusCode BuildRader(FftStage* st, int32_t r) {
   return status::kOk;
 }
 
+// The grouped table of a kernel stage (FftStage::twGrouped) from its plain one.
+StatusCode GroupTwiddles(FftStage* stage, int32_t r, int64_t m) {
+  const int64_t tw = r - 1;
+  const int64_t groups = (m + 3) / 4;
+  double* g = AllocRaw<double>(static_cast<size_t>(8 * tw * groups));
+  if (g == nullptr) return status::kNoMemory;
+  for (int64_t k = 0; k < 4 * groups; ++k) {
+    double* at = g + (k / 4) * 8 * tw + (k % 2) * 2 + (k % 4) / 2;
+    for (int64_t j = 1; j <= tw; ++j) {
+      const bool inside = k >= 1 && k < m;
+      at[8 * (j - 1)] = inside ? stage->twCos[(k - 1) * tw + (j - 1)] : 1.0;
+      at[8 * (j - 1) + 4] = inside ? stage->twSin[(k - 1) * tw + (j - 1)] : 0.0;
+    }
+  }
+  stage->twGrouped = g;
+  return status::kOk;
+}
+
 // Allocates and fills a plan of length n >= 1; null when memory ran out.
 FftPlan* CreatePlan(int32_t n) {
   FftPlan* plan = AllocRaw<FftPlan>(1);
   if (plan == nullptr) return nullptr;
   plan->n = n;
   plan->factorCount = FftFactorize(n, plan->factor, plan->kind);
+  const int32_t fc = plan->factorCount;
+  if (n >= kFftLeafFirstMin && fc >= 3 && plan->kind[fc - 1] == kFftKindKernel &&
+      plan->factor[0] < 4) {
+    // The leaf pass runs the first factor's leaves in the lanes of one kernel
+    // call: a first factor below 4 would leave lanes empty, so the largest
+    // middle factor goes first and the small one takes its place.
+    int32_t big = 1;
+    for (int32_t s = 2; s < fc - 1; ++s) {
+      if (plan->factor[s] > plan->factor[big]) big = s;
+    }
+    const int32_t f = plan->factor[0], k = plan->kind[0];
+    plan->factor[0] = plan->factor[big];
+    plan->kind[0] = plan->kind[big];
+    plan->factor[big] = f;
+    plan->kind[big] = k;
+  }
   for (int32_t s = 0; s < plan->factorCount; ++s) {
     plan->stage[s] = AllocRaw<FftStage>(1);
     if (plan->stage[s] == nullptr) {
@@ -157,6 +196,17 @@ FftPlan* CreatePlan(int32_t n) {
       const double theta = kTwoPi / static_cast<double>(len);
       for (int32_t j = 1; j < r; ++j) {
         TwiddleRecurrence(j * theta, m - 1, r - 1, stage->twCos + (j - 1), stage->twSin + (j - 1));
+      }
+      if (plan->kind[s] == kFftKindKernel) {
+        st = GroupTwiddles(stage, r, m);
+        if (st != status::kOk) break;
+        // The plain table stays for the real kernels, which only odd n reach
+        // (even real lengths run on the half-length complex plan).
+        if (n % 2 == 0) {
+          (void)NumFree(stage->twCos);
+          (void)NumFree(stage->twSin);
+          stage->twCos = stage->twSin = nullptr;
+        }
       }
     }
     if (plan->kind[s] == kFftKindGeneric) {
@@ -256,6 +306,42 @@ void FftPlanReleaseLocked(FftPlan* plan) {
   }
   if (plan->next != nullptr) plan->next->prev = plan->prev;
   FreePlan(plan);
+}
+
+FftPlan* FftRealHalf(const FftPlan* plan) {
+  // The plan is shared read-only; `half` is its one field written after it
+  // was published, always under the mutex, and read through an atomic view.
+  FftPlan* owner = const_cast<FftPlan*>(plan);
+  std::atomic_ref<FftPlan*> half(owner->half);
+  FftPlan* h = half.load(std::memory_order_acquire);
+  if (h != nullptr || plan->n % 2 != 0) return h;
+  platform::PlanMutexLock();
+  h = half.load(std::memory_order_relaxed);
+  if (h == nullptr) {
+    const int32_t n = plan->n;
+    const int32_t quarter = n / 4;
+    double* c = AllocRaw<double>(static_cast<size_t>(quarter) + 1);
+    double* s = AllocRaw<double>(static_cast<size_t>(quarter) + 1);
+    FftPlan* sub = c != nullptr && s != nullptr ? FftPlanAcquireLocked(n / 2) : nullptr;
+    if (sub == nullptr) {
+      (void)NumFree(c);
+      (void)NumFree(s);
+    } else {
+      // Direct values: the table is read at every k, so no recurrence error
+      // is allowed to build up along it.
+      for (int32_t k = 0; k <= quarter; ++k) {
+        const double angle = kTwoPi * static_cast<double>(k) / static_cast<double>(n);
+        c[k] = std::cos(angle);
+        s[k] = -std::sin(angle);
+      }
+      owner->halfCos = c;
+      owner->halfSin = s;
+      h = sub;
+      half.store(sub, std::memory_order_release);
+    }
+  }
+  platform::PlanMutexUnlock();
+  return h;
 }
 
 FftPlan* FftPlanAcquire(int32_t n) {

@@ -16,16 +16,25 @@
 constexpr int kFftMaxFactors = 20;
 constexpr int kFftMaxRadix = 43;  // kernel tables are indexed 0..kFftMaxRadix
 
+// Complex lengths from this one up run all their leaves in one pass before
+// any combining, when they have three or more factors and a kernel leaf
+// (fft/transform.cpp, LeafFirst).
+constexpr int32_t kFftLeafFirstMin = 16384;
+
 // Factor kinds.
 constexpr int32_t kFftKindKernel = 0;  // specialised straight-line kernel
 constexpr int32_t kFftKindGeneric = 1;  // generic odd prime below 50
 constexpr int32_t kFftKindRader = 2;   // prime of 50 or more, by Rader's method
 
-// for t = 0..c-1: DFT of inputs (t*is + q*c*is), q = 0..r-1, to outputs (t*r + q)*os.
+// for t = 0..c-1: DFT of inputs t*li + q*ls, q = 0..r-1, to outputs t*lo + q*os
+// (the recursion's leaves: li = is, ls = c*is, lo = r*os).
 using FftComplexLeafFn = void (*)(const double* inRe, const double* inIm, double* outRe,
-                                  double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);
+                                  double* outIm, ptrdiff_t li, ptrdiff_t ls, ptrdiff_t lo,
+                                  ptrdiff_t os, ptrdiff_t c);
 // In place, for k = 0..m-1 on legs (k + j*m)*os: twiddle legs j >= 1 of
-// butterflies k >= 1 by entry (k-1)*(r-1) + (j-1), then a DFT of size r.
+// butterflies k >= 1, then a DFT of size r. The kernels read the grouped
+// table (FftStage::twGrouped, its sines at twCos + 4; twSin is not used), the
+// prime passes entry (k-1)*(r-1) + (j-1) of twCos and twSin.
 using FftComplexTwiddleFn = void (*)(double* re, double* im, const double* twCos,
                                      const double* twSin, ptrdiff_t os, ptrdiff_t m);
 // Real-input DFTs of size r written in packed half-complex order.
@@ -39,8 +48,14 @@ using FftRealTwiddleFn = void (*)(double* data, const double* twCos, const doubl
 struct FftStage {
   double* primeCos;  // kind 1: cos(2 pi k/r), k = 0..r-1
   double* primeSin;  // kind 1: -sin(2 pi k/r)
-  double* twCos;     // all but the last stage: (r-1)*(m-1) twiddles
-  double* twSin;
+  double* twCos;     // all but the last stage, except kernel stages of even n:
+  double* twSin;     // (r-1)*(m-1) twiddles at (k-1)*(r-1) + (j-1)
+  // Kernel stages but the last: the grouped table of the complex combining
+  // kernels. Butterflies k = 4g..4g+3 form group g of 8*(r-1) doubles; leg j's
+  // four cosines start at 8*(j-1) and its four sines 4 doubles later, with
+  // butterfly 4g + i at place 0, 2, 1, 3 for i = 0..3 (the lane order of the
+  // four-lane interleaved loads). Butterfly 0 and those past m - 1 hold (1, 0).
+  double* twGrouped;
   FftPlan* raderPlan;  // kind 2: plan of length r-1
   double* raderKernelRe;  // kind 2: transformed convolution kernel, r-1 values
   double* raderKernelIm;
@@ -61,6 +76,12 @@ struct FftPlan {
   FftComplexTwiddleFn complexTwiddle[kFftMaxFactors];
   FftPlan* prev;
   FftPlan* next;
+  // Real transforms of even n: the shared plan of length n/2 and the twiddles
+  // cos(2 pi k/n), -sin(2 pi k/n), k = 0..n/4, made on first use and read
+  // through FftRealHalf (null until then).
+  FftPlan* half;
+  double* halfCos;
+  double* halfSin;
 };
 
 // Generated radix-indexed kernel tables (kernel_table.cpp, written at build
@@ -74,6 +95,11 @@ extern const FftRealTwiddleFn kFftRealTwiddle[kFftMaxRadix + 1];
 // Plan list internals: the caller already holds the plan mutex.
 FftPlan* FftPlanAcquireLocked(int32_t n);
 void FftPlanReleaseLocked(FftPlan* plan);
+
+// The half-length plan of an even-length plan (its twiddles filled in),
+// made under the plan mutex the first time it is asked for; null when memory
+// ran out. Thread-safe; the plan keeps it until its last release.
+FftPlan* FftRealHalf(const FftPlan* plan);
 
 // Factorisation of n (n >= 2) into ascending factors with their kinds; returns
 // the factor count (0 for n = 1).

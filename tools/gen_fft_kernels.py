@@ -366,13 +366,15 @@ def complex_core(r):
     return b.render(stores)
 
 
-def twiddle_loads(b, r, pair):
-    """Legs j at s-spaced places; legs j >= 1 multiplied by (wc[j-1] + i ws[j-1])."""
+def twiddle_loads(b, r, pair, step=1):
+    """Legs j at s-spaced places; legs j >= 1 multiplied by (wc[step*(j-1)] +
+    i ws[step*(j-1)])."""
     xs = []
     for j in range(r):
         xr, xi = pair(j)
         if j > 0:
-            c, s = b.load("p.LdW(wc + %d)" % (j - 1)), b.load("p.LdW(ws + %d)" % (j - 1))
+            c = b.load("p.LdW(wc + %d)" % (step * (j - 1)))
+            s = b.load("p.LdW(ws + %d)" % (step * (j - 1)))
             deps = [xr[0], xi[0], c[0], s[0]]
             # p.Tw0 keeps butterfly 0 untwiddled where a policy runs it in a lane.
             xr, xi = (b.raw("p.Tw0(%s, %s * %s - %s * %s)" % (xr[0], xr[0], c[0], xi[0], s[0]), deps),
@@ -383,7 +385,9 @@ def twiddle_loads(b, r, pair):
 
 def complex_twiddle_core(r):
     b = Block()
-    ys = dft(b, twiddle_loads(b, r, lambda j: b.load_pair(idx("re", j, "s"), idx("im", j, "s"))))
+    # The complex combining passes read the grouped table (fft/plan.h): eight
+    # doubles per leg, four cosines then four sines.
+    ys = dft(b, twiddle_loads(b, r, lambda j: b.load_pair(idx("re", j, "s"), idx("im", j, "s")), 8))
     stores = [("StC", idx("re", q, "s"), idx("im", q, "s"), ys[q][0], ys[q][1]) for q in range(r)]
     return b.render(stores)
 
@@ -469,13 +473,15 @@ def radix_file(r):
     cores = (c_lines, t_lines, r_lines, g_lines, h_lines)
     tw = r - 1
     leaf_args = ("const double* inRe, const double* inIm, double* outRe, double* outIm, "
-                 "ptrdiff_t is, ptrdiff_t os, ptrdiff_t c")
+                 "ptrdiff_t li, ptrdiff_t ls, ptrdiff_t lo, ptrdiff_t os, ptrdiff_t c")
     tw_args = ("double* re, double* im, const double* twCos, const double* twSin, "
                "ptrdiff_t os, ptrdiff_t m")
     rleaf_args = "const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c"
     rtw_args = "double* data, const double* twCos, const double* twSin, ptrdiff_t os, ptrdiff_t m"
-    leaf_call = "Dft%s(%%s, inRe + t * is, inIm + t * is, ls, outRe + t * %d * os, outIm + t * %d * os, os);" % (rr, r, r)
-    tw_call = "DftTw%s(%%s, re + k * os, im + k * os, s, twCos + (k - 1) * %d, twSin + (k - 1) * %d);" % (rr, tw, tw)
+    leaf_call = "Dft%s(%%s, inRe + t * li, inIm + t * li, ls, outRe + t * lo, outIm + t * lo, os);" % rr
+    # Grouped twiddles: butterfly k's entries start at (k / 4) * g + pos(k % 4),
+    # pos = 0, 2, 1, 3; the sines four doubles after the cosines.
+    tw_call = "DftTw%s(%%s, re + k * os, im + k * os, s, tw + %%s, tw + %%s + 4);" % rr
     rleaf_call = "RealDft%s(%%s, in + t * is, ls, out + t * %d * os, os);" % (rr, r)
     rtw_call = ("RealTw%s(%%s, data + k * os, data + (m - k) * os, s, twCos + (k - 1) * %d, "
                 "twSin + (k - 1) * %d);" % (rr, tw, tw))
@@ -521,7 +527,8 @@ def radix_file(r):
         "using fftk::Interleaved4Access;",
         "using fftk::Interleaved4FirstAccess;",
         "using fftk::Lane4Access;",
-        "using fftk::Lane4FirstAccess;",
+        "using fftk::Lane4TwAccess;",
+        "using fftk::Lane4TwFirstAccess;",
         "",
     ]
     wide += core_templates(rr, cores)
@@ -529,16 +536,15 @@ def radix_file(r):
         "// Transforms 0, 1, ... four at a time, three left run as four with one repeated;",
         "// returns how many ran.",
         "ptrdiff_t ComplexLeafGroups(%s) {" % leaf_args,
-        "  const ptrdiff_t ls = c * is;",
         "  ptrdiff_t t = 0;",
         "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
-        "    const Interleaved4Access p{is, %d * os, 0, 0};" % r,
+        "    const Interleaved4Access p{li, lo, 0, 0};",
         "    for (; t + 3 < c; t += 4) " + leaf_call % "p",
-        "    if (c - t == 3) " + leaf_call % "Interleaved4Access{is, %d * os, 0, 0, 2}" % r,
+        "    if (c - t == 3) " + leaf_call % "Interleaved4Access{li, lo, 0, 0, 2}",
         "  } else {",
-        "    const Lane4Access p{is, %d * os, 0, 0};" % r,
+        "    const Lane4Access p{li, lo, 0, 0};",
         "    for (; t + 3 < c; t += 4) " + leaf_call % "p",
-        "    if (c - t == 3) " + leaf_call % "Lane4Access{is, %d * os, 0, 0, 2}" % r,
+        "    if (c - t == 3) " + leaf_call % "Lane4Access{li, lo, 0, 0, 2}",
         "  }",
         "  return c - t == 3 ? c : t;",
         "}",
@@ -547,19 +553,19 @@ def radix_file(r):
         "// m >= 4. Returns the next one.",
         "ptrdiff_t ComplexTwiddleGroups(%s) {" % tw_args,
         "  const ptrdiff_t s = m * os;",
+        "  const double* tw = twCos;  // grouped: the sines follow the cosines",
+        "  (void)twSin;",
         "  ptrdiff_t k = 4;",
         "  if (im == re + 1) {",
-        "    DftTw%s(Interleaved4FirstAccess{os, os, 0, %d}, re, im, s, twCos, twSin);" % (rr, tw),
-        "    const Interleaved4Access p{os, os, 0, %d};" % tw,
-        "    for (; k + 3 < m; k += 4) " + tw_call % "p",
-        "    if (m - k == 3) " + tw_call % ("Interleaved4Access{os, os, 0, %d, 2}" % tw),
+        "    DftTw%s(Interleaved4FirstAccess{os, os, 0, 0}, re, im, s, tw, tw + 4);" % rr,
+        "    const Interleaved4Access p{os, os, 0, 0};",
+        "    for (; k + 3 < m; k += 4) " + tw_call % ("p", "k / 4 * %d" % (8 * tw), "k / 4 * %d" % (8 * tw)),
         "  } else {",
-        "    DftTw%s(Lane4FirstAccess{os, os, 0, %d}, re, im, s, twCos, twSin);" % (rr, tw),
-        "    const Lane4Access p{os, os, 0, %d};" % tw,
-        "    for (; k + 3 < m; k += 4) " + tw_call % "p",
-        "    if (m - k == 3) " + tw_call % ("Lane4Access{os, os, 0, %d, 2}" % tw),
+        "    DftTw%s(Lane4TwFirstAccess{os, os, 0, 0}, re, im, s, tw, tw + 4);" % rr,
+        "    const Lane4TwAccess p{os, os, 0, 0};",
+        "    for (; k + 3 < m; k += 4) " + tw_call % ("p", "k / 4 * %d" % (8 * tw), "k / 4 * %d" % (8 * tw)),
         "  }",
-        "  return m - k == 3 ? m : k;",
+        "  return k;",
         "}",
         "",
         "ptrdiff_t RealLeafGroups(%s) {" % rleaf_args,
@@ -595,14 +601,13 @@ def radix_file(r):
     out += [
         "FFTK_CLONES",
         "void FftComplexLeaf%s(%s) {" % (rr, leaf_args),
-        "  const ptrdiff_t ls = c * is;",
         "  ptrdiff_t t = 0;",
-    ] + dispatch("c >= 3", "t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, is, os, c)") + [
+    ] + dispatch("c >= 3", "t = wide::ComplexLeafGroups(inRe, inIm, outRe, outIm, li, ls, lo, os, c)") + [
         "  if (inIm == inRe + 1 && outIm == outRe + 1) {",
-        "    const InterleavedAccess p{is, %d * os, 0, 0};" % r,
+        "    const InterleavedAccess p{li, lo, 0, 0};",
         "    for (; t + 1 < c; t += 2) " + leaf_call % "p",
         "  } else {",
-        "    const LaneAccess p{is, %d * os, 0, 0};" % r,
+        "    const LaneAccess p{li, lo, 0, 0};",
         "    for (; t + 1 < c; t += 2) " + leaf_call % "p",
         "  }",
         "  for (; t < c; ++t) " + leaf_call % "ScalarAccess{}",
@@ -611,22 +616,27 @@ def radix_file(r):
         "FFTK_CLONES",
         "void FftComplexTwiddle%s(%s) {" % (rr, tw_args),
         "  const ptrdiff_t s = m * os;",
-    ] + (["  ptrdiff_t k = 0;"] +
-         dispatch("m >= 4", "k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m)") +
-         ["  if (k == 0) {",
-          "    Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
-          "    k = 1;",
-          "  }"] if has_wide else
-         ["  Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
-          "  ptrdiff_t k = 1;"]) + [
-        "  if (im == re + 1) {",
-        "    const InterleavedAccess p{os, os, 0, %d};" % tw,
-        "    for (; k + 1 < m; k += 2) " + tw_call % "p",
-        "  } else {",
-        "    const LaneAccess p{os, os, 0, %d};" % tw,
-        "    for (; k + 1 < m; k += 2) " + tw_call % "p",
+        "  const double* tw = twCos;  // grouped: the sines follow the cosines",
+        "  (void)twSin;",
+        "  ptrdiff_t k = 0;",
+    ] + dispatch("m >= 4", "k = wide::ComplexTwiddleGroups(re, im, twCos, twSin, os, m)") + [
+        "  if (k == 0) {  // butterfly 0 untwiddled, 1 alone, so that pairs start even",
+        "    Dft%s(ScalarAccess{}, re, im, s, re, im, s);" % rr,
+        "    if (m > 1) " + tw_call.replace("re + k * os, im + k * os", "re + os, im + os") % ("ScalarAccess{}", "2", "2"),
+        "    k = 2;",
         "  }",
-        "  for (; k < m; ++k) " + tw_call % "ScalarAccess{}",
+        "  // Pairs k, k + 1 (k even) sit at pos 0, 2 or 1, 3 of their group.",
+        "  if (im == re + 1) {",
+        "    const InterleavedAccess p{os, os, 0, 2};",
+        "    for (; k + 1 < m; k += 2) " + tw_call % ("p", "k / 4 * %d + k %% 4 / 2" % (8 * tw), "k / 4 * %d + k %% 4 / 2" % (8 * tw)),
+        "  } else {",
+        "    const LaneAccess p{os, os, 0, 2};",
+        "    for (; k + 1 < m; k += 2) " + tw_call % ("p", "k / 4 * %d + k %% 4 / 2" % (8 * tw), "k / 4 * %d + k %% 4 / 2" % (8 * tw)),
+        "  }",
+        "  for (; k < m; ++k) {",
+        "    const ptrdiff_t at = k / 4 * %d + (k %% 2) * 2 + k %% 4 / 2;" % (8 * tw),
+        "    " + tw_call % ("ScalarAccess{}", "at", "at"),
+        "  }",
         "}",
         "",
         "FFTK_CLONES",
@@ -663,7 +673,7 @@ def header_file():
         rr = "%02d" % r
         out += [
             "void FftComplexLeaf%s(const double* inRe, const double* inIm, double* outRe, double* outIm," % rr,
-            "                      ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);",
+            "                      ptrdiff_t li, ptrdiff_t ls, ptrdiff_t lo, ptrdiff_t os, ptrdiff_t c);",
             "void FftComplexTwiddle%s(double* re, double* im, const double* twCos, const double* twSin," % rr,
             "                         ptrdiff_t os, ptrdiff_t m);",
             "void FftRealLeaf%s(const double* in, double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);" % rr,

@@ -131,6 +131,95 @@ TEST(Fft, MatchesDirectDftLargeLengths) {
   for (int32_t n : {1763, 1849, 2021, 2491, 2438, 3127, 4096, 4999, 10007, 30030, 65536})
     CheckLength(n);
 }
+// From 16384 up, complex transforms with three or more factors and a
+// specialised leaf run every leaf before combining: just below and at that
+// length, smallest factors 2, 3 and 5 (moved behind a large first one) and
+// 32, leaf radices 32, 16 and 10, the largest 2*3*5 lengths, a generic-prime
+// leaf (which keeps the recursion), and 2^20.
+TEST(Fft, MatchesDirectDftLeafFirstLengths) {
+  for (int32_t n : {16383, 16384, 3 * 8192, 5 * 4096, 15 * 2048, 81 * 625, 2 * 3 * 5 * 4096,
+                    23 * 1024, 786432, 1048576})
+    CheckLength(n);
+}
+
+// ---- the inverse real transform ----------------------------------------------------------
+// A random packed half-complex X (any such array is a Hermitian spectrum)
+// against the direct sum n x[j] = X0 + 2 sum_(0<k<n/2) (Re Xk cos - Im Xk sin)
+// + (-1)^j X(n/2), in long double, at every j up to n = 4096 and 64 random
+// ones above; then FftReal of the result must give n X back. Both in two
+// stride layouts. Bound as for the forward transforms.
+void CheckInverse(int32_t n) {
+  const size_t un = static_cast<size_t>(n);
+  const std::vector<double> spec = Random(un, 0x51ed + un);
+  std::vector<int64_t> points;
+  std::mt19937_64 pick(n + 1);
+  for (int64_t i = 0; i < (n <= 4096 ? n : 64); ++i)
+    points.push_back(n <= 4096 ? i : static_cast<int64_t>(pick() % un));
+  std::vector<LD> expect, c(un), sn(un);
+  for (size_t e = 0; e < un; ++e) {
+    c[e] = std::cos(kTwoPi * e / n);
+    sn[e] = std::sin(kTwoPi * e / n);
+  }
+  LD norm = 0.0L;
+  for (int64_t j : points) {
+    LD sum = spec[0];
+    for (int64_t k = 1, e = j % n; 2 * k < n; ++k, e = (e + j) % n)
+      sum += 2.0L * (spec[k] * c[e] - spec[n - k] * sn[e]);
+    if (n % 2 == 0) sum += (j % 2 == 0 ? 1 : -1) * static_cast<LD>(spec[n / 2]);
+    expect.push_back(sum);
+    norm += sum * sum;
+  }
+  FftPlan* plan = FftPlanAcquire(n);
+  ASSERT_NE(plan, nullptr);
+  const double bound = 20.0 * DBL_EPSILON * std::max(1.0, std::log2(n));
+  std::vector<double> spread(3 * un);  // spec at stride 3
+  for (size_t k = 0; k < un; ++k) spread[3 * k] = spec[k];
+  struct Layout {
+    const double* in;
+    int32_t is, os;
+  };
+  for (const Layout& l : {Layout{spec.data(), 1, 1}, Layout{spread.data(), 3, 2}}) {
+    std::vector<double> x(2 * un, 7.0), back(un);
+    ASSERT_EQ(FftHalfComplexToReal(plan, l.in, x.data(), l.is, l.os, n), 0);
+    LD err = 0.0L;
+    for (size_t b = 0; b < points.size(); ++b) {
+      const LD d = x[points[b] * l.os] - expect[b];
+      err += d * d;
+    }
+    const LD rel = std::sqrt(err / std::max(norm, 1e-300L));
+    EXPECT_LE(static_cast<double>(rel), bound) << "n = " << n << " stride " << l.is;
+    if (l.os == 2) {  // the gaps stay untouched
+      for (size_t j = 0; j < un; ++j) ASSERT_EQ(x[2 * j + 1], 7.0) << "n = " << n;
+    }
+    // Round trip: FftReal(x) = n X.
+    ASSERT_EQ(FftReal(plan, x.data(), back.data(), l.os, 1, n), 0);
+    LD rerr = 0.0L, rnorm = 0.0L;
+    for (size_t k = 0; k < un; ++k) {
+      const LD want = static_cast<LD>(n) * spec[k];
+      rerr += (back[k] - want) * (back[k] - want);
+      rnorm += want * want;
+    }
+    EXPECT_LE(static_cast<double>(std::sqrt(rerr / rnorm)), 2 * bound) << "round trip n = " << n;
+  }
+  FftPlanRelease(plan);
+}
+
+// Odd and even lengths from 1, primes (generic, Rader), 2*3*5 composites and
+// their multiples of 2^k, and powers of two to 2^20; even lengths run on the
+// half-length complex plan, odd ones on the forward real transform.
+TEST(Fft, HalfComplexToRealMatchesDirectSum) {
+  for (int32_t n = 1; n <= 64; ++n) CheckInverse(n);
+  for (int32_t n : {97, 101, 106, 107, 120, 210, 214, 360, 900, 1000, 1024, 1125, 2048, 3000,
+                    3375, 4096, 4999, 5120, 10007, 15360, 30030, 49152, 65536, 245760, 262144,
+                    759375, 1048576})
+    CheckInverse(n);
+  FftPlan* one = FftPlanAcquire(3);
+  double in[3] = {1.0, 2.0, 3.0}, out[3] = {7.0, 7.0, 7.0};
+  EXPECT_EQ(FftHalfComplexToReal(one, in, out, 1, 1, 4), -20999);
+  EXPECT_EQ(FftHalfComplexToReal(nullptr, in, out, 1, 1, 3), -20999);
+  EXPECT_TRUE(out[0] == 7.0 && out[1] == 7.0 && out[2] == 7.0);
+  FftPlanRelease(one);
+}
 
 // ---- plans ------------------------------------------------------------------------------
 // One plan per length, counted; a Rader plan holds its sub-plan (107 -> 106 =
@@ -172,9 +261,10 @@ TEST(Fft, PlansAreSharedCountedAndFreed) {
   EXPECT_TRUE(factor[0] == 46327 && factor[1] == 46337);
 }
 
-// Every allocation of planning and of the prime kernels' per-call scratch
-// fails in turn (once, then from there on): null or -20001, never a leak, and
-// the run that no longer reaches the failure completes.
+// Every allocation of planning, of the half-length plan the real transforms
+// of even n build on first use, and of the per-call scratch fails in turn
+// (once, then from there on): null or -20001, never a leak, and the run that
+// no longer reaches the failure completes.
 TEST(Fft, AllocationFailuresGiveNullOrNoMemoryAndLeakNothing) {
   for (int32_t n : {46, 107, 3127}) {
     const std::vector<double> x = Random(2 * static_cast<size_t>(n), n);
@@ -185,34 +275,39 @@ TEST(Fft, AllocationFailuresGiveNullOrNoMemoryAndLeakNothing) {
       for (int64_t k = 1; !completed; ++k) {
         NumAllocFailAt(k, persistent);
         FftPlan* plan = FftPlanAcquire(n);
-        StatusCode sc = 0, sr = 0;
+        StatusCode sc = 0, sr = 0, si = 0;
         if (plan != nullptr) {
           sc = FftComplex(plan, x.data(), x.data() + 1, y.data(), y.data() + 1, 2, 2, n);
           sr = FftReal(plan, x.data(), y.data(), 1, 1, n);
+          si = FftHalfComplexToReal(plan, x.data(), y.data(), 1, 1, n);
           FftPlanRelease(plan);
         }
         completed = NumAllocAttempts() < k;
         NumAllocFailAt(0, false);
         ASSERT_EQ(NumAllocOutstanding(), before) << "n = " << n << " k = " << k;
-        ASSERT_TRUE((sc == 0 || sc == -20001) && (sr == 0 || sr == -20001)) << sc << " " << sr;
-        EXPECT_TRUE(!completed || (plan != nullptr && sc == 0 && sr == 0));
+        ASSERT_TRUE((sc == 0 || sc == -20001) && (sr == 0 || sr == -20001) &&
+                    (si == 0 || si == -20001))
+            << sc << " " << sr << " " << si;
+        EXPECT_TRUE(!completed || (plan != nullptr && sc == 0 && sr == 0 && si == 0));
       }
     }
   }
 }
 
 // Threads acquire, transform and release generic, Rader and nested Rader
-// lengths at once, so plans are built and freed under one another's feet;
-// every result must be the one computed alone.
+// lengths at once, so plans (and the half-length plans of the even real
+// transforms, made on first use) are built and freed under one another's
+// feet; every result must be the one computed alone.
 TEST(Fft, ConcurrentUseGivesSingleThreadedResults) {
   const int32_t lengths[] = {106, 53, 107, 2438, 47, 736, 1000};
   auto run = [](int32_t n) {
     const std::vector<double> x = Random(2 * static_cast<size_t>(n), n);
-    std::vector<double> y(3 * static_cast<size_t>(n));
+    std::vector<double> y(4 * static_cast<size_t>(n));
     FftPlan* plan = FftPlanAcquire(n);
     if (plan == nullptr ||
         FftComplex(plan, x.data(), x.data() + 1, y.data(), y.data() + 1, 2, 2, n) != 0 ||
-        FftReal(plan, x.data(), y.data() + 2 * n, 1, 1, n) != 0)
+        FftReal(plan, x.data(), y.data() + 2 * n, 1, 1, n) != 0 ||
+        FftHalfComplexToReal(plan, x.data(), y.data() + 3 * n, 1, 1, n) != 0)
       y.clear();
     FftPlanRelease(plan);
     return y;
