@@ -98,8 +98,50 @@ StatusCode Setup(HankelFft& h, const T* x, int32_t rows, int32_t cols) {
   if (!h.X || !h.a || !h.b) return status::kNoMemory;
   h.plan = FftPlanAcquire(h.N);
   if (h.plan == nullptr) return status::kNoMemory;
+  if constexpr (!kIsComplex<T>) {
+    // Real records take the real transform: X in packed half-complex order in
+    // the first N doubles of h.X.
+    double* a = reinterpret_cast<double*>(h.a.get());
+    std::copy(x, x + span, a);
+    std::fill(a + span, a + h.N, 0.0);
+    return FftReal(h.plan, a, reinterpret_cast<double*>(h.X.get()), 1, 1, h.N);
+  }
   for (int64_t t = 0; t < span; ++t) h.a[t] = Complex(Real(x[t]), Imag(x[t]));
   return Dft(h, h.a.get(), h.X.get());
+}
+
+// The real form of Product below: the same two steps on the real transform
+// and its inverse, with the spectral product taken in packed half-complex
+// order (element k holds Re, element N - k Im, of frequency k).
+StatusCode ProductReal(HankelFft& h, const double* in, int64_t is, double* out, int64_t os,
+                       bool adjoint) {
+  double* a = reinterpret_cast<double*>(h.a.get());
+  double* b = reinterpret_cast<double*>(h.b.get());
+  const double* X = reinterpret_cast<const double*>(h.X.get());
+  const int32_t N = h.N;
+  const int32_t count = adjoint ? h.rows : h.cols;
+  for (int32_t j = 0; j < count; ++j) a[j] = in[j * is];
+  std::fill(a + count, a + N, 0.0);
+  StatusCode st = FftReal(h.plan, a, b, 1, 1, N);
+  if (st != status::kOk) return st;
+  // B X for H v (a convolution); conj(B) X for H^T u (the correlation
+  // c[k] = sum_i x[i+k] u_i, read backwards).
+  const double sign = adjoint ? -1.0 : 1.0;
+  a[0] = b[0] * X[0];
+  for (int32_t k = 1; k < N - k; ++k) {
+    const double br = b[k], bi = sign * b[N - k], xr = X[k], xi = X[N - k];
+    a[k] = br * xr - bi * xi;
+    a[N - k] = br * xi + bi * xr;
+  }
+  if (N % 2 == 0) a[N / 2] = b[N / 2] * X[N / 2];
+  st = FftHalfComplexToReal(h.plan, a, b, 1, 1, N);
+  if (st != status::kOk) return st;
+  const double scale = 1.0 / N;
+  const int32_t outCount = adjoint ? h.cols : h.rows;
+  for (int32_t i = 0; i < outCount; ++i) {
+    out[i * os] = b[adjoint ? h.cols - 1 - i : i + h.cols - 1] * scale;
+  }
+  return status::kOk;
 }
 
 // out = H in (adjoint false: cols values in, rows out) or H^H in (rows in, cols
@@ -109,6 +151,7 @@ StatusCode Setup(HankelFft& h, const T* x, int32_t rows, int32_t cols) {
 // correlation, read backwards).
 template <typename T>
 StatusCode Product(HankelFft& h, const T* in, int64_t is, T* out, int64_t os, bool adjoint) {
+  if constexpr (!kIsComplex<T>) return ProductReal(h, in, is, out, os, adjoint);
   Complex* a = h.a.get();
   Complex* b = h.b.get();
   const int32_t count = adjoint ? h.rows : h.cols;
