@@ -74,6 +74,12 @@ struct HankelFft {
   HankelFft() = default;
   HankelFft(const HankelFft&) = delete;
   HankelFft& operator=(const HankelFft&) = delete;
+  // The record's DFT and the scratch, once no more products are needed.
+  void Release() {
+    X.reset();
+    a.reset();
+    b.reset();
+  }
   ~HankelFft() { FftPlanRelease(plan); }
 };
 
@@ -207,6 +213,7 @@ struct HankelOperator {
   StatusCode Apply(const T* in, T* out, bool adjoint) {
     return Product(h, in, 1, out, 1, adjoint);
   }
+  void Release() { h.Release(); }
 };
 
 // A = [F; Bk] (2q x p, q = n - p), the forward-backward prediction matrix of
@@ -233,6 +240,11 @@ struct ForwardBackwardOperator {
     t = AllocWorkUninit<T>(len);
     if (!s || !t) return status::kNoMemory;
     return Setup(h, x, q + 1, p);
+  }
+  void Release() {
+    h.Release();
+    s.reset();
+    t.reset();
   }
   StatusCode Apply(const T* in, T* out, bool adjoint) {
     T* a = s.get();
@@ -453,20 +465,21 @@ StatusCode SvdLeadingOf(Op& op, int32_t count, double* S, T* U, T* V) {
   }
 
   for (int32_t i = 0; i < count; ++i) S[i] = s[i];
-  // A's right vectors (Vq, vn rows) and left ones (Uq, un rows), row-major out.
-  auto copy = [count](T* to, const T* from, int32_t n) {
-    for (int32_t i = 0; i < count; ++i) {
-      const T* col = from + int64_t{i} * n;
-      for (int32_t r = 0; r < n; ++r) to[int64_t{r} * count + i] = col[r];
+  // A's right vectors (Vq, vn rows) and left ones (Uq, un rows), row-major
+  // out. Each basis is released once copied, and the FFT buffers before
+  // either: the outputs never add to the bidiagonalization's peak memory.
+  op.Release();
+  auto copy = [count](T* to, WorkArray<T>& from, int32_t n) {
+    if (to != nullptr) {
+      for (int32_t i = 0; i < count; ++i) {
+        const T* col = from.get() + int64_t{i} * n;
+        for (int32_t r = 0; r < n; ++r) to[int64_t{r} * count + i] = col[r];
+      }
     }
+    from.reset();
   };
-  if (flip) {
-    copy(V, Uq, un);
-    if (U != nullptr) copy(U, Vq, vn);
-  } else {
-    copy(V, Vq, vn);
-    if (U != nullptr) copy(U, Uq, un);
-  }
+  copy(flip ? U : V, Vb, vn);
+  copy(flip ? V : U, Ub, un);
   return status::kOk;
 }
 
