@@ -130,7 +130,7 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
   }
   const size_t mm = static_cast<size_t>(m);
   WorkArray<Complex> cwork = AllocWorkUninit<Complex>(mm * mm + 3 * mm);
-  WorkArray<double> dwork = AllocWorkUninit<double>(6 * mm);
+  WorkArray<double> dwork = AllocWorkUninit<double>(7 * mm);
   if (!cwork || !dwork) return status::kNoMemory;
   Complex* G = cwork.get();  // column-major, upper triangle
   Complex* p = G + mm * mm;  // z^n
@@ -142,10 +142,12 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
   double* accIm = accRe + mm;
   double* wRe = accIm + mm;
   double* wIm = wRe + mm;
+  double* absP = wIm + mm;  // |p_i|
 
   const double nn = static_cast<double>(n);
   for (size_t i = 0; i < mm; ++i) {
     p[i] = PowerN(z[i], n);
+    absP[i] = std::sqrt(Abs2(p[i]));
     colSum[i] = 0.0;
   }
   // G, its entries' error bounds (squared, summed over both triangles) and
@@ -172,33 +174,49 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
     trace += g;
     colSum[i] += std::fabs(g);
   }
+  // Off the diagonal, plain real arithmetic: |1 - w| >= 1/n keeps the
+  // division's denominator away from underflow, and a non-finite entry shows
+  // in the summed bounds.
   for (size_t j = 0; j < mm; ++j) {
+    const double zjr = z[j].real(), zji = z[j].imag();
+    const double pjr = p[j].real(), pji = p[j].imag();
     for (size_t i = 0; i < j; ++i) {
-      const double wr = z[i].real() * z[j].real() + z[i].imag() * z[j].imag();
-      const double wi = z[i].real() * z[j].imag() - z[i].imag() * z[j].real();
-      const Complex d(1.0 - wr, -wi);
-      const double ad = std::abs(d);
-      Complex g;
-      double e = 0.0;
-      if (nn * ad >= 1.0) {
-        const Complex pp = std::conj(p[i]) * p[j];
-        g = (Complex(1.0, 0.0) - pp) / d;
-        e = ((2.0 * nn + 4.0) * std::abs(pp) + 3.0) / ad + 4.0 * std::abs(g);
+      const double zir = z[i].real(), zii = z[i].imag();
+      const double wr = zir * zjr + zii * zji;
+      const double wi = zir * zji - zii * zjr;
+      const double dr = 1.0 - wr, di = -wi;
+      const double dd = dr * dr + di * di;
+      double gr = 0.0, gi = 0.0, e = 0.0;
+      if (nn * nn * dd >= 1.0) {
+        const double pir = p[i].real(), pii = p[i].imag();
+        const double nr = 1.0 - (pir * pjr + pii * pji);  // 1 - conj(p_i) p_j
+        const double ni = -(pir * pji - pii * pjr);
+        gr = (nr * dr + ni * di) / dd;
+        gi = (ni * dr - nr * di) / dd;
+        const double ad = std::sqrt(dd);
+        e = ((2.0 * nn + 4.0) * absP[i] * absP[j] + 3.0) / ad +
+            4.0 * std::sqrt(gr * gr + gi * gi);
       } else {
-        g = GeometricSumNearOne(wr, wi, n);
-        e = 8.0 * std::abs(g);
+        const Complex g = GeometricSumNearOne(wr, wi, n);
+        gr = g.real();
+        gi = g.imag();
+        e = 8.0 * std::sqrt(gr * gr + gi * gi);
       }
       e += 2.0 * nn * a[i] * a[j];
-      G[j * mm + i] = g;
+      G[j * mm + i] = Complex(gr, gi);
       errG2 += 2.0 * e * e;
-      const double ag = std::abs(g);
+      const double ag = std::sqrt(gr * gr + gi * gi);
       colSum[i] += ag;
       colSum[j] += ag;
     }
   }
   double normG1 = 0.0;
-  for (size_t j = 0; j < mm; ++j) normG1 = std::max(normG1, colSum[j]);
-  if (!Finite(errG2) || !Finite(trace) || !Finite(normG1)) return status::kOk;
+  double total = 0.0;  // NaN passes std::max by, not a sum
+  for (size_t j = 0; j < mm; ++j) {
+    normG1 = std::max(normG1, colSum[j]);
+    total += colSum[j];
+  }
+  if (!Finite(errG2) || !Finite(trace) || !Finite(total)) return status::kOk;
 
   // b_i = sum_t x_t conj(z_i)^t, Horner's rule from the last sample, all
   // poles a sample at a time.
