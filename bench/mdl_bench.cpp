@@ -85,8 +85,8 @@ int main(int argc, char** argv) {
             Complex(g(rng), g(rng));
   }
   std::printf("n = %d, upper order %d\n", n, L);
-  std::printf("%-8s %10s %10s %10s %8s %11s %11s\n", "form", "full s", "fast s", "eig s",
-              "speedup", "eig share", "orders");
+  std::printf("%-8s %10s %10s %10s %8s %11s %11s\n", "form", "full s", "fast s", "eig s", "speedup",
+              "eig share", "orders");
   for (int form = 0; form < 2; ++form) {
     const bool cx = form == 1;
     int32_t full = -1, fast = -1;
@@ -98,8 +98,8 @@ int main(int argc, char** argv) {
     });
     const double tFast = BestOfTwo([&] {
       fast = 0;
-      const StatusCode st = cx ? MdlOrderComplex(xc.data(), n, L, 1, &fast)
-                               : MdlOrderReal(xr.data(), n, L, 1, &fast);
+      const StatusCode st =
+          cx ? MdlOrderComplex(xc.data(), n, L, 1, &fast) : MdlOrderReal(xr.data(), n, L, 1, &fast);
       if (st != 0) std::fprintf(stderr, "fast: %d\n", st);
     });
     const double tEig = BestOfTwo([&] {

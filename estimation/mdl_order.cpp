@@ -194,8 +194,7 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
         gr = (nr * dr + ni * di) / dd;
         gi = (ni * dr - nr * di) / dd;
         const double ad = std::sqrt(dd);
-        e = ((2.0 * nn + 4.0) * absP[i] * absP[j] + 3.0) / ad +
-            4.0 * std::sqrt(gr * gr + gi * gi);
+        e = ((2.0 * nn + 4.0) * absP[i] * absP[j] + 3.0) / ad + 4.0 * std::sqrt(gr * gr + gi * gi);
       } else {
         const Complex g = GeometricSumNearOne(wr, wi, n);
         gr = g.real();
@@ -275,9 +274,8 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
   const double inverseG = 10.0 / (rcond * normG1);  // >= ||G^-1||_2, estimated
   if (!(eG * inverseG <= 0.25)) return status::kOk;
   const double nE = xx - q;
-  const double fastError =
-      2.0 * eG * amp2 + 4.0 * eB * amp + 3.0 * eB * eB * inverseG + 4.0 * kEps * xx +
-      2.0 * md * kEps * q;
+  const double fastError = 2.0 * eG * amp2 + 4.0 * eB * amp + 3.0 * eB * eB * inverseG +
+                           4.0 * kEps * xx + 2.0 * md * kEps * q;
   // The full fit's distance from the exact residual.
   const double rho = std::sqrt(std::max(nE + fastError, 0.0));
   const double kappa = std::sqrt(trace * inverseG);
@@ -314,8 +312,7 @@ double SquaredNorm(const T* x, int32_t n) {
 }
 
 template <typename T>
-StatusCode MdlOrder(const T* x, int32_t n, int32_t L, int32_t minOrder, bool fast,
-                    int32_t* order) {
+StatusCode MdlOrder(const T* x, int32_t n, int32_t L, int32_t minOrder, bool fast, int32_t* order) {
   if constexpr (kIsComplex<T>) {
     // The complex form leaves minOrder to its entry point and reports a bad upper
     // order with the general order code.

@@ -15,6 +15,7 @@
 
 #include "estimation/estimation.h"
 #include "numeric/lapack_boundary.h"
+#include "numeric/work.h"
 
 namespace {
 
@@ -35,17 +36,17 @@ enum class Shape { kModes, kNoise, kConstant, kSpike, kRamp, kAlternating, kGrow
 
 struct Record {
   Shape shape;
-  int modes;      // kModes: how many
-  bool damped;    // kModes: damped modes
-  double snrDb;   // noise below the signal; infinity for none
-  double scale;   // every sample multiplied by this
+  int modes;     // kModes: how many
+  bool damped;   // kModes: damped modes
+  double snrDb;  // noise below the signal; infinity for none
+  double scale;  // every sample multiplied by this
   int32_t n, upper, minOrder;
   uint64_t seed;
 };
 
 std::string Describe(const Record& r, bool complexForm) {
-  static const char* kNames[] = {"modes", "noise", "constant", "spike", "ramp", "alternating",
-                                 "growing"};
+  static const char* kNames[] = {"modes", "noise",       "constant", "spike",
+                                 "ramp",  "alternating", "growing"};
   char text[200];
   std::snprintf(text, sizeof text, "%s %s %d%s snr %g dB scale %g n %d upper %d min %d",
                 complexForm ? "complex" : "real", kNames[static_cast<int>(r.shape)], r.modes,
@@ -98,8 +99,8 @@ std::vector<Complex> Samples(const Record& r, bool complexForm) {
     power += std::norm(complexForm ? v : Complex(v.real(), 0.0));
   }
   if (std::isfinite(r.snrDb)) {
-    const double sigma = std::sqrt(power / r.n * std::pow(10.0, -r.snrDb / 10.0) /
-                                   (complexForm ? 2.0 : 1.0));
+    const double sigma =
+        std::sqrt(power / r.n * std::pow(10.0, -r.snrDb / 10.0) / (complexForm ? 2.0 : 1.0));
     for (Complex& v : x) v += sigma * Complex(rng.Normal(), rng.Normal());
   }
   for (Complex& v : x) v *= r.scale;
@@ -138,8 +139,8 @@ std::vector<Record> Table() {
   struct Size {
     int32_t n, upper;
   };
-  const Size sizes[] = {{8, 2},   {8, 5},   {16, 4},   {16, 10},  {33, 6},
-                        {33, 22}, {64, 12}, {64, 42},  {128, 24}, {128, 85}, {257, 40}};
+  const Size sizes[] = {{8, 2},   {8, 5},   {16, 4},   {16, 10},  {33, 6},  {33, 22},
+                        {64, 12}, {64, 42}, {128, 24}, {128, 85}, {257, 40}};
   const double scales[] = {1e-6, 1.0, 1e6};
   for (const Size& z : sizes) {
     for (int s = 0; s < 3; ++s) {
@@ -149,8 +150,8 @@ std::vector<Record> Table() {
           if (2 * modes > z.upper + 6) continue;
           for (const bool damped : {false, true}) {
             for (const double snr : {kNone, 40.0, 20.0, 0.0}) {
-              table.push_back({Shape::kModes, modes, damped, snr, scales[s], z.n, z.upper,
-                               minOrder, seed++});
+              table.push_back(
+                  {Shape::kModes, modes, damped, snr, scales[s], z.n, z.upper, minOrder, seed++});
             }
           }
         }
@@ -185,11 +186,19 @@ std::vector<Record> Table() {
 
 TEST(MdlSearch, ChoosesTheOrderOfTheFullSearch) {
   int64_t records = 0, stops = 0, none = 0;
+  int64_t fullAllocations = 0, fastAllocations = 0;  // long records only
   for (const Record& r : Table()) {
     for (const bool complexForm : {false, true}) {
       const std::vector<Complex> x = Samples(r, complexForm);
+      NumAllocFailAt(0, false);
       const Outcome full = Search(x, r, complexForm, true);
+      const int64_t fullAttempts = NumAllocAttempts();
+      NumAllocFailAt(0, false);
       const Outcome fast = Search(x, r, complexForm, false);
+      if (r.n >= 512) {
+        fullAllocations += fullAttempts;
+        fastAllocations += NumAllocAttempts();
+      }
       ++records;
       stops += full.order >= 0 && full.order == r.minOrder;
       none += full.order < 0;
@@ -200,6 +209,11 @@ TEST(MdlSearch, ChoosesTheOrderOfTheFullSearch) {
   std::printf("%lld records, %lld at the smallest order, %lld with no order\n",
               static_cast<long long>(records), static_cast<long long>(stops),
               static_cast<long long>(none));
+  // A full fit takes a dozen work blocks, a fast score four: on the long
+  // records most candidates must have been passed over unfitted.
+  std::printf("work allocations on the long records: %lld fast, %lld full\n",
+              static_cast<long long>(fastAllocations), static_cast<long long>(fullAllocations));
+  EXPECT_LT(2 * fastAllocations, fullAllocations);
 }
 
 // Records the search refuses or cannot fit: the same status (and no order)
@@ -219,9 +233,9 @@ TEST(MdlSearch, RefusesWhatTheFullSearchRefuses) {
   withInf[3] = inf;
   for (double& v : huge) v *= 1e300;
   const Case cases[] = {
-      {"empty", {}, 2, 1},          {"upper above 2n/3", ramp, 21, 1},
-      {"upper at min", ramp, 3, 3}, {"min order 0", ramp, 5, 0},
-      {"a NaN", withNan, 6, 1},     {"an infinity", withInf, 6, 1},
+      {"empty", {}, 2, 1},           {"upper above 2n/3", ramp, 21, 1},
+      {"upper at min", ramp, 3, 3},  {"min order 0", ramp, 5, 0},
+      {"a NaN", withNan, 6, 1},      {"an infinity", withInf, 6, 1},
       {"near overflow", huge, 8, 1}, {"all zero", zeros, 8, 1},
   };
   for (const Case& c : cases) {
