@@ -117,6 +117,13 @@ bool PencilPrefersKrylov(int32_t n, int32_t L, int32_t M, bool complex);
                                       int32_t* order);
 [[nodiscard]] StatusCode MdlOrderComplex(const Complex* x, int32_t n, int32_t L,
                                          int32_t minOrder, int32_t* order);
+// The same search with every candidate's amplitudes fitted in full (the forms
+// above pass over, unfitted, the candidates a bounded fast score rules out):
+// the reference they must agree with, for tests and benchmarks.
+[[nodiscard]] StatusCode MdlOrderFullReal(const double* x, int32_t n, int32_t L,
+                                          int32_t minOrder, int32_t* order);
+[[nodiscard]] StatusCode MdlOrderFullComplex(const Complex* x, int32_t n, int32_t L,
+                                             int32_t minOrder, int32_t* order);
 
 // ---- parametric power spectra -----------------------------------------------------------------
 struct SpectrumResult {

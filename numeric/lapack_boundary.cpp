@@ -9,9 +9,12 @@
 //   tpqrt
 //   geev, syevd,   INFO < 0 -> -20999, INFO > 0 -> -20062
 //   heevd
+//   potrf, pocon   INFO < 0 -> -20999; potrf's own INFO > 0 (not positive
+//                  definite) is handed back as a result, not as a failure
+//                  (an injected one is a failure, -20062)
 // Workspace: gesdd, gelsd and geqrf take the size their own query (LWORK = -1)
 // reports; geqrt and tpqrt, which have no query, and the eigenvalue drivers are
-// sized by fixed formulas.
+// sized by fixed formulas; pocon's workspace is fixed by LAPACK (2n + n real).
 
 #include "numeric/lapack_boundary.h"
 
@@ -25,7 +28,7 @@
 
 namespace {
 
-enum class Driver { kGesdd, kGelsd, kGeqrf, kGeev, kSyevd };
+enum class Driver { kGesdd, kGelsd, kGeqrf, kGeev, kSyevd, kPotrf };
 
 // ---- injection ------------------------------------------------------------------------
 std::atomic<int64_t> g_fail_at{0};
@@ -50,6 +53,7 @@ StatusCode Mapped(Driver driver, lapack_int info) {
     case Driver::kGelsd:
       return info > 0 ? status::kNoConvergence : status::kOk;
     case Driver::kGeqrf:
+    case Driver::kPotrf:
     case Driver::kGeev:
     case Driver::kSyevd:
       return info < 0 ? status::kIllegalArgument : status::kNoConvergence;
@@ -406,6 +410,31 @@ StatusCode Syevd(char jobz, lapack_int n, Complex* a, double* w) {
   LAPACK_zheevd(&jobz, &uplo, &n, a, &n, w, work.get(), &lw, rwork.get(), &lrw, iwork.get(), &liw,
                 &info);
   return Done(Driver::kSyevd, info);
+}
+
+// ---- Cholesky ---------------------------------------------------------------------------
+StatusCode Potrf(lapack_int n, Complex* a, lapack_int lda, lapack_int* notDefinite) {
+  lapack_int info = 0;
+  *notDefinite = 0;
+  if (Injected(&info)) return Failed(Driver::kPotrf, info);
+  const char uplo = 'U';
+  LAPACK_zpotrf(&uplo, &n, a, &lda, &info);
+  if (info > 0) {
+    *notDefinite = info;
+    return status::kOk;
+  }
+  return Done(Driver::kPotrf, info);
+}
+
+StatusCode Pocon(lapack_int n, const Complex* a, lapack_int lda, double anorm, double* rcond) {
+  lapack_int info = 0;
+  if (Injected(&info)) return Failed(Driver::kPotrf, info);
+  WorkArray<Complex> work = AllocWorkUninit<Complex>(static_cast<size_t>(2 * int64_t{n}));
+  WorkArray<double> rwork = AllocWorkUninit<double>(static_cast<size_t>(n));
+  if (!work || !rwork) return status::kNoMemory;
+  const char uplo = 'U';
+  LAPACK_zpocon(&uplo, &n, a, &lda, &anorm, rcond, work.get(), rwork.get(), &info);
+  return Done(Driver::kPotrf, info);
 }
 
 StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, double* a, lapack_int lda,

@@ -78,6 +78,12 @@ inline void GemmCol(int32_t m, int32_t n, int32_t k, const Complex* A, int32_t l
   cblas_zgemm(CblasColMajor, CblasNoTrans, CblasNoTrans, m, n, k, &one, A, lda, B, ldb, &zero,
               C, ldc);
 }
+// x (n) replaced by op(A)^-1 x for the upper triangular A (column-major, lda),
+// op(A) = A, or its conjugate transpose with adjointA.
+inline void TrsvUpper(bool adjointA, int32_t n, const Complex* A, int32_t lda, Complex* x) {
+  cblas_ztrsv(CblasColMajor, CblasUpper, adjointA ? CblasConjTrans : CblasNoTrans, CblasNonUnit,
+              n, A, lda, x, 1);
+}
 // Euclidean norm of x (n values), without overflow or underflow on the way.
 inline double Nrm2(int32_t n, const double* x) { return cblas_dnrm2(n, x, 1); }
 inline double Nrm2(int32_t n, const Complex* x) { return cblas_dznrm2(n, x, 1); }
@@ -135,6 +141,18 @@ int64_t GeevWorkSize(int32_t n, bool complex);
 // Symmetric / Hermitian divide and conquer, UPLO 'U', eigenvalues ascending in w.
 [[nodiscard]] StatusCode Syevd(char jobz, lapack_int n, double* a, double* w);
 [[nodiscard]] StatusCode Syevd(char jobz, lapack_int n, Complex* a, double* w);
+
+// Cholesky factorization of the Hermitian a (UPLO 'U', complex only): a = R^H R
+// with R in the upper triangle. A matrix that is not positive definite is an
+// answer, not a failure: *notDefinite gets the order of the first leading minor
+// that is not (LAPACK's INFO > 0), 0 when a is, and the status stays 0.
+[[nodiscard]] StatusCode Potrf(lapack_int n, Complex* a, lapack_int lda, lapack_int* notDefinite);
+
+// Reciprocal 1-norm condition estimate of a Hermitian positive definite matrix
+// from its Cholesky factor (UPLO 'U', complex only); anorm is the matrix's own
+// 1-norm.
+[[nodiscard]] StatusCode Pocon(lapack_int n, const Complex* a, lapack_int lda, double anorm,
+                               double* rcond);
 
 }  // namespace lapack
 
