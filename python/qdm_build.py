@@ -16,9 +16,28 @@ import subprocess
 import sysconfig
 import zipfile
 
-NAME, VERSION = "qdm", "1.0.0"
 SONAME = "libqdm_api.so.1"
 HERE = os.path.dirname(os.path.abspath(__file__))
+
+
+def _version():
+    """The version is stated once, in the project() line of the repository's
+    CMakeLists.txt; an sdist carries it in its PKG-INFO."""
+    import re
+    for path, pattern in ((os.path.join(HERE, "..", "CMakeLists.txt"),
+                           r"project\(qdm VERSION ([0-9.]+)"),
+                          (os.path.join(HERE, "PKG-INFO"), r"(?m)^Version: (\S+)")):
+        try:
+            with open(path) as f:
+                m = re.search(pattern, f.read())
+            if m:
+                return m.group(1)
+        except OSError:
+            pass
+    raise RuntimeError("qdm's version: no ../CMakeLists.txt or PKG-INFO beside qdm_build.py")
+
+
+NAME, VERSION = "qdm", _version()
 
 METADATA = f"""Metadata-Version: 2.1
 Name: {NAME}
