@@ -400,6 +400,13 @@ QDM_PLAIN_API int32_t qdm_spectrum_length(int32_t points) {
   return points < 2 ? 0 : SpectrumLength(points);
 }
 
+QDM_PLAIN_API int32_t qdm_output_room(int32_t n, int32_t size) {
+  if (n < 1 || size < 1) return 0;
+  return static_cast<int32_t>(std::min<int64_t>(size, MaxOrderWide(n)));
+}
+
+QDM_PLAIN_API int32_t qdm_default_pencil(int32_t n) { return n < 1 ? 0 : n / 3; }
+
 // ---- covariance AR ----------------------------------------------------------------
 
 QDM_PLAIN_API int32_t qdm_covariance_real(const double* x, int32_t n, int32_t order,

@@ -194,7 +194,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   for (size_t i = 0; i < std::size(kIntOptions); ++i)
     resolved[i] = (o.*kIntOptions[i].field).value_or(kIntOptions[i].fallback);
   if (!o.order && m == kProny) resolved[0] = 6;
-  if (!o.pencil) resolved[2] = n / 3;
+  if (!o.pencil) resolved[2] = qdm_default_pencil(n);
   const auto [p, k, L, M, upper, minOrder, points] = resolved;
   Json par = Json::object(), res = Json::object();
   for (size_t i = 0; i < std::size(kIntOptions); ++i)
@@ -202,9 +202,9 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   if (m != kMdl) par["rate_hz"] = rate;
   if ((kModal & Bit(m)) && !s.complex) par["real_signal"] = flag;
   if (m == kPencil || m == kPcar) par["solver"] = o.solver;
-  // Outputs are sized from parameters the library accepts (orders below n) and,
-  // for a spectrum, from the library's own length for the points asked.
-  const size_t room = std::clamp(std::max({p, k, M}), 1, std::max(n, 1)) + 1;
+  // Outputs are sized by the library's own room for the size arguments and,
+  // for a spectrum, its own length for the points asked.
+  const size_t room = size_t(qdm_output_room(n, std::max({p, k, M}))) + 1;
   Array a(2 * room), z(2 * room), amp(room), phase(room), damping(room), freq(room);
   const int32_t length = (kSpectra & Bit(m)) ? qdm_spectrum_length(points) : 0;
   std::unique_ptr<double[]> db = (kSpectra & Bit(m)) ? SpectrumOutput(length) : nullptr;

@@ -116,6 +116,17 @@ QDM_PLAIN_API const char* qdm_status_text(int32_t status);
  *  then return ::QDM_ERR_SPECTRUM_SIZE). */
 QDM_PLAIN_API int32_t qdm_spectrum_length(int32_t points);
 
+/** Room an output needs for a size argument (order, pencil, components or
+ *  modes) on a record of n samples: min(size, floor(2n/3)), and 0 for n < 1 or
+ *  size < 1. Every fit refuses a size above floor(2n/3) before it writes, so
+ *  poles, roots and modes need at most this many values and coefficients one
+ *  more; an absurd request never becomes a huge output. */
+QDM_PLAIN_API int32_t qdm_output_room(int32_t n, int32_t size);
+
+/** The textbook pencil parameter for n samples, L = floor(n/3): the default of
+ *  the Python package and the tool. */
+QDM_PLAIN_API int32_t qdm_default_pencil(int32_t n);
+
 /* ---------------------------------------------------------------------------- */
 /** @name Covariance-method AR
  * Forward linear prediction over the n - p samples that have p predecessors,

@@ -133,10 +133,9 @@ def _int(v):
 
 
 def _room(v, n):
-    """Output room for a size argument v. Every order, pencil and count is
-    bounded by floor(2n/3), and the library refuses a larger one before it
-    writes anything, so an absurd request never becomes a huge allocation."""
-    return max(0, min(v, 2 * n // 3))
+    """Output room for a size argument v, as the library states it
+    (qdm_output_room): an absurd request never becomes a huge allocation."""
+    return _clib.qdm_output_room(n, v)
 
 
 def _real_flag(real_signal, is_complex, function):
@@ -294,7 +293,7 @@ def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False, solver="a
     x, c = _signal(x, "matrix_pencil")
     _solver(solver, "matrix_pencil")
     n = x.shape[0]
-    L = n // 3 if pencil is None else _int(pencil)
+    L = _clib.qdm_default_pencil(n) if pencil is None else _int(pencil)
     M = _int(modes)
     block, rows = _modes(4, _room(M, n))
     count, mse = _ct.c_int32(), _ct.c_double()

@@ -74,6 +74,10 @@ lib.qdm_status_text.restype = ctypes.c_char_p
 lib.qdm_status_text.argtypes = [_I]
 lib.qdm_spectrum_length.restype = _I
 lib.qdm_spectrum_length.argtypes = [_I]
+lib.qdm_output_room.restype = _I
+lib.qdm_output_room.argtypes = [_I, _I]
+lib.qdm_default_pencil.restype = _I
+lib.qdm_default_pencil.argtypes = [_I]
 lib.qdm_version.restype = ctypes.c_char_p
 lib.qdm_version.argtypes = []
 
