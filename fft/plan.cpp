@@ -3,6 +3,8 @@
 //
 // The list and the counts are guarded by the plan mutex; everything built here
 // is read-only once the plan is published, so transforms run without the lock.
+// The one exception is the half-length plan of the even real transforms,
+// attached on first use under the mutex and read through an atomic view.
 
 #include <atomic>
 #include <cmath>
