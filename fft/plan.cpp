@@ -202,9 +202,9 @@ FftPlan* CreatePlan(int32_t n) {
       if (plan->kind[s] == kFftKindKernel) {
         st = GroupTwiddles(stage, r, m);
         if (st != status::kOk) break;
-        // The plain table stays for the real kernels, which only odd n reach
-        // (even real lengths run on the half-length complex plan).
-        if (n % 2 == 0) {
+        // The plain table stays for the real kernels, which only odd and short
+        // n reach (longer even real lengths run on the half-length plan).
+        if (n % 2 == 0 && n >= kFftRealByHalfMin) {
           (void)NumFree(stage->twCos);
           (void)NumFree(stage->twSin);
           stage->twCos = stage->twSin = nullptr;
