@@ -3,6 +3,8 @@
 //
 // The list and the counts are guarded by the plan mutex; everything built here
 // is read-only once the plan is published, so transforms run without the lock.
+// The one exception is the half-length plan of the even real transforms,
+// attached on first use under the mutex and read through an atomic view.
 
 #include <atomic>
 #include <cmath>
@@ -200,9 +202,9 @@ FftPlan* CreatePlan(int32_t n) {
       if (plan->kind[s] == kFftKindKernel) {
         st = GroupTwiddles(stage, r, m);
         if (st != status::kOk) break;
-        // The plain table stays for the real kernels, which only odd n reach
-        // (even real lengths run on the half-length complex plan).
-        if (n % 2 == 0) {
+        // The plain table stays for the real kernels, which only odd and short
+        // n reach (longer even real lengths run on the half-length plan).
+        if (n % 2 == 0 && n >= kFftRealByHalfMin) {
           (void)NumFree(stage->twCos);
           (void)NumFree(stage->twSin);
           stage->twCos = stage->twSin = nullptr;

@@ -21,6 +21,12 @@ constexpr int kFftMaxRadix = 43;  // kernel tables are indexed 0..kFftMaxRadix
 // (fft/transform.cpp, LeafFirst).
 constexpr int32_t kFftLeafFirstMin = 16384;
 
+// Forward real transforms of even lengths from this one up run on the complex
+// plan of half the length; shorter and odd ones on the real kernels, which
+// are faster there. The inverse takes the half-length plan at every even
+// length (through the real kernels it would cost two more passes).
+constexpr int32_t kFftRealByHalfMin = 1024;
+
 // Factor kinds.
 constexpr int32_t kFftKindKernel = 0;  // specialised straight-line kernel
 constexpr int32_t kFftKindGeneric = 1;  // generic odd prime below 50
@@ -48,8 +54,10 @@ using FftRealTwiddleFn = void (*)(double* data, const double* twCos, const doubl
 struct FftStage {
   double* primeCos;  // kind 1: cos(2 pi k/r), k = 0..r-1
   double* primeSin;  // kind 1: -sin(2 pi k/r)
-  double* twCos;     // all but the last stage, except kernel stages of even n:
-  double* twSin;     // (r-1)*(m-1) twiddles at (k-1)*(r-1) + (j-1)
+  // All but the last stage, except kernel stages of even n >= kFftRealByHalfMin:
+  // (r-1)*(m-1) twiddles at (k-1)*(r-1) + (j-1).
+  double* twCos;
+  double* twSin;
   // Kernel stages but the last: the grouped table of the complex combining
   // kernels. Butterflies k = 4g..4g+3 form group g of 8*(r-1) doubles; leg j's
   // four cosines start at 8*(j-1) and its four sines 4 doubles later, with

@@ -162,10 +162,6 @@ StatusCode Run(const FftPlan* p, const double* inRe, const double* inIm, double*
   return Stage<kReal>(p, 0, inRe, inIm, outRe, outIm, is, os, p->n);
 }
 
-// Even lengths from this one up take the forward real transform through the
-// complex one of half the length (below, the real kernels are as fast).
-constexpr int32_t kRealByHalfMin = 2;
-
 using fftk::V2;
 V2 Load2(const double* p) {
   V2 v;
@@ -345,7 +341,8 @@ StatusCode FftComplex(const FftPlan* plan, const double* inRe, const double* inI
 StatusCode FftReal(const FftPlan* plan, const double* in, double* out, int32_t inStride,
                    int32_t outStride, int32_t n) {
   if (plan == nullptr || n != plan->n) return status::kFftRealLengthMismatch;
-  if (n % 2 == 0 && n >= kRealByHalfMin) return RealByHalf(plan, in, out, inStride, outStride);
+  if (n % 2 == 0 && n >= kFftRealByHalfMin)
+    return RealByHalf(plan, in, out, inStride, outStride);
   return Run<true>(plan, in, nullptr, out, nullptr, inStride, outStride);
 }
 
