@@ -53,12 +53,12 @@ static_assert(PublicCode(status::kRankDeficient) == QDM_WARN_RANK_DEFICIENT);
 // face wraps the coefficients there and so evaluates another polynomial), a
 // solver route it does not know, and a fit that ran but has a NaN or an
 // infinity among its results.
-constexpr StatusCode kSpectrumTooShort = 22;
-constexpr StatusCode kBadSolver = 23;
-constexpr StatusCode kNonFiniteResult = QDM_ERR_NON_FINITE_RESULT;
+constexpr StatusCode kSpectrumTooShort{22};
+constexpr StatusCode kBadSolver{23};
+constexpr auto kNonFiniteResult = static_cast<StatusCode>(QDM_ERR_NON_FINITE_RESULT);
 static_assert(PublicCode(kSpectrumTooShort) == QDM_ERR_SPECTRUM_TOO_SHORT);
 static_assert(PublicCode(kBadSolver) == QDM_ERR_SOLVER);
-static_assert(status::kKrylovNoConvergence == QDM_ERR_KRYLOV_NO_CONVERGENCE);
+static_assert(int32_t(status::kKrylovNoConvergence) == QDM_ERR_KRYLOV_NO_CONVERGENCE);
 static_assert(int32_t(PencilSolver::kAuto) == QDM_SOLVER_AUTO &&
               int32_t(PencilSolver::kDense) == QDM_SOLVER_DENSE &&
               int32_t(PencilSolver::kKrylov) == QDM_SOLVER_KRYLOV);
@@ -68,14 +68,15 @@ static_assert(PublicCode(kNonFiniteResult) == QDM_ERR_NON_FINITE_RESULT);
 // the host's 32-bit bound is negative and would refuse every order, where the
 // work-memory bound is the right refusal.
 constexpr checks::Bound kWide = checks::Bound::kWide;
-static_assert(status::kNoMemory == QDM_ERR_NO_MEMORY && status::kBadSize == QDM_ERR_BAD_SIZE &&
-              status::kNegativeDim == QDM_ERR_NEGATIVE_DIM &&
-              status::kBadOption == QDM_ERR_OPTION &&
-              status::kNoConvergence == QDM_ERR_NO_CONVERGENCE &&
-              status::kBadPolynomial == QDM_ERR_POLYNOMIAL &&
-              status::kNonFinite == QDM_ERR_EXTREME_VALUE && status::kRootNaN == QDM_ERR_ROOT_NAN &&
-              status::kIllegalArgument == QDM_ERR_ILLEGAL_ARGUMENT &&
-              status::kFftLengthMismatch == QDM_ERR_FFT_LENGTH);
+static_assert(int32_t(status::kNoMemory) == QDM_ERR_NO_MEMORY &&
+              int32_t(status::kBadSize) == QDM_ERR_BAD_SIZE &&
+              int32_t(status::kNegativeDim) == QDM_ERR_NEGATIVE_DIM &&
+              int32_t(status::kBadOption) == QDM_ERR_OPTION &&
+              int32_t(status::kNoConvergence) == QDM_ERR_NO_CONVERGENCE &&
+              int32_t(status::kBadPolynomial) == QDM_ERR_POLYNOMIAL &&
+              int32_t(status::kNonFinite) == QDM_ERR_EXTREME_VALUE && int32_t(status::kRootNaN) == QDM_ERR_ROOT_NAN &&
+              int32_t(status::kIllegalArgument) == QDM_ERR_ILLEGAL_ARGUMENT &&
+              int32_t(status::kFftLengthMismatch) == QDM_ERR_FFT_LENGTH);
 
 // ---- what one call hands to RunPlain ---------------------------------------------
 

@@ -47,7 +47,7 @@ void Eigenproblems(const T* x, int32_t n, int32_t L, bool complexForm) {
   const int32_t pencilL = complexForm ? Lp : r;
   std::vector<T> K(static_cast<size_t>(pencilL) * pencilL), block(static_cast<size_t>(r) * r);
   std::vector<Complex> poles(static_cast<size_t>(r));
-  StatusCode st = 0;
+  StatusCode st = status::kOk;
   if constexpr (std::is_same_v<T, Complex>) {
     st = PencilMatrixComplex(x, n, pencilL, pencilL, K.data());
   } else {

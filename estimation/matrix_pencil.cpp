@@ -158,7 +158,7 @@ StatusCode ScaleRows(T* A, int32_t rows, int32_t cols, const double* s) {
       // Reciprocal of s_i + 0i by Smith's division, then a plain complex product
       // (no special handling of infinite or NaN parts).
       double fr = 0.0, fi = 0.0;
-      ComplexDivide(1.0, 0.0, s[i], 0.0, &fr, &fi);
+      (void)ComplexDivide(1.0, 0.0, s[i], 0.0, &fr, &fi);
       for (int32_t j = 0; j < cols; ++j) {
         const double ar = row[j].real(), ai = row[j].imag();
         row[j] = Complex(ar * fr - ai * fi, ar * fi + ai * fr);

@@ -90,7 +90,8 @@ int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
   StatusCode s = entry.check;
   for (size_t i = 0; s == status::kOk && i < entry.outputs.size(); ++i) {
     const OutputArray& out = entry.outputs[i];
-    s = NumericArrayResize(out.typeCode, 1, &handles[i], static_cast<size_t>(out.length));
+    // The host's own error code is carried as a status and mapped as one.
+    s = StatusCode{NumericArrayResize(out.typeCode, 1, &handles[i], static_cast<size_t>(out.length))};
     if (s != status::kOk && entry.onResizeFailure == ResizeFailure::kReturnAtOnce) {
       return MapStatus(s);
     }

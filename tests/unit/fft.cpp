@@ -277,7 +277,7 @@ TEST(Fft, AllocationFailuresGiveNullOrNoMemoryAndLeakNothing) {
       for (int64_t k = 1; !completed; ++k) {
         NumAllocFailAt(k, persistent);
         FftPlan* plan = FftPlanAcquire(n);
-        StatusCode sc = 0, sr = 0, si = 0;
+        StatusCode sc = status::kOk, sr = status::kOk, si = status::kOk;
         if (plan != nullptr) {
           sc = FftComplex(plan, x.data(), x.data() + 1, y.data(), y.data() + 1, 2, 2, n);
           sr = FftReal(plan, x.data(), y.data(), 1, 1, n);

@@ -113,7 +113,7 @@ struct Outcome {
 };
 
 Outcome Search(const std::vector<Complex>& x, const Record& r, bool complexForm, bool full) {
-  Outcome o{0, -1};
+  Outcome o{status::kOk, -1};
   const int32_t n = r.n;
   if (complexForm) {
     o.status = full ? MdlOrderFullComplex(x.data(), n, r.upper, r.minOrder, &o.order)

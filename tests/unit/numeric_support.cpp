@@ -216,7 +216,7 @@ TYPED_TEST(Dense, ShapeTableIdentities) {
       // The truncated solve keeping `rank` values reports no rank warning. Scaled to
       // either end of the range, a system tall enough for the QR fold keeps its solution
       // and rank decision: no overflow, no small values lost.
-      const StatusCode want = s.rank < k && solver != kTruncated ? 20001 : 0;
+      const int32_t want = s.rank < k && solver != kTruncated ? 20001 : 0;
       std::vector<T> x(size_t(s.n) * s.nrhs, T(-5.0)), x1;
       for (double scale : {1.0, 1e150, 1e-150}) {
         if (scale != 1.0 && s.m < 600) break;
@@ -260,7 +260,7 @@ TYPED_TEST(Dense, ThresholdsAndRankDecisions) {
                        b = {T(1.0), T(1e-20), T(1.0)};
   // rcond: the truncated solve's keep; x1 is 1 when 1e-20 is kept. DGELSD gets max(m, n) rcond,
   // or max(m, n) eps for a negative or NaN rcond; the pinv solves read zero as eps too.
-  const struct { int solver; double rcond; StatusCode want; double x1; } cases[] = {
+  const struct { int solver; double rcond; int32_t want; double x1; } cases[] = {
       {kGelsd, -1.0, 20001, 0.0}, {kGelsd, NAN, 20001, 0.0}, {kGelsd, 1e-25, 0, 1.0},
       {kPinv, 0.0, 20001, 0.0},   {kPinv, -1.0, 20001, 0.0}, {kPinv, 1e-22, 0, 1.0},
       {kTruncated, 1, 0, 0.0},    {kTruncated, 2, 0, 1.0}};
@@ -363,7 +363,7 @@ TEST(LapackBoundary, InjectedInfoMapsPerDriver) {
       [&] { return EigSymReal(sym.data(), 4, 0, s.data(), nullptr); },
   };
   // call, INFO, status; persistent (the failure stays armed), m, n for the real solve
-  const struct { int call; int32_t info; StatusCode want; int persistent, m, n; } cases[] = {
+  const struct { int call; int32_t info; int32_t want; int persistent, m, n; } cases[] = {
       {0, 3, -20062, 0, 0, 0},   {0, -2, -20062, 0, 0, 0},    {1, 1, -20062, 0, 0, 0},
       {1, -4, -20999, 0, 0, 0},  {3, -1, -20999, 0, 0, 0},    {4, 5, -20062, 0, 0, 0},
       {0, 1, -20062, 1, 0, 0},   {2, 2, -20062, 0, 3, 4},     {2, -3, 20001, 0, 3, 4},
@@ -389,7 +389,7 @@ TYPED_TEST(Dense, BadInputIsRefusedWithNothingWritten) {
   const auto a = Random<double>(4, 3, 61), b = Random<double>(4, 2, 62);
   // bad_a, bad_b: index of a non-finite entry, or -1; complex: the complex
   // pseudo-inverse solve, which leaves nrhs to the factorization.
-  const struct { int32_t m, n, nrhs, bad_a, bad_b; StatusCode real, complex; } cases[] = {
+  const struct { int32_t m, n, nrhs, bad_a, bad_b; int32_t real, complex; } cases[] = {
       {0, 3, 2, -1, -1, -20003, -20003},  {4, 0, 2, -1, -1, -20003, -20003},
       {-2, 3, 2, -1, -1, -20003, -20003}, {4, 3, 0, -1, -1, -20003, 0},
       {4, 3, -1, -1, -1, -20003, -20004}, {4, 3, 2, 5, -1, -20068, -20068},
@@ -405,7 +405,7 @@ TYPED_TEST(Dense, BadInputIsRefusedWithNothingWritten) {
       if (c.bad_b >= 0) bt[c.bad_b] = T(bad);
       for (int solver = kFirstSolver<T>; solver <= kTruncated; ++solver) {
         std::vector<T> x(6, T(9.0));
-        const StatusCode want = kIsCx<T> && solver == kPinv ? c.complex : c.real;
+        const int32_t want = kIsCx<T> && solver == kPinv ? c.complex : c.real;
         EXPECT_EQ(Solve(solver, at.data(), c.m, c.n, bt.data(), c.nrhs, x.data(), -1.0, 1), want);
         EXPECT_EQ(x, std::vector<T>(6, T(9.0)));
       }
@@ -609,8 +609,8 @@ TEST(PolyRoots, CompanionEigenvaluesSmallResidualsClosedFormsAndRefusals) {
   }
   // Roots exact and in their order; unwritten entries stay -99 - 99i.
   // A zero leading coefficient (roots at infinity) and NaN are refused before any root.
-  const StatusCode bad = status::kBadPolynomial;
-  const struct { std::vector<Cx> c; StatusCode status; std::vector<Cx> roots; } cases[] = {
+  const int32_t bad = status::kBadPolynomial;
+  const struct { std::vector<Cx> c; int32_t status; std::vector<Cx> roots; } cases[] = {
       {{0, 0, 1}, 0, {0, 0}}, {{-2, 1}, 0, {2}}, {{2, -3, 1}, 0, {2, 1}}, {{1, 0, 0}, bad, {}},
       {{0, 0, 0, -2, 1, 0}, 0, {0, 0, 0, 2}}, {{0, 6, -5, 1}, 0, {0, 3, 2}}, {{5}, bad, {}},
       {{Cx(0, 2), Cx(0, -2)}, 0, {1}}, {{0, 0}, bad, {}}, {{0, 3}, 0, {0}},
