@@ -1,7 +1,8 @@
 """A minimal PEP 517 backend (standard library only) for the qdm package.
 
-The wheel holds the qdm package and the libqdm_api it will load, found at
-build time in this order:
+The wheel holds the qdm package (its modules and the py.typed marker that
+tells type checkers its hints are complete) and the libqdm_api it will load,
+found at build time in this order:
 1. $QDM_LIBRARY, a path to libqdm_api.so.1: copied into the wheel;
 2. the repository's fresh build, ../build/release/libqdm_api.so.1: copied;
 3. an installed library, by pkg-config (`qdm`) or the loader's cache: its
@@ -44,7 +45,7 @@ Name: {NAME}
 Version: {VERSION}
 Summary: Parametric time-series estimators (covariance and principal-component AR, Prony, matrix pencil, MDL, AR spectra) on numpy arrays
 Requires-Python: >=3.8
-Requires-Dist: numpy
+Requires-Dist: numpy>=1.21
 """
 
 
@@ -93,7 +94,7 @@ def build_wheel(wheel_directory, config_settings=None, metadata_directory=None):
     files = {}
     pkg = os.path.join(HERE, "qdm")
     for name in sorted(os.listdir(pkg)):
-        if name.endswith(".py") and name != "_where.py":
+        if (name.endswith(".py") or name == "py.typed") and name != "_where.py":
             with open(os.path.join(pkg, name), "rb") as f:
                 files[f"qdm/{name}"] = f.read()
     files["qdm/_where.py"] = f"LIBRARY = {record!r}\n".encode()

@@ -1,25 +1,42 @@
 """qdm: parametric time-series estimators on numpy arrays.
 
-Every fit takes one 1-D array. Its dtype picks the real (float64) or the
-complex (complex128) fit; other numeric dtypes that numpy casts safely to one
-of them (bool, integers, float16/32, complex64) are converted, anything else
-raises DTypeError. Contiguous float64 and complex128 arrays are passed to the
-library as they are, without a copy, and the GIL is released during the fit.
+Fits
+----
+covariance      covariance-method AR model (forward least-squares prediction)
+pcar            principal-component AR model (truncated-SVD forward-backward prediction)
+prony           damped exponentials by Prony's method
+matrix_pencil   damped exponentials by the matrix pencil method
+mdl_order       model order by the minimum description length
+covariance_psd  power spectrum of the covariance AR model
+pcar_psd        power spectrum of the principal-component AR model, and its modes
 
-Modes follow the model x[t] = sum A_i z_i^t: amplitude |A_i|, phase arg(A_i)
-in radians, damping ln|z_i| per sample (negative when decaying), frequency
-arg(z_i) fs / (2 pi) in Hz. Spectra are in dB with the peak at 0 dB, on the
-axis `frequencies` = -fs/2 + arange(N) fs/N, N the power of two not below
-`points`.
+Every fit takes one 1-D array ``x``; every other argument is keyword-only.
+Its dtype picks the real (float64) or the complex (complex128) fit; other
+numeric dtypes that numpy casts safely to one of them (bool, integers,
+float16/32, complex64) are converted, anything else raises DTypeError.
+Contiguous float64 and complex128 arrays are passed to the library as they
+are, without a copy, and the GIL is released during the fit.
+
+Modes follow the model x[t] = sum_i A_i z_i**t: amplitude |A_i|, phase
+arg(A_i) in radians, damping ln|z_i| per sample (negative when decaying; it
+stays per sample whatever ``fs`` is), frequency arg(z_i) fs / (2 pi), in Hz
+when ``fs`` is given and in cycles per sample with the default fs = 1.
+Spectra are in dB with the peak at 0 dB, on the axis ``frequencies`` =
+-fs/2 + arange(N) fs/N, N the power of two not below ``points``.
+
+Errors are `Error` subclasses carrying the library's status code; a
+rank-deficient least-squares solve inside a fit is a `RankDeficientWarning`.
 """
 import ctypes as _ct
 import operator as _op
 import warnings as _warnings
-from typing import NamedTuple
+from typing import Literal, NamedTuple, Optional, Union
 
 import numpy as _np
+# x's hint is quoted below: help() then shows this alias, not numpy's expansion of it.
+from numpy.typing import ArrayLike, NDArray
 
-from qdm._lib import functions as _fn, lib as _clib, status_text
+from qdm._lib import functions as _fn, lib as _clib
 
 __all__ = ["covariance", "pcar", "prony", "matrix_pencil", "mdl_order", "covariance_psd",
            "pcar_psd", "Error", "ArgumentError", "DTypeError", "OutOfMemoryError",
@@ -27,48 +44,146 @@ __all__ = ["covariance", "pcar", "prony", "matrix_pencil", "mdl_order", "covaria
            "CovarianceFit", "PcarFit", "PronyFit", "PencilFit", "CovarianceSpectrum",
            "PcarSpectrum"]
 
-__version__ = _clib.qdm_version().decode()
+__version__: str = _clib.qdm_version().decode()
+
+
+def status_text(code: int) -> str:
+    """The meaning of a library status code.
+
+    Parameters
+    ----------
+    code : int, -2**31 <= code < 2**31
+        A status code, as in `Error.code`: 0 success, 20001 the rank-deficiency
+        warning, negative codes errors (-424xx argument errors).
+
+    Returns
+    -------
+    str
+        The library's text for the code; codes it does not know get a general
+        text, never an error.
+
+    Raises
+    ------
+    ctypes.ArgumentError
+        `code` is not an integer.
+
+    Examples
+    --------
+    >>> import qdm
+    >>> qdm.status_text(-42418)
+    'sampling rate not positive'
+    >>> qdm.status_text(0)
+    'success'
+    """
+    return _clib.qdm_status_text(code).decode()
 
 
 # ---- errors ------------------------------------------------------------------------
 class Error(Exception):
-    """Base of every qdm exception. `code` is the library's status (None when
-    the binding refused the call before reaching the library), `text` its
-    meaning from qdm_status_text(), `function` the fit that failed."""
+    """Base of every qdm exception.
 
-    def __init__(self, code, text, function):
+    Catch it to handle any failure of a fit; the subclasses below say what
+    kind it was and also derive from the matching built-in exception.
+
+    Attributes
+    ----------
+    code : int or None
+        The library's status code, or None when the binding refused the call
+        before it reached the library (wrong dtype, not 1-D, a bad `solver`,
+        `real_signal` on complex data).
+    text : str
+        What went wrong: `status_text(code)`, or the binding's own message.
+    function : str
+        The fit that failed, e.g. ``"matrix_pencil"``.
+
+    Examples
+    --------
+    >>> import qdm
+    >>> try:
+    ...     qdm.covariance([1.0, 2.0, 3.0], order=5)
+    ... except qdm.Error as e:
+    ...     print(type(e).__name__, e.code, e.function)
+    ...     print(e.text)
+    ArgumentError -42412 covariance
+    order zero, negative or above floor(2n/3), or components, k or M zero or negative
+    """
+
+    def __init__(self, code: Optional[int], text: str, function: str) -> None:
         self.code, self.text, self.function = code, text, function
         super().__init__(f"{function}: {text}" if code is None
                          else f"{function}: {code}: {text}")
 
 
 class ArgumentError(Error, ValueError):
-    """A bad argument: the library's -424xx codes, or a shape the binding refuses."""
+    """A bad argument, refused before the fit ran; also a `ValueError`.
+
+    The library's argument codes -42401 to -42423 (empty input, an order,
+    count, size or sampling rate out of range, a NaN or infinite sample, a
+    fit that would exceed the library's work-memory bound, ...), or, with
+    `code` None, what the binding refuses itself: an input that is not 1-D,
+    `real_signal` on complex data, an unknown `solver`.
+    """
 
 
 class DTypeError(Error, TypeError):
-    """An input whose dtype has no lossless conversion to float64 or complex128."""
+    """An input whose dtype has no lossless conversion to float64 or complex128.
+
+    Also a `TypeError`; `code` is None. float128, object arrays, strings and
+    None raise it.
+    """
 
 
 class OutOfMemoryError(Error, MemoryError):
-    """The library could not allocate its work memory (-20001)."""
+    """The library could not allocate its work memory (code -20001); also a `MemoryError`."""
 
 
 class NumericError(Error):
-    """A numeric failure inside the fit (LAPACK, the root finder, extreme values)."""
+    """A numeric failure inside the fit.
+
+    A LAPACK iteration that did not converge (-20062), the polynomial root
+    finder (-20063, -20116), a matrix with values at the extreme ends of the
+    double range (-20068), an illegal LAPACK argument (-20999), the Krylov
+    route not converging (-20070), and `NonFiniteResultError` (-30001).
+    """
 
 
 class NonFiniteResultError(NumericError, FloatingPointError):
-    """The fit ran, but a result came out NaN or infinite (-30001): a degenerate
-    record (zero, constant, a spike, a ramp) or a result beyond the range of
-    float64. No partial results are returned."""
+    """The fit ran, but a result came out NaN or infinite (code -30001).
+
+    Also a `FloatingPointError`. It comes from a degenerate record (zero,
+    constant, a spike, a ramp) or a result beyond the range of float64. No
+    partial results are returned.
+    """
 
 
 class RankDeficientWarning(UserWarning):
-    """The fit succeeded, but a least-squares system inside it was rank deficient
-    (minimum-norm solution used): code 20001. The results are complete."""
+    """The fit succeeded, but a least-squares system inside it was rank deficient.
 
-    def __init__(self, code, text, function):
+    Code 20001: the minimum-norm solution was used and the results are
+    complete. Raised through `warnings.warn`, so ``warnings.simplefilter``
+    silences it or turns it into an error.
+
+    Attributes
+    ----------
+    code : int
+        20001.
+    text : str
+        `status_text(20001)`.
+    function : str
+        The fit that warned.
+
+    Examples
+    --------
+    >>> import warnings, numpy as np, qdm
+    >>> x = np.cos(0.3 * np.arange(64))          # two modes, fitted with four poles
+    >>> with warnings.catch_warnings(record=True) as w:
+    ...     warnings.simplefilter("always")
+    ...     fit = qdm.covariance(x, order=4)
+    >>> print(w[0].category.__name__, w[0].message.code)
+    RankDeficientWarning 20001
+    """
+
+    def __init__(self, code: int, text: str, function: str) -> None:
         self.code, self.text, self.function = code, text, function
         super().__init__(f"{function}: {code}: {text}")
 
@@ -165,44 +280,147 @@ def _kind(c):
 
 
 # ---- results -------------------------------------------------------------------------
+_Coefficients = Union[NDArray[_np.float64], NDArray[_np.complex128]]
+
+
 class CovarianceFit(NamedTuple):
-    coefficients: _np.ndarray  # a[0..p], a[0] = 1
-    poles: _np.ndarray         # p complex poles
+    """The covariance-method AR model, as `covariance` returns it.
+
+    Attributes
+    ----------
+    coefficients : ndarray, shape (order + 1,)
+        a[0..p] with a[0] = 1, of the model x[t] + a[1] x[t-1] + ... +
+        a[p] x[t-p] = e[t]; float64 for real data, complex128 for complex.
+    poles : ndarray of complex128, shape (order,)
+        The p zeros of z**p + a[1] z**(p-1) + ... + a[p], in the order the
+        root finder found them (zero roots first; not sorted, not paired).
+    noise_variance : float
+        Mean squared forward prediction error over the n - p equations, in
+        the units of x squared.
+    """
+    coefficients: _Coefficients
+    poles: NDArray[_np.complex128]
     noise_variance: float
 
 
 class PcarFit(NamedTuple):
-    coefficients: _np.ndarray
-    roots: _np.ndarray
+    """The principal-component AR model, as `pcar` returns it.
+
+    Attributes
+    ----------
+    coefficients : ndarray, shape (order + 1,)
+        a[0..p] with a[0] = 1, as for `CovarianceFit`; float64 for real data,
+        complex128 for complex.
+    roots : ndarray of complex128, shape (order,)
+        The p zeros of the AR polynomial, in the order the root finder found
+        them (not sorted, not paired).
+    """
+    coefficients: _Coefficients
+    roots: NDArray[_np.complex128]
 
 
 class PronyFit(NamedTuple):
-    amplitude: _np.ndarray
-    phase: _np.ndarray
-    damping: _np.ndarray
-    frequency: _np.ndarray
+    """Damped exponentials x[t] = sum_i A_i z_i**t, as `prony` returns them.
+
+    Each field is a float64 array with one value per mode reported, in the
+    order of the poles (not sorted).
+
+    Attributes
+    ----------
+    amplitude : ndarray
+        |A_i|, in the units of x.
+    phase : ndarray
+        arg(A_i) in radians, in (-pi, pi].
+    damping : ndarray
+        ln|z_i| per sample, negative for a decaying mode. It is per sample
+        whatever fs is, not per second: multiply by fs for a rate in 1/s.
+    frequency : ndarray
+        arg(z_i) fs / (2 pi): in Hz when fs is given, in cycles per sample
+        with the default fs = 1; in (-fs/2, fs/2], or [0, fs/2) with
+        real_signal.
+    """
+    amplitude: NDArray[_np.float64]
+    phase: NDArray[_np.float64]
+    damping: NDArray[_np.float64]
+    frequency: NDArray[_np.float64]
 
 
 class PencilFit(NamedTuple):
-    amplitude: _np.ndarray
-    phase: _np.ndarray
-    damping: _np.ndarray
-    frequency: _np.ndarray
+    """Damped exponentials x[t] = sum_i A_i z_i**t, as `matrix_pencil` returns them.
+
+    The four mode fields are float64 arrays with one value per mode reported,
+    in the order of the poles (not sorted).
+
+    Attributes
+    ----------
+    amplitude : ndarray
+        |A_i|, in the units of x.
+    phase : ndarray
+        arg(A_i) in radians, in (-pi, pi].
+    damping : ndarray
+        ln|z_i| per sample, negative for a decaying mode. It is per sample
+        whatever fs is, not per second: multiply by fs for a rate in 1/s.
+    frequency : ndarray
+        arg(z_i) fs / (2 pi): in Hz when fs is given, in cycles per sample
+        with the default fs = 1; in (-fs/2, fs/2], or [0, fs/2) with
+        real_signal.
+    mse : float
+        Mean squared error of the fitted modes against the record, in the
+        units of x squared.
+    """
+    amplitude: NDArray[_np.float64]
+    phase: NDArray[_np.float64]
+    damping: NDArray[_np.float64]
+    frequency: NDArray[_np.float64]
     mse: float
 
 
 class CovarianceSpectrum(NamedTuple):
-    frequencies: _np.ndarray   # Hz
-    spectrum: _np.ndarray      # dB, peak 0 dB
+    """The covariance AR model's power spectrum, as `covariance_psd` returns it.
+
+    Attributes
+    ----------
+    frequencies : ndarray of float64, shape (N,)
+        The axis, -fs/2 + arange(N) fs/N: in Hz when fs is given, in cycles
+        per sample with the default fs = 1. N is the power of two not below
+        `points`.
+    spectrum : ndarray of float64, shape (N,)
+        10 log10(1/|A(f)|**2) in dB, shifted so that its peak is exactly 0 dB.
+    noise_variance : float
+        The AR model's prediction-error variance (`CovarianceFit.noise_variance`),
+        in the units of x squared; it does not enter `spectrum`.
+    """
+    frequencies: NDArray[_np.float64]
+    spectrum: NDArray[_np.float64]
     noise_variance: float
 
 
 class PcarSpectrum(NamedTuple):
-    frequencies: _np.ndarray
-    spectrum: _np.ndarray
-    amplitude: _np.ndarray
-    phase: _np.ndarray
-    frequency: _np.ndarray
+    """The principal-component AR spectrum and modes, as `pcar_psd` returns them.
+
+    The mode fields are float64 arrays with one value per mode reported,
+    nearest the unit circle first. No damping is reported.
+
+    Attributes
+    ----------
+    frequencies : ndarray of float64, shape (N,)
+        The axis, -fs/2 + arange(N) fs/N, as for `CovarianceSpectrum`.
+    spectrum : ndarray of float64, shape (N,)
+        10 log10(1/|A(f)|**2) in dB, peak exactly 0 dB.
+    amplitude : ndarray
+        |A_i| by least squares, in the units of x.
+    phase : ndarray
+        arg(A_i) in radians, in (-pi, pi].
+    frequency : ndarray
+        arg(z_i) fs / (2 pi): in Hz when fs is given, else cycles per sample.
+    fit_error : float
+        Mean squared error of the amplitude fit, in the units of x squared.
+    """
+    frequencies: NDArray[_np.float64]
+    spectrum: NDArray[_np.float64]
+    amplitude: NDArray[_np.float64]
+    phase: NDArray[_np.float64]
+    frequency: NDArray[_np.float64]
     fit_error: float
 
 
@@ -218,17 +436,86 @@ def _axis(f0, df, count):
     return f0 + _np.arange(count) * df
 
 
+
 # ---- the fits ------------------------------------------------------------------------
-def covariance(x, *, order):
-    """Covariance-method AR model of order p (1 <= p <= 2n/3): forward linear
-    prediction solved in the least-squares sense, without windowing."""
-    x, c = _signal(x, "covariance")
-    n, p = x.shape[0], _int(order)
+def covariance(x: "ArrayLike", *, order: int) -> CovarianceFit:
+    """Covariance-method AR model: forward linear prediction by least squares.
+
+    Fits x[t] + a[1] x[t-1] + ... + a[p] x[t-p] = e[t] over the n - p
+    samples that have p predecessors, minimising the sum of |e[t]|**2,
+    without windowing, and finds the model's poles.
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n >= 1 samples
+        The record. float64 runs the real fit, complex128 the complex one;
+        other dtypes numpy casts safely to one of them are converted.
+    order : int, 1 <= order <= floor(2n/3)
+        The model order p.
+
+    Returns
+    -------
+    CovarianceFit
+        Named tuple ``(coefficients, poles, noise_variance)``:
+        coefficients a[0..p] with a[0] = 1 (float64 for real data, complex128
+        for complex), the p complex poles, and the mean squared prediction
+        error over the n - p equations (units of x squared).
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D (code None); x is empty (-42401); order out of range
+        (-42412); a NaN or infinite sample (-42419); the fit would exceed the
+        library's work-memory bound (-42420).
+    TypeError
+        order is not an integer.
+    NonFiniteResultError
+        A result would be NaN or infinite (-30001): a degenerate record.
+    NumericError
+        Another numeric failure (root finder, LAPACK, extreme values).
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    Warns
+    -----
+    RankDeficientWarning
+        The least-squares system was rank deficient (typically a noise-free
+        record fitted with more poles than it has exponentials); the
+        minimum-norm solution was used and the results are complete.
+
+    See Also
+    --------
+    pcar : the principal-component AR model.
+    covariance_psd : this model's power spectrum.
+
+    Examples
+    --------
+    Two damped sinusoids need four poles:
+
+    >>> import numpy as np, qdm
+    >>> t = np.arange(64)
+    >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
+    ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
+    >>> fit = qdm.covariance(x, order=4)
+    >>> print(fit.coefficients.round(4))
+    [ 1.     -0.9961  0.9705 -0.9453  0.9418]
+    >>> p = fit.poles[np.argsort(np.angle(fit.poles))]
+    >>> print((np.angle(p) / (2 * np.pi)).round(6))    # cycles per sample
+    [-0.3 -0.1  0.1  0.3]
+    >>> print(np.log(np.abs(p)).round(6))                # damping per sample
+    [-0.02 -0.01 -0.01 -0.02]
+    >>> fit.noise_variance < 1e-20
+    True
+    """
+    a, c = _signal(x, "covariance")
+    n, p = a.shape[0], _int(order)
     m = _room(p, n)
-    coef = _np.empty(m + 1, _C128 if c else _F64)
+    coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
     poles = _np.empty(max(m, 1), _C128)
     nv = _ct.c_double()
-    _check(_fn["covariance", _kind(c)](_addr(x), n, p, _addr(coef), _addr(poles),
+    _check(_fn["covariance", _kind(c)](_addr(a), n, p, _addr(coef), _addr(poles),
                                        _ct.byref(nv)), "covariance")
     return CovarianceFit(coef, poles[:m], nv.value)
 
@@ -242,38 +529,186 @@ def _solver(solver, where):
                             where)
 
 
-def pcar(x, *, order, components, solver="auto"):
-    """Principal-component AR model: forward-backward linear prediction solved
-    through the pseudo-inverse kept to the `components` strongest singular
-    components.
+def pcar(x: "ArrayLike", *, order: int, components: int,
+         solver: Literal["auto", "dense", "krylov"] = "auto") -> PcarFit:
+    """Principal-component AR model: prediction through a truncated pseudo-inverse.
 
-    `solver` picks how the 2(n - order)-by-order data matrix's leading
-    singular triplets are found: "dense" forms it and takes its SVD
-    (O(n order^2)), "krylov" takes the components + 1 leading ones by Lanczos
-    over FFT products without forming it (O(n log n) per product, for long
-    records at large orders), "auto" (the default) whichever is estimated to
-    be faster. Both give the same coefficients to rounding wherever the
-    kept components stand clear of the next."""
-    x, c = _signal(x, "pcar")
+    Fits the AR model of order p to the forward and the backward linear
+    prediction equations together (the backward ones conjugated for complex
+    data), a 2(n - p)-by-p system solved through its pseudo-inverse kept to
+    the `components` strongest singular components, and finds its roots.
+    Truncating to the signal's components removes most of the noise from
+    the model.
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n >= 1 samples
+        The record. float64 runs the real fit, complex128 the complex one;
+        other dtypes numpy casts safely to one of them are converted.
+    order : int, 1 <= order <= floor(2n/3)
+        The model order p (0 passes the order check, but no `components`
+        value is then valid).
+    components : int, 1 <= components <= order
+        Singular components kept, k: the number of complex exponentials the
+        record holds (twice the number of real sinusoids).
+    solver : {"auto", "dense", "krylov"}, default "auto"
+        How the data matrix's leading singular triplets are found. "dense"
+        forms the matrix and takes its SVD, O(n p**2). "krylov" takes the
+        k + 1 leading triplets by Lanczos over FFT products with the record,
+        without forming the matrix, O(n log n) per product: for long records
+        at large orders. "auto" takes whichever is estimated to be faster.
+        Both routes give the same coefficients to rounding wherever the kept
+        components stand clear of the next.
+
+    Returns
+    -------
+    PcarFit
+        Named tuple ``(coefficients, roots)``: a[0..p] with a[0] = 1
+        (float64 for real data, complex128 for complex) and the p complex
+        roots of the AR polynomial.
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D, or solver is not one of the three names (code None);
+        x is empty (-42401); order negative or above floor(2n/3) (-42411);
+        components < 1 (-42412); components > order (-42413); a NaN or
+        infinite sample (-42419); the fit would exceed the library's
+        work-memory bound (-42420).
+    TypeError
+        order or components is not an integer.
+    NonFiniteResultError
+        A result would be NaN or infinite (-30001): a degenerate record.
+    NumericError
+        Another numeric failure: LAPACK, the root finder, extreme values, or
+        the Krylov route not converging (-20070).
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    See Also
+    --------
+    covariance : the AR model by plain least squares.
+    pcar_psd : this model's spectrum and its strongest modes.
+
+    Examples
+    --------
+    Two sinusoids, four exponentials, at an order well above four, kept to
+    four components: four roots lie on the unit circle at the signal's
+    frequencies, the other eight well inside it.
+
+    >>> import numpy as np, qdm
+    >>> t = np.arange(64)
+    >>> x = np.cos(2 * np.pi * 0.1 * t + 0.5) + 0.5 * np.cos(2 * np.pi * 0.3 * t - 1.0)
+    >>> fit = qdm.pcar(x, order=12, components=4)
+    >>> print(fit.coefficients.shape, fit.roots.shape)
+    (13,) (12,)
+    >>> z = fit.roots[np.argsort(-np.abs(fit.roots))]      # nearest the unit circle first
+    >>> print(np.abs(z[:4]).round(6), bool(np.abs(z[4:]).max() < 0.9))
+    [1. 1. 1. 1.] True
+    >>> print(np.sort(np.angle(z[:4]) / (2 * np.pi)).round(6))    # cycles per sample
+    [-0.3 -0.1  0.1  0.3]
+    """
+    a, c = _signal(x, "pcar")
     _solver(solver, "pcar")
-    n, p, k = x.shape[0], _int(order), _int(components)
+    n, p, k = a.shape[0], _int(order), _int(components)
     m = _room(p, n)
-    coef = _np.empty(m + 1, _C128 if c else _F64)
+    coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
     roots = _np.empty(max(m, 1), _C128)
-    _check(_fn["pcar_solver", _kind(c)](_addr(x), n, p, k, _SOLVERS[solver], _addr(coef),
+    _check(_fn["pcar_solver", _kind(c)](_addr(a), n, p, k, _SOLVERS[solver], _addr(coef),
                                         _addr(roots)), "pcar")
     return PcarFit(coef, roots[:m])
 
 
-def prony(x, *, order, fs=1.0, real_signal=False):
-    """Prony's method: `order` damped exponentials, poles from a covariance AR
-    model, amplitudes by least squares. real_signal (real data only) reports
-    one mode per conjugate pair."""
-    x, c = _signal(x, "prony")
-    n, p = x.shape[0], _int(order)
+def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
+          real_signal: bool = False) -> PronyFit:
+    """Damped exponentials by Prony's method.
+
+    Fits x[t] = sum_i A_i z_i**t with p = `order` poles z_i, the roots of a
+    covariance-method AR model of order p (see `covariance`), and the
+    amplitudes A_i by a least-squares fit of those poles to the record.
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n >= 1 samples
+        The record. float64 runs the real fit, complex128 the complex one;
+        other dtypes numpy casts safely to one of them are converted.
+    order : int, 1 <= order <= floor(2n/3)
+        The number of exponentials p (a real sinusoid takes two).
+    fs : float, fs > 0, default 1.0
+        Sampling rate. It scales `frequency` only: Hz when given, cycles per
+        sample with the default. Damping stays per sample.
+    real_signal : bool, default False
+        Real data only: report one mode per conjugate pair, the poles with
+        arg(z) in [0, pi), amplitude that of the one exponential (not
+        doubled). False reports every pole, as for complex data.
+
+    Returns
+    -------
+    PronyFit
+        Named tuple ``(amplitude, phase, damping, frequency)`` of float64
+        arrays, one value per mode, in the order of the poles (not sorted):
+        amplitude |A_i| (units of x), phase arg(A_i) in radians in
+        (-pi, pi], damping ln|z_i| per sample (negative when decaying; NOT
+        per second), frequency arg(z_i) fs / (2 pi) (Hz when fs is given,
+        else cycles per sample). p modes, or fewer with real_signal.
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D, or real_signal with complex data (code None); x is
+        empty (-42401); order out of range (-42412); fs not positive
+        (-42418); a NaN or infinite sample or fs (-42419); the fit would
+        exceed the library's work-memory bound (-42420).
+    TypeError
+        order is not an integer.
+    NonFiniteResultError
+        A result would be NaN or infinite (-30001): a degenerate record
+        (zeros, a spike, ...).
+    NumericError
+        Another numeric failure (root finder, LAPACK, extreme values).
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    Warns
+    -----
+    RankDeficientWarning
+        A least-squares system was rank deficient (order above the number
+        of exponentials in a noise-free record); the results are complete.
+
+    See Also
+    --------
+    matrix_pencil : the same model, far more robust to noise.
+
+    Notes
+    -----
+    With as many poles as the record has exponentials, Prony's method is
+    biased in noise; a larger order, keeping the strongest modes, or
+    `matrix_pencil` does better.
+
+    Examples
+    --------
+    >>> import numpy as np, qdm
+    >>> t = np.arange(64)
+    >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
+    ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
+    >>> fit = qdm.prony(x, order=4, fs=1000.0, real_signal=True)
+    >>> i = np.argsort(fit.frequency)
+    >>> print(fit.frequency[i].round(6))    # Hz
+    [100. 300.]
+    >>> print(fit.damping[i].round(6))      # per sample: -10 and -20 per second
+    [-0.01 -0.02]
+    >>> print(fit.amplitude[i].round(6), fit.phase[i].round(6))
+    [0.5  0.25] [ 0.5 -1. ]
+    """
+    a, c = _signal(x, "prony")
+    n, p = a.shape[0], _int(order)
     block, rows = _modes(4, _room(p, n))
     count = _ct.c_int32()
-    args = (_addr(x), n, p, _fs(fs))
+    args: tuple = (_addr(a), n, p, _fs(fs))
     flag = _real_flag(real_signal, c, "prony")
     if not c:
         args += (flag,)
@@ -281,76 +716,398 @@ def prony(x, *, order, fs=1.0, real_signal=False):
     return PronyFit(*block[:, :count.value])
 
 
-def matrix_pencil(x, *, modes, pencil=None, fs=1.0, real_signal=False, solver="auto"):
-    """Matrix pencil method: `modes` damped exponentials from the (n - L)-by-L
-    data matrix and its shift, L = `pencil` (default n // 3). When `modes`
-    exceeds min(n - L, L) fewer are returned.
+def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
+                  fs: float = 1.0, real_signal: bool = False,
+                  solver: Literal["auto", "dense", "krylov"] = "auto") -> PencilFit:
+    """Damped exponentials by the matrix pencil method.
 
-    `solver` picks how the data matrix's leading singular triplets are found:
-    "dense" forms and decomposes it (O(n L^2)), "krylov" takes them by Lanczos
-    over FFT products without forming it (O(n log n) per product, for long
-    records), "auto" (the default) whichever is estimated to be faster."""
-    x, c = _signal(x, "matrix_pencil")
+    Fits x[t] = sum_i A_i z_i**t: the poles z_i are the eigenvalues of the
+    pencil formed by the (n - L)-by-L Hankel data matrix of the record and
+    its one-sample shift, both reduced to their `modes` strongest singular
+    components (L = `pencil`); the amplitudes A_i come from a least-squares
+    fit of the poles to the record.
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n >= 1 samples
+        The record. float64 runs the real fit, complex128 the complex one;
+        other dtypes numpy casts safely to one of them are converted.
+    modes : int, 1 <= modes <= pencil
+        The number of exponentials M (a real sinusoid takes two). Fewer come
+        back when M > n - L: see Notes.
+    pencil : int or None, modes <= pencil <= floor(2n/3), default None
+        The pencil parameter L, the data matrix's column count. None takes
+        n // 3, the usual choice (n/3 to n/2 is the low-variance range).
+    fs : float, fs > 0, default 1.0
+        Sampling rate. It scales `frequency` only: Hz when given, cycles per
+        sample with the default. Damping stays per sample.
+    real_signal : bool, default False
+        Real data only: report one mode per conjugate pair, the poles with
+        arg(z) in [0, pi), amplitude that of the one exponential (not
+        doubled). False reports every pole, as for complex data.
+    solver : {"auto", "dense", "krylov"}, default "auto"
+        How the data matrix's leading singular triplets are found. "dense"
+        forms and decomposes the matrix, O(n L**2). "krylov" takes the M
+        leading triplets by Lanczos over FFT products with the record,
+        without forming it, O(n log n) per product: for long records.
+        "auto" takes the Krylov route for long records with M small beside
+        L (at most L/4), the dense one otherwise. Both give the same modes
+        to rounding wherever the M-th singular value stands clear of the next.
+
+    Returns
+    -------
+    PencilFit
+        Named tuple ``(amplitude, phase, damping, frequency, mse)``. The four
+        mode arrays are float64, one value per mode, in the order of the
+        poles (not sorted): amplitude |A_i| (units of x), phase arg(A_i) in
+        radians in (-pi, pi], damping ln|z_i| per sample (negative when
+        decaying; NOT per second), frequency arg(z_i) fs / (2 pi) (Hz when fs
+        is given, else cycles per sample). mse is the mean squared error of
+        the fitted modes against the record (units of x squared).
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D, real_signal with complex data, or solver not one of
+        the three names (code None); x is empty (-42401); pencil negative or
+        above floor(2n/3) (-42411); modes < 1 (-42412); modes > pencil
+        (-42413); fs not positive (-42418); a NaN or infinite sample or fs
+        (-42419); the fit would exceed the library's work-memory bound
+        (-42420).
+    TypeError
+        modes or pencil is not an integer (or None for pencil).
+    NonFiniteResultError
+        A result would be NaN or infinite (-30001): a degenerate record.
+    NumericError
+        Another numeric failure: LAPACK, extreme values (-20068, e.g. an
+        all-zero record), or the Krylov route not converging (-20070).
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    Warns
+    -----
+    RankDeficientWarning
+        The amplitude fit was rank deficient; the results are complete.
+
+    See Also
+    --------
+    mdl_order : choose `modes` from the record.
+    prony : the same model from an AR fit.
+
+    Notes
+    -----
+    The number of modes returned is min(modes, n - L), the most the
+    (n - L)-by-L matrix can give. modes above L is refused
+    (ArgumentError, code -42413); modes between n - L and L, possible only
+    when L > n/2, is not an error: n - L modes come back. With real_signal
+    only the poles with arg(z) in [0, pi) of those are reported, about half.
+
+    Examples
+    --------
+    >>> import numpy as np, qdm
+    >>> t = np.arange(64)
+    >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
+    ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
+    >>> fit = qdm.matrix_pencil(x, modes=4, fs=1000.0, real_signal=True)
+    >>> i = np.argsort(fit.frequency)
+    >>> print(fit.frequency[i].round(6))    # Hz
+    [100. 300.]
+    >>> print(fit.damping[i].round(6))      # per sample: -10 and -20 per second
+    [-0.01 -0.02]
+    >>> print(fit.amplitude[i].round(6), fit.phase[i].round(6))
+    [0.5  0.25] [ 0.5 -1. ]
+    >>> fit.mse < 1e-20
+    True
+
+    With L = 40 above n/2, at most n - L = 24 modes; more than L is an error:
+
+    >>> len(qdm.matrix_pencil(x, modes=30, pencil=40).frequency)
+    24
+    >>> qdm.matrix_pencil(x, modes=41, pencil=40)
+    Traceback (most recent call last):
+        ...
+    qdm.ArgumentError: matrix_pencil: -42413: components, k or M greater than the order or L
+    """
+    a, c = _signal(x, "matrix_pencil")
     _solver(solver, "matrix_pencil")
-    n = x.shape[0]
+    n = a.shape[0]
     L = _clib.qdm_default_pencil(n) if pencil is None else _int(pencil)
     M = _int(modes)
     block, rows = _modes(4, _room(M, n))
     count, mse = _ct.c_int32(), _ct.c_double()
-    args = (_addr(x), n, L, M, _fs(fs))
+    args: tuple = (_addr(a), n, L, M, _fs(fs))
     flag = _real_flag(real_signal, c, "matrix_pencil")
     if not c:
         args += (flag,)
     args += (_SOLVERS[solver],)
     _check(_fn["matrix_pencil_solver", _kind(c)](*args, *rows, _ct.byref(count),
                                                   _ct.byref(mse)), "matrix_pencil")
-    return PencilFit(*block[:, :count.value], mse.value)
+    amplitude, phase, damping, frequency = block[:, :count.value]
+    return PencilFit(amplitude, phase, damping, frequency, mse.value)
 
 
-def mdl_order(x, *, max_order=None, min_order=1):
-    """The order with the lowest minimum-description-length score among
-    min_order..min(n - L, L), L = max_order (default n // 3), scored on
-    matrix-pencil fits. Returns an int: 0 when no order scores below 10000."""
-    x, c = _signal(x, "mdl_order")
-    n = x.shape[0]
+def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int = 1) -> int:
+    """Model order by the minimum description length of matrix-pencil fits.
+
+    Scores each order m from `min_order` to r = min(n - L', L') by
+    n ln(E_m) + 10 m ln(n), E_m the fitting error of the m-mode matrix
+    pencil with pencil parameter L', and returns the order of the lowest
+    score. L' is `max_order`, less one when it is exactly n/2.
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n >= 1 samples
+        The record. float64 runs the real fit, complex128 the complex one;
+        other dtypes numpy casts safely to one of them are converted.
+    max_order : int or None, min_order < max_order <= floor(2n/3), default None
+        The upper order L, also the pencil parameter of the fits. None takes
+        n // 3 (so the default needs n >= 6).
+    min_order : int, min_order >= 1, default 1
+        The smallest order tried.
+
+    Returns
+    -------
+    int
+        The chosen order: the number of complex exponentials (a real
+        sinusoid counts two), usable as `modes` of `matrix_pencil`. 0 when no
+        order scores below 10000. A fit with E below 2.2e-16 (a noise-free
+        record) ends the search at once.
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D (code None); x is empty (-42401); min_order < 1
+        (-42414); max_order not above min_order or above floor(2n/3)
+        (-42415); a NaN or infinite sample (-42419); the fits would exceed
+        the library's work-memory bound (-42420).
+    TypeError
+        max_order or min_order is not an integer.
+    NumericError
+        A numeric failure in a fit (LAPACK, extreme values).
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    Warns
+    -----
+    RankDeficientWarning
+        A least-squares system in a fit was rank deficient.
+
+    See Also
+    --------
+    matrix_pencil : the fit scored.
+
+    Notes
+    -----
+    The threshold 10000 and the floor 2.2e-16 are fixed, so the result
+    depends on the record's scale. A record whose largest magnitude lies
+    outside [2**-128, 2**128] is scored as a copy scaled by a power of two
+    that brings it into [1, 2).
+
+    Examples
+    --------
+    >>> import numpy as np, qdm
+    >>> t = np.arange(64)
+    >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
+    ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
+    >>> qdm.mdl_order(x)            # two real sinusoids: four exponentials
+    4
+    >>> qdm.mdl_order(x, max_order=20, min_order=2)
+    4
+    """
+    a, c = _signal(x, "mdl_order")
+    n = a.shape[0]
     upper = n // 3 if max_order is None else _int(max_order)
     order = _ct.c_int32(0)
-    _check(_fn["mdl_order", _kind(c)](_addr(x), n, upper, _int(min_order),
+    _check(_fn["mdl_order", _kind(c)](_addr(a), n, upper, _int(min_order),
                                       _ct.byref(order)), "mdl_order")
     return order.value
 
 
-def covariance_psd(x, *, order, points=512, fs=1.0):
-    """Power spectrum 1/|A(f)|^2 of the covariance AR model in dB (peak 0 dB)
-    at N frequencies from -fs/2, N the power of two not below `points`; N below
-    order + 1 raises ArgumentError (-42422)."""
-    x, c = _signal(x, "covariance_psd")
-    n, p, pts = x.shape[0], _int(order), _int(points)
+def covariance_psd(x: "ArrayLike", *, order: int, points: int = 512,
+                   fs: float = 1.0) -> CovarianceSpectrum:
+    """Power spectrum of the covariance-method AR model, in dB.
+
+    Evaluates 1/|A(f)|**2 of the order-p model `covariance` fits, at N
+    frequencies from -fs/2 in steps of fs/N, N the power of two not below
+    `points`, and returns it in dB with its peak at exactly 0 dB.
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n >= 1 samples
+        The record. float64 runs the real fit, complex128 the complex one;
+        other dtypes numpy casts safely to one of them are converted.
+    order : int, 1 <= order <= floor(2n/3), order + 1 <= N
+        The model order p.
+    points : int, 2 <= points <= 2**30, default 512
+        Frequencies asked for; N is the power of two not below it, and must
+        be at least order + 1.
+    fs : float, fs > 0, default 1.0
+        Sampling rate: the axis is in Hz when given, in cycles per sample
+        with the default.
+
+    Returns
+    -------
+    CovarianceSpectrum
+        Named tuple ``(frequencies, spectrum, noise_variance)``: the axis
+        -fs/2 + arange(N) fs/N (Hz when fs is given, else cycles per
+        sample), the spectrum in dB (peak 0 dB), both float64 of length N,
+        and the model's prediction-error variance (units of x squared),
+        which does not enter the spectrum.
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D (code None); x is empty (-42401); order out of range
+        (-42412); points below 2 or above 2**30 (-42417); fs not positive
+        (-42418); a NaN or infinite sample or fs (-42419); the fit would
+        exceed the library's work-memory bound (-42420); N below order + 1
+        (-42422).
+    TypeError
+        order or points is not an integer.
+    NonFiniteResultError
+        A result would be NaN or infinite (-30001), e.g. a pole on the unit
+        circle (a ramp) putting an infinity into the spectrum.
+    NumericError
+        Another numeric failure (root finder, LAPACK, extreme values).
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    Warns
+    -----
+    RankDeficientWarning
+        The least-squares system was rank deficient; the results are complete.
+
+    See Also
+    --------
+    covariance : the model itself.
+    pcar_psd : the principal-component AR spectrum.
+
+    Examples
+    --------
+    >>> import numpy as np, qdm
+    >>> t = np.arange(64)
+    >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
+    ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
+    >>> f, db, noise = qdm.covariance_psd(x, order=4, points=1000, fs=1000.0)
+    >>> print(len(f), f[0], f[1] - f[0])    # N = 1024, from -fs/2 in steps of fs/N
+    1024 -500.0 0.9765625
+    >>> print(db.max(), abs(f[np.argmax(db)]).round(1))    # the peak, in Hz
+    0.0 99.6
+    """
+    a, c = _signal(x, "covariance_psd")
+    n, p, pts = a.shape[0], _int(order), _int(points)
     N = _clib.qdm_spectrum_length(pts)
     db = _np.empty(max(N, 1))
     f0, df, nv = _ct.c_double(), _ct.c_double(), _ct.c_double()
-    _check(_fn["covariance_psd", _kind(c)](_addr(x), n, p, pts, _fs(fs), _addr(db),
+    _check(_fn["covariance_psd", _kind(c)](_addr(a), n, p, pts, _fs(fs), _addr(db),
                                            _ct.byref(f0), _ct.byref(df), _ct.byref(nv)),
            "covariance_psd")
     return CovarianceSpectrum(_axis(f0.value, df.value, N), db, nv.value)
 
 
-def pcar_psd(x, *, order, components, points=512, fs=1.0, real_signal=False):
-    """Power spectrum of the principal-component AR model in dB (peak 0 dB), and
-    the `components` modes whose poles lie nearest the unit circle (nearest
-    first), amplitudes fitted by least squares. No damping is reported. N below
-    order + 1 raises ArgumentError (-42422)."""
-    x, c = _signal(x, "pcar_psd")
-    n, p, k, pts = x.shape[0], _int(order), _int(components), _int(points)
+def pcar_psd(x: "ArrayLike", *, order: int, components: int, points: int = 512,
+             fs: float = 1.0, real_signal: bool = False) -> PcarSpectrum:
+    """Power spectrum of the principal-component AR model, and its strongest modes.
+
+    Evaluates 1/|A(f)|**2 of the model `pcar` fits at N
+    frequencies from -fs/2 in steps of fs/N, N the power of two not below
+    `points`, in dB with its peak at exactly 0 dB; and takes the
+    `components` roots nearest the unit circle as modes, their amplitudes
+    fitted to the record by least squares.
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n >= 1 samples
+        The record. float64 runs the real fit, complex128 the complex one;
+        other dtypes numpy casts safely to one of them are converted.
+    order : int, 1 <= order <= floor(2n/3), order + 1 <= N
+        The model order p (0 passes the order check, but no `components`
+        value is then valid).
+    components : int, 1 <= components <= order
+        Singular components kept, and the number of modes k reported.
+    points : int, 2 <= points <= 2**30, default 512
+        Frequencies asked for; N is the power of two not below it, and must
+        be at least order + 1.
+    fs : float, fs > 0, default 1.0
+        Sampling rate: the axis and `frequency` are in Hz when given, in
+        cycles per sample with the default.
+    real_signal : bool, default False
+        Real data only: of the k modes report those with arg(z) in [0, pi),
+        one per conjugate pair. False reports all k, as for complex data.
+
+    Returns
+    -------
+    PcarSpectrum
+        Named tuple ``(frequencies, spectrum, amplitude, phase, frequency,
+        fit_error)``: the axis -fs/2 + arange(N) fs/N and the spectrum in dB
+        (peak 0 dB), float64 of length N; the modes nearest the unit circle
+        first, amplitude |A_i| (units of x), phase in radians in (-pi, pi],
+        frequency in Hz when fs is given, else cycles per sample; and the
+        amplitude fit's mean squared error (units of x squared). No damping.
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D, or real_signal with complex data (code None); x is
+        empty (-42401); order negative or above floor(2n/3) (-42411);
+        components < 1 (-42412); components > order (-42413); points below
+        2 or above 2**30 (-42417); fs not positive (-42418); a NaN or
+        infinite sample or fs (-42419); the fit would exceed the library's
+        work-memory bound (-42420); N below order + 1 (-42422).
+    TypeError
+        order, components or points is not an integer.
+    NonFiniteResultError
+        A result would be NaN or infinite (-30001): a degenerate record.
+    NumericError
+        Another numeric failure (root finder, LAPACK, extreme values).
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    Warns
+    -----
+    RankDeficientWarning
+        The amplitude fit was rank deficient; the results are complete.
+
+    See Also
+    --------
+    pcar : the model itself.
+    covariance_psd : the covariance AR spectrum.
+
+    Examples
+    --------
+    Two sinusoids at 100 and 300 Hz, amplitudes 1 and 0.5 (each the sum of
+    two exponentials of half that amplitude):
+
+    >>> import numpy as np, qdm
+    >>> t = np.arange(64) / 1000.0
+    >>> x = np.cos(2 * np.pi * 100 * t + 0.5) + 0.5 * np.cos(2 * np.pi * 300 * t - 1.0)
+    >>> s = qdm.pcar_psd(x, order=12, components=4, fs=1000.0, real_signal=True)
+    >>> print(len(s.frequencies), s.spectrum.max())
+    512 0.0
+    >>> i = np.argsort(s.frequency)
+    >>> print(s.frequency[i].round(3), s.amplitude[i].round(3), s.phase[i].round(3))
+    [100. 300.] [0.5  0.25] [ 0.5 -1. ]
+    """
+    a, c = _signal(x, "pcar_psd")
+    n, p, k, pts = a.shape[0], _int(order), _int(components), _int(points)
     N = _clib.qdm_spectrum_length(pts)
     db = _np.empty(max(N, 1))
     block, rows = _modes(3, _room(k, n))
     count = _ct.c_int32()
     f0, df, err = _ct.c_double(), _ct.c_double(), _ct.c_double()
-    args = (_addr(x), n, p, pts, k, _fs(fs))
+    args: tuple = (_addr(a), n, p, pts, k, _fs(fs))
     flag = _real_flag(real_signal, c, "pcar_psd")
     if not c:
         args += (flag,)
     _check(_fn["pcar_psd", _kind(c)](*args, *rows, _ct.byref(count), _addr(db),
                                      _ct.byref(f0), _ct.byref(df), _ct.byref(err)), "pcar_psd")
-    return PcarSpectrum(_axis(f0.value, df.value, N), db, *block[:, :count.value], err.value)
+    amplitude, phase, frequency = block[:, :count.value]
+    return PcarSpectrum(_axis(f0.value, df.value, N), db, amplitude, phase, frequency, err.value)

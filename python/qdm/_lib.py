@@ -4,7 +4,7 @@ import ctypes.util
 import os
 
 try:  # written by the wheel builder: where the library was found at install
-    from qdm._where import LIBRARY as _INSTALLED
+    from qdm._where import LIBRARY as _INSTALLED  # type: ignore[import]
 except ImportError:
     _INSTALLED = None
 
@@ -49,7 +49,7 @@ _D = ctypes.c_double
 
 # name: argument types after the leading (x, n) pair, for the real twin; the
 # complex twin is the same without real_signal (marked R).
-_SIGNATURES = {
+_SIGNATURES: dict = {
     "covariance": [_I, _P, _P, _P],
     "pcar": [_I, _I, _P, _P],
     "pcar_solver": [_I, _I, _I, _P, _P],
@@ -80,7 +80,3 @@ lib.qdm_default_pencil.restype = _I
 lib.qdm_default_pencil.argtypes = [_I]
 lib.qdm_version.restype = ctypes.c_char_p
 lib.qdm_version.argtypes = []
-
-
-def status_text(code):
-    return lib.qdm_status_text(code).decode()
