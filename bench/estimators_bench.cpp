@@ -122,7 +122,10 @@ std::string Num(double v) {
 }
 std::string List(const std::vector<double>& v) {
   std::string s = "[";
-  for (size_t i = 0; i < v.size(); ++i) s += (i ? "," : "") + Num(v[i]);
+  for (size_t i = 0; i < v.size(); ++i) {
+    if (i) s += ',';
+    s += Num(v[i]);
+  }
   return s + "]";
 }
 std::vector<double> Flat(const std::vector<Cx>& v) {

@@ -224,7 +224,7 @@ StatusCode RealTwiddle(int32_t r, double* data, const double* twCos, const doubl
   }
   for (ptrdiff_t k = 1; 2 * k <= m; ++k) {
     const double* wc = twCos + (k - 1) * (r - 1);
-    const double* ws = twSin + (k - 1) * (r - 1);
+    const double* wsin = twSin + (k - 1) * (r - 1);
     double* a = data + k * os;
     double* b = data + (m - k) * os;
     const bool middle = 2 * k == m;  // Y_j[m/2] is real
@@ -235,8 +235,8 @@ StatusCode RealTwiddle(int32_t r, double* data, const double* twCos, const doubl
         zr[0] = re;
         zi[0] = im;
       } else {
-        zr[2 * j] = re * wc[j - 1] - im * ws[j - 1];
-        zi[2 * j] = im * wc[j - 1] + re * ws[j - 1];
+        zr[2 * j] = re * wc[j - 1] - im * wsin[j - 1];
+        zi[2 * j] = im * wc[j - 1] + re * wsin[j - 1];
       }
     }
     st = dft(zr, zi, yr, yi, scratch);

@@ -33,7 +33,7 @@ run() {  # name
   ctest --test-dir "build/$1" -j"$jobs" --output-on-failure --schedule-random --timeout 600
 }
 
-suite release -DCMAKE_BUILD_TYPE=Release || failed=1
+suite release -DCMAKE_BUILD_TYPE=Release -DQDM_WERROR=ON || failed=1
 # The install test also builds the Debian package and installs it with apt-get
 # (then removes it): CI runs as root on a machine of its own.
 [ $failed -eq 0 ] && { QDM_TEST_DEB=1 run release | tail -n 25 || failed=1; }

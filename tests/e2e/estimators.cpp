@@ -330,8 +330,8 @@ TEST(Estimators, AnswersAgreeWithTheirOracles) {
       if (!k.spectrumOf.empty()) {  // coefficients beyond N replace earlier ones in their slot
         std::vector<C> onGrid(std::min<size_t>(k.spectrumOf.size(), size_t(N)));
         for (size_t i = 0; i < k.spectrumOf.size(); ++i) onGrid[i % size_t(N)] = k.spectrumOf[i];
-        const std::vector<double> want = SpectrumDb(onGrid, N);
-        for (int j = 0; j < N; ++j) EXPECT_NEAR(db[j], want[j], 1e-6) << "bin " << j;
+        const std::vector<double> wantDb = SpectrumDb(onGrid, N);
+        for (int j = 0; j < N; ++j) EXPECT_NEAR(db[j], wantDb[j], 1e-6) << "bin " << j;
       }
     }
   }
