@@ -74,7 +74,8 @@ static_assert(int32_t(status::kNoMemory) == QDM_ERR_NO_MEMORY &&
               int32_t(status::kBadOption) == QDM_ERR_OPTION &&
               int32_t(status::kNoConvergence) == QDM_ERR_NO_CONVERGENCE &&
               int32_t(status::kBadPolynomial) == QDM_ERR_POLYNOMIAL &&
-              int32_t(status::kNonFinite) == QDM_ERR_EXTREME_VALUE && int32_t(status::kRootNaN) == QDM_ERR_ROOT_NAN &&
+              int32_t(status::kNonFinite) == QDM_ERR_EXTREME_VALUE &&
+              int32_t(status::kRootNaN) == QDM_ERR_ROOT_NAN &&
               int32_t(status::kIllegalArgument) == QDM_ERR_ILLEGAL_ARGUMENT &&
               int32_t(status::kFftLengthMismatch) == QDM_ERR_FFT_LENGTH);
 
@@ -103,14 +104,14 @@ struct OutDouble {
 };
 
 struct PlainCall {
-  StatusCode check;                         // the argument checks' verdict
+  StatusCode check;  // the argument checks' verdict
   Samples x;
   std::initializer_list<const void*> required;  // pointers the call dereferences
-  double work_bytes;                        // estimated work memory
-  const double* rate;                       // sampling rate, or null
-  std::initializer_list<OutArray> outputs;  // zero-filled on failure
-  std::initializer_list<OutDouble> doubles; // 0.0 on failure
-  int32_t* count;                           // 0 on failure, or null
+  double work_bytes;                            // estimated work memory
+  const double* rate;                           // sampling rate, or null
+  std::initializer_list<OutArray> outputs;      // zero-filled on failure
+  std::initializer_list<OutDouble> doubles;     // 0.0 on failure
+  int32_t* count;                               // 0 on failure, or null
 };
 
 // Folds one sample into a running largest magnitude; a NaN or an infinity
@@ -267,22 +268,26 @@ const T* As(const void* samples) {
 }
 
 template <typename T>
-int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles,
-                   double* variance) {
+int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles, double* variance) {
   constexpr bool cx = std::is_same_v<T, Complex>;
   const StatusCode check = checks::Covariance(n, p, kWide);
   const size_t e = cx ? kCx : kReal;
   const int32_t q = check == status::kOk ? p : 0;
-  return RunPlain(
-      {check, {x, n, cx}, {a, poles, variance}, LinearPredictionWork(n, q, e, 4), nullptr,
-       {{a, Bytes(q + int64_t{1}, e)}, {poles, Bytes(q, kCx)}}, {{variance, 2}}, nullptr},
-      [&](const void* xs) {
-        if constexpr (cx) {
-          return CovarianceArComplex(As<T>(xs), n, p, a, AsComplex(poles), variance);
-        } else {
-          return CovarianceArReal(As<T>(xs), n, p, a, AsComplex(poles), variance);
-        }
-      });
+  return RunPlain({check,
+                   {x, n, cx},
+                   {a, poles, variance},
+                   LinearPredictionWork(n, q, e, 4),
+                   nullptr,
+                   {{a, Bytes(q + int64_t{1}, e)}, {poles, Bytes(q, kCx)}},
+                   {{variance, 2}},
+                   nullptr},
+                  [&](const void* xs) {
+                    if constexpr (cx) {
+                      return CovarianceArComplex(As<T>(xs), n, p, a, AsComplex(poles), variance);
+                    } else {
+                      return CovarianceArReal(As<T>(xs), n, p, a, AsComplex(poles), variance);
+                    }
+                  });
 }
 
 // PCAR on either route; the automatic choice also sets the work estimate.
@@ -301,10 +306,16 @@ int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t s
   if (route == PcarSolver::kAuto) {
     route = PcarPrefersKrylov(n, p, k, cx) ? PcarSolver::kKrylov : PcarSolver::kDense;
   }
-  const double work = route == PcarSolver::kKrylov ? PcarKrylovWork(n, p, k, e)
-                                                   : LinearPredictionWork(n, p, e, 8);
-  return RunPlain({check, {x, n, cx}, {a, roots}, work, nullptr,
-                   {{a, Bytes(p + int64_t{1}, e)}, {roots, Bytes(p, kCx)}}, {}, nullptr},
+  const double work =
+      route == PcarSolver::kKrylov ? PcarKrylovWork(n, p, k, e) : LinearPredictionWork(n, p, e, 8);
+  return RunPlain({check,
+                   {x, n, cx},
+                   {a, roots},
+                   work,
+                   nullptr,
+                   {{a, Bytes(p + int64_t{1}, e)}, {roots, Bytes(p, kCx)}},
+                   {},
+                   nullptr},
                   [&](const void* xs) {
                     if constexpr (cx) {
                       return PcarSolverComplex(As<T>(xs), n, p, k, route, a, AsComplex(roots));
@@ -320,8 +331,14 @@ int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t
   constexpr bool cx = std::is_same_v<T, Complex>;
   const StatusCode check = checks::Mdl(n, max_order, min_order, kWide);
   const int32_t L = check == status::kOk ? max_order : 0;
-  return RunPlain({check, {x, n, cx}, {order}, PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L),
-                   nullptr, {}, {}, order},
+  return RunPlain({check,
+                   {x, n, cx},
+                   {order},
+                   PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L),
+                   nullptr,
+                   {},
+                   {},
+                   order},
                   [&](const void* xs) {
                     if constexpr (cx) {
                       return MdlOrderComplex(As<T>(xs), n, L, min_order, order);
@@ -332,15 +349,17 @@ int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t
 }
 
 // The mode arrays of Prony and the pencil: m values each, counted by *modes.
-#define QDM_MODE_OUTPUTS(m)                                                         \
-  {amplitude, Bytes(m, kReal), 1, true}, {phase, Bytes(m, kReal), 0, true},         \
-      {damping, Bytes(m, kReal), 0, true}, {frequency, Bytes(m, kReal), 0, true}
+#define QDM_MODE_OUTPUTS(m)                                                 \
+  {amplitude, Bytes(m, kReal), 1, true}, {phase, Bytes(m, kReal), 0, true}, \
+      {damping, Bytes(m, kReal), 0, true}, {                                \
+    frequency, Bytes(m, kReal), 0, true                                     \
+  }
 
 // The pencil on either route; the automatic choice also sets the work estimate.
 template <typename T>
-int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs,
-               int32_t real_signal, int32_t solver, double* amplitude, double* phase,
-               double* damping, double* frequency, int32_t* modes, double* mse) {
+int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, int32_t real_signal,
+               int32_t solver, double* amplitude, double* phase, double* damping, double* frequency,
+               int32_t* modes, double* mse) {
   constexpr bool cx = std::is_same_v<T, Complex>;
   StatusCode check = checks::Pencil(n, pencil, order, fs, kWide);
   if (check == status::kOk && (solver < QDM_SOLVER_AUTO || solver > QDM_SOLVER_KRYLOV)) {
@@ -353,11 +372,17 @@ int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs,
     route = PencilPrefersKrylov(n, L, M, cx) ? PencilSolver::kKrylov : PencilSolver::kDense;
   }
   const size_t e = cx ? kCx : kReal;
-  const double work = (route == PencilSolver::kKrylov ? PencilKrylovWork(n, M, e)
-                                                      : PencilWork(n, L, e)) +
-                      ModeFitWork(n, M);
-  return RunPlain({check, {x, n, cx}, {amplitude, phase, damping, frequency, modes, mse}, work,
-                   &fs, {QDM_MODE_OUTPUTS(M)}, {{mse, 2}}, modes},
+  const double work =
+      (route == PencilSolver::kKrylov ? PencilKrylovWork(n, M, e) : PencilWork(n, L, e)) +
+      ModeFitWork(n, M);
+  return RunPlain({check,
+                   {x, n, cx},
+                   {amplitude, phase, damping, frequency, modes, mse},
+                   work,
+                   &fs,
+                   {QDM_MODE_OUTPUTS(M)},
+                   {{mse, 2}},
+                   modes},
                   [&](const void* xs) {
                     if constexpr (cx) {
                       return MatrixPencilSolverComplex(As<T>(xs), n, L, M, fs, route, amplitude,
@@ -387,7 +412,7 @@ QDM_PLAIN_API const char* qdm_version(void) { return QDM_VERSION_STRING; }
 
 QDM_PLAIN_API const char* qdm_status_text(int32_t code) {
 #define QDM_STATUS_TEXT_CASE(name, value, text) \
-  case value:                                  \
+  case value:                                   \
     return text;
   switch (code) { QDM_STATUS_TABLE(QDM_STATUS_TEXT_CASE) }
 #undef QDM_STATUS_TEXT_CASE
@@ -424,22 +449,20 @@ QDM_PLAIN_API int32_t qdm_covariance_complex(const qdm_complex* x, int32_t n, in
 
 // ---- principal-component AR -----------------------------------------------------------
 
-QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order,
-                                    int32_t components, double* coefficients,
-                                    qdm_complex* roots) {
+QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order, int32_t components,
+                                    double* coefficients, qdm_complex* roots) {
   return Pcar(x, n, order, components, QDM_SOLVER_AUTO, coefficients, roots);
 }
 
 QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t order,
                                        int32_t components, qdm_complex* coefficients,
                                        qdm_complex* roots) {
-  return Pcar(AsComplex(x), n, order, components, QDM_SOLVER_AUTO, AsComplex(coefficients),
-              roots);
+  return Pcar(AsComplex(x), n, order, components, QDM_SOLVER_AUTO, AsComplex(coefficients), roots);
 }
 
 QDM_PLAIN_API int32_t qdm_pcar_solver_real(const double* x, int32_t n, int32_t order,
-                                           int32_t components, int32_t solver,
-                                           double* coefficients, qdm_complex* roots) {
+                                           int32_t components, int32_t solver, double* coefficients,
+                                           qdm_complex* roots) {
   return Pcar(x, n, order, components, solver, coefficients, roots);
 }
 
@@ -456,23 +479,33 @@ QDM_PLAIN_API int32_t qdm_prony_real(const double* x, int32_t n, int32_t order, 
                                      double* damping, double* frequency, int32_t* modes) {
   const StatusCode check = checks::Prony(n, order, fs, kWide);
   const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check, {x, n, false}, {amplitude, phase, damping, frequency, modes},
-                   LinearPredictionWork(n, p, kReal, 4) + ModeFitWork(n, p), &fs,
-                   {QDM_MODE_OUTPUTS(p)}, {}, modes},
+  return RunPlain({check,
+                   {x, n, false},
+                   {amplitude, phase, damping, frequency, modes},
+                   LinearPredictionWork(n, p, kReal, 4) + ModeFitWork(n, p),
+                   &fs,
+                   {QDM_MODE_OUTPUTS(p)},
+                   {},
+                   modes},
                   [&](const void* xs) {
                     return PronyReal(As<double>(xs), n, p, fs, real_signal, amplitude, phase,
                                      damping, frequency, modes);
                   });
 }
 
-QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t order,
-                                        double fs, double* amplitude, double* phase,
-                                        double* damping, double* frequency, int32_t* modes) {
+QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t order, double fs,
+                                        double* amplitude, double* phase, double* damping,
+                                        double* frequency, int32_t* modes) {
   const StatusCode check = checks::Prony(n, order, fs, kWide);
   const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check, {x, n, true}, {amplitude, phase, damping, frequency, modes},
-                   LinearPredictionWork(n, p, kCx, 4) + ModeFitWork(n, p), &fs,
-                   {QDM_MODE_OUTPUTS(p)}, {}, modes},
+  return RunPlain({check,
+                   {x, n, true},
+                   {amplitude, phase, damping, frequency, modes},
+                   LinearPredictionWork(n, p, kCx, 4) + ModeFitWork(n, p),
+                   &fs,
+                   {QDM_MODE_OUTPUTS(p)},
+                   {},
+                   modes},
                   [&](const void* xs) {
                     return PronyComplex(As<Complex>(xs), n, p, fs, amplitude, phase, damping,
                                         frequency, modes);
@@ -491,20 +524,20 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_real(const double* x, int32_t n, int32_t
 
 QDM_PLAIN_API int32_t qdm_matrix_pencil_complex(const qdm_complex* x, int32_t n, int32_t pencil,
                                                 int32_t order, double fs, double* amplitude,
-                                                double* phase, double* damping,
-                                                double* frequency, int32_t* modes, double* mse) {
-  return Pencil(AsComplex(x), n, pencil, order, fs, 0, QDM_SOLVER_AUTO, amplitude, phase,
-                damping, frequency, modes, mse);
+                                                double* phase, double* damping, double* frequency,
+                                                int32_t* modes, double* mse) {
+  return Pencil(AsComplex(x), n, pencil, order, fs, 0, QDM_SOLVER_AUTO, amplitude, phase, damping,
+                frequency, modes, mse);
 }
 
 QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_real(const double* x, int32_t n, int32_t pencil,
-                                                    int32_t order, double fs,
-                                                    int32_t real_signal, int32_t solver,
-                                                    double* amplitude, double* phase,
-                                                    double* damping, double* frequency,
-                                                    int32_t* modes, double* mse) {
-  return Pencil(x, n, pencil, order, fs, real_signal, solver, amplitude, phase, damping,
-                frequency, modes, mse);
+                                                    int32_t order, double fs, int32_t real_signal,
+                                                    int32_t solver, double* amplitude,
+                                                    double* phase, double* damping,
+                                                    double* frequency, int32_t* modes,
+                                                    double* mse) {
+  return Pencil(x, n, pencil, order, fs, real_signal, solver, amplitude, phase, damping, frequency,
+                modes, mse);
 }
 
 QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int32_t n,
@@ -513,8 +546,8 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int
                                                        double* phase, double* damping,
                                                        double* frequency, int32_t* modes,
                                                        double* mse) {
-  return Pencil(AsComplex(x), n, pencil, order, fs, 0, solver, amplitude, phase, damping,
-                frequency, modes, mse);
+  return Pencil(AsComplex(x), n, pencil, order, fs, 0, solver, amplitude, phase, damping, frequency,
+                modes, mse);
 }
 
 // ---- MDL ----------------------------------------------------------------------------------
@@ -539,30 +572,39 @@ QDM_PLAIN_API int32_t qdm_covariance_psd_real(const double* x, int32_t n, int32_
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain({check, {x, n, false}, {spectrum, f0, df, noise_variance},
-                   LinearPredictionWork(n, p, kReal, 4) + SpectrumWork(N), &fs,
-                   {{spectrum, Bytes(N, kReal)}}, {{f0}, {df}, {noise_variance, 2}}, nullptr},
+  return RunPlain({check,
+                   {x, n, false},
+                   {spectrum, f0, df, noise_variance},
+                   LinearPredictionWork(n, p, kReal, 4) + SpectrumWork(N),
+                   &fs,
+                   {{spectrum, Bytes(N, kReal)}},
+                   {{f0}, {df}, {noise_variance, 2}},
+                   nullptr},
                   [&](const void* xs) {
-                    const StatusCode s = CovPowerSpectrumReal(As<double>(xs), n, p, N, fs,
-                                                              &result, noise_variance);
+                    const StatusCode s =
+                        CovPowerSpectrumReal(As<double>(xs), n, p, N, fs, &result, noise_variance);
                     *f0 = result.f0;
                     *df = result.df;
                     return s;
                   });
 }
 
-QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n,
-                                                 int32_t order, int32_t points, double fs,
-                                                 double* spectrum, double* f0, double* df,
-                                                 double* noise_variance) {
+QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n, int32_t order,
+                                                 int32_t points, double fs, double* spectrum,
+                                                 double* f0, double* df, double* noise_variance) {
   const StatusCode check =
       SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain({check, {x, n, true}, {spectrum, f0, df, noise_variance},
-                   LinearPredictionWork(n, p, kCx, 4) + SpectrumWork(N), &fs,
-                   {{spectrum, Bytes(N, kReal)}}, {{f0}, {df}, {noise_variance, 2}}, nullptr},
+  return RunPlain({check,
+                   {x, n, true},
+                   {spectrum, f0, df, noise_variance},
+                   LinearPredictionWork(n, p, kCx, 4) + SpectrumWork(N),
+                   &fs,
+                   {{spectrum, Bytes(N, kReal)}},
+                   {{f0}, {df}, {noise_variance, 2}},
+                   nullptr},
                   [&](const void* xs) {
                     const StatusCode s = CovPowerSpectrumComplex(As<Complex>(xs), n, p, N, fs,
                                                                  &result, noise_variance);
@@ -572,58 +614,68 @@ QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n
                   });
 }
 
-QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t order,
-                                        int32_t points, int32_t components, double fs,
-                                        int32_t real_signal, double* amplitude, double* phase,
-                                        double* frequency, int32_t* modes, double* spectrum,
-                                        double* f0, double* df, double* fit_error) {
-  const StatusCode check = SpectrumCheck(
-      checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
+QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t order, int32_t points,
+                                        int32_t components, double fs, int32_t real_signal,
+                                        double* amplitude, double* phase, double* frequency,
+                                        int32_t* modes, double* spectrum, double* f0, double* df,
+                                        double* fit_error) {
+  const StatusCode check =
+      SpectrumCheck(checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   const int32_t k = check == status::kOk ? components : 0;
   SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain(
-      {check, {x, n, false}, {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
-       LinearPredictionWork(n, p, kReal, 8) + ModeFitWork(n, k) + SpectrumWork(N), &fs,
-       {{amplitude, Bytes(k, kReal), 1, true}, {phase, Bytes(k, kReal), 0, true},
-        {frequency, Bytes(k, kReal), 0, true}, {spectrum, Bytes(N, kReal)}},
-       {{f0}, {df}, {fit_error, 2}}, modes},
-      [&](const void* xs) {
-        const StatusCode s =
-            PcarPowerSpectrumReal(As<double>(xs), n, p, k, N, fs, real_signal, amplitude, phase,
-                                  frequency, fit_error, &result, modes);
-        *f0 = result.f0;
-        *df = result.df;
-        return s;
-      });
+  return RunPlain({check,
+                   {x, n, false},
+                   {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
+                   LinearPredictionWork(n, p, kReal, 8) + ModeFitWork(n, k) + SpectrumWork(N),
+                   &fs,
+                   {{amplitude, Bytes(k, kReal), 1, true},
+                    {phase, Bytes(k, kReal), 0, true},
+                    {frequency, Bytes(k, kReal), 0, true},
+                    {spectrum, Bytes(N, kReal)}},
+                   {{f0}, {df}, {fit_error, 2}},
+                   modes},
+                  [&](const void* xs) {
+                    const StatusCode s = PcarPowerSpectrumReal(
+                        As<double>(xs), n, p, k, N, fs, real_signal, amplitude, phase, frequency,
+                        fit_error, &result, modes);
+                    *f0 = result.f0;
+                    *df = result.df;
+                    return s;
+                  });
 }
 
 QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int32_t order,
                                            int32_t points, int32_t components, double fs,
                                            double* amplitude, double* phase, double* frequency,
-                                           int32_t* modes, double* spectrum, double* f0,
-                                           double* df, double* fit_error) {
-  const StatusCode check = SpectrumCheck(
-      checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
+                                           int32_t* modes, double* spectrum, double* f0, double* df,
+                                           double* fit_error) {
+  const StatusCode check =
+      SpectrumCheck(checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   const int32_t k = check == status::kOk ? components : 0;
   SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain(
-      {check, {x, n, true}, {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
-       LinearPredictionWork(n, p, kCx, 8) + ModeFitWork(n, k) + SpectrumWork(N), &fs,
-       {{amplitude, Bytes(k, kReal), 1, true}, {phase, Bytes(k, kReal), 0, true},
-        {frequency, Bytes(k, kReal), 0, true}, {spectrum, Bytes(N, kReal)}},
-       {{f0}, {df}, {fit_error, 2}}, modes},
-      [&](const void* xs) {
-        const StatusCode s =
-            PcarPowerSpectrumComplex(As<Complex>(xs), n, p, k, N, fs, amplitude, phase,
-                                     frequency, fit_error, &result, modes);
-        *f0 = result.f0;
-        *df = result.df;
-        return s;
-      });
+  return RunPlain({check,
+                   {x, n, true},
+                   {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
+                   LinearPredictionWork(n, p, kCx, 8) + ModeFitWork(n, k) + SpectrumWork(N),
+                   &fs,
+                   {{amplitude, Bytes(k, kReal), 1, true},
+                    {phase, Bytes(k, kReal), 0, true},
+                    {frequency, Bytes(k, kReal), 0, true},
+                    {spectrum, Bytes(N, kReal)}},
+                   {{f0}, {df}, {fit_error, 2}},
+                   modes},
+                  [&](const void* xs) {
+                    const StatusCode s =
+                        PcarPowerSpectrumComplex(As<Complex>(xs), n, p, k, N, fs, amplitude, phase,
+                                                 frequency, fit_error, &result, modes);
+                    *f0 = result.f0;
+                    *df = result.df;
+                    return s;
+                  });
 }
 
 }  // extern "C"

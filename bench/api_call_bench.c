@@ -10,7 +10,7 @@
 
 static double Now(void) {
   struct timespec t;
-  clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &t);  /* CPU time: steady on a shared machine */
+  clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &t); /* CPU time: steady on a shared machine */
   return (double)t.tv_sec + 1e-9 * (double)t.tv_nsec;
 }
 
@@ -29,11 +29,14 @@ int main(void) {
       for (int i = 0; i < kCalls; ++i) {
         if (fit == 0) s |= qdm_covariance_real(x, kN, 2, coef, poles, &nv);
         if (fit == 1) s |= qdm_prony_real(x, kN, 2, 1.0, 0, amp, ph, dmp, fr, &modes);
-        if (fit == 2) s |= qdm_matrix_pencil_real(x, kN, kN / 3, 2, 1.0, 0, amp, ph, dmp, fr,
-                                                 &modes, &mse);
+        if (fit == 2)
+          s |= qdm_matrix_pencil_real(x, kN, kN / 3, 2, 1.0, 0, amp, ph, dmp, fr, &modes, &mse);
       }
       double us = (Now() - t0) / kCalls * 1e6;
-      if (s != 0) { fprintf(stderr, "%s: status %d\n", names[fit], s); return 1; }
+      if (s != 0) {
+        fprintf(stderr, "%s: status %d\n", names[fit], s);
+        return 1;
+      }
       if (us < best) best = us;
     }
     printf("%s %.3f\n", names[fit], best);

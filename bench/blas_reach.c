@@ -73,21 +73,41 @@ static void Call(int r, int m, int n, int inc, int t, char** p) {
   double complex dot;
   const int k = n;
   switch (r) {
-    case 0: case 1:
+    case 0:
+    case 1:
       cblas_dgemv(CblasColMajor, r ? CblasTrans : CblasNoTrans, m, n, 1.0, (double*)p[0], m,
                   (double*)p[1], inc, 0.0, (double*)p[2], 1);
       break;
-    case 2: case 3: case 4:
-      cblas_zgemv(CblasColMajor, r == 2 ? CblasNoTrans : r == 3 ? CblasTrans : CblasConjTrans, m, n,
-                  &one, p[0], m, p[1], inc, &zero, p[2], 1);
+    case 2:
+    case 3:
+    case 4:
+      cblas_zgemv(CblasColMajor,
+                  r == 2   ? CblasNoTrans
+                  : r == 3 ? CblasTrans
+                           : CblasConjTrans,
+                  m, n, &one, p[0], m, p[1], inc, &zero, p[2], 1);
       break;
-    case 5: (void)cblas_ddot(n, (double*)p[0], inc, (double*)p[1], inc); break;
-    case 6: cblas_zdotc_sub(n, p[0], inc, p[1], inc, &dot); break;
-    case 7: cblas_dcopy(n, (double*)p[0], inc, (double*)p[1], inc); break;
-    case 8: cblas_zcopy(n, p[0], inc, p[1], inc); break;
-    case 9: cblas_daxpy(n, 2.0, (double*)p[0], inc, (double*)p[1], inc); break;
-    case 10: cblas_zaxpy(n, &one, p[0], inc, p[1], inc); break;
-    case 11: (void)cblas_dznrm2(n, p[0], inc); break;
+    case 5:
+      (void)cblas_ddot(n, (double*)p[0], inc, (double*)p[1], inc);
+      break;
+    case 6:
+      cblas_zdotc_sub(n, p[0], inc, p[1], inc, &dot);
+      break;
+    case 7:
+      cblas_dcopy(n, (double*)p[0], inc, (double*)p[1], inc);
+      break;
+    case 8:
+      cblas_zcopy(n, p[0], inc, p[1], inc);
+      break;
+    case 9:
+      cblas_daxpy(n, 2.0, (double*)p[0], inc, (double*)p[1], inc);
+      break;
+    case 10:
+      cblas_zaxpy(n, &one, p[0], inc, p[1], inc);
+      break;
+    case 11:
+      (void)cblas_dznrm2(n, p[0], inc);
+      break;
     case 12:  // C (m x 3) = op(A) B, A m x k (t = 0) or k x m (t = 1), row-major
       cblas_dgemm(CblasRowMajor, t ? CblasTrans : CblasNoTrans, CblasNoTrans, m, 3, k, 1.0,
                   (double*)p[0], t ? m : k, (double*)p[1], 3, 0.0, (double*)p[2], 3);
@@ -121,11 +141,13 @@ int main(void) {
         for (int inc = -3; inc <= 3; ++inc) {
           const int gemm = r >= 12, level1 = r >= 5 && r < 12;
           if (inc == 0 || (gemm && inc != 1)) continue;  // gemm: no strides
-          if ((gemm || level1) && m > 1) continue;      // one size loop (n) for these
+          if ((gemm || level1) && m > 1) continue;       // one size loop (n) for these
           for (int t = 0; t < 2; ++t) {
             if (!gemm && t) continue;
-            const int es = (r == 2 || r == 3 || r == 4 || r == 6 || r == 8 || r == 10 || r == 11 ||
-                            r == 13) ? 16 : 8;
+            const int es =
+                (r == 2 || r == 3 || r == 4 || r == 6 || r == 8 || r == 10 || r == 11 || r == 13)
+                    ? 16
+                    : 8;
             const int ai = inc < 0 ? -inc : inc;
             const int len = level1 ? 3 * n : n;  // level 1: lengths 1 to 39
             size_t size[3];

@@ -144,13 +144,14 @@ struct Result {
 };
 
 struct Case {
-  std::string name;     // export name
-  std::string record;   // record key
-  std::string params;   // JSON object of the parameters
+  std::string name;    // export name
+  std::string record;  // record key
+  std::string params;  // JSON object of the parameters
   std::function<Result()> run;
 };
 
-// ---- the cases -------------------------------------------------------------------------------------
+// ---- the cases
+// -------------------------------------------------------------------------------------
 struct Sizes {
   int n, p, k, L, M, points;
 };
@@ -171,61 +172,75 @@ void AddCases(const qdmtest::QdmApi& q, std::vector<Case>& cases, const std::str
     return s + "}";
   };
   const std::string cov = P({{"p", z.p}});
-  cases.push_back({"QdmReCovarianceH", rkey, cov, [&q, R, z] {
-                     auto a = HostArray::Empty(QDM_TYPE_DOUBLE), r = HostArray::Empty(QDM_TYPE_COMPLEX);
-                     double v = 0;
-                     Result res{q.QdmReCovarianceH(*R, z.p, a, r, &v), {}};
-                     res.outputs = {{"coefficients", a.Reals()}, {"poles", Flat(r.Complexes())}, {"variance", {v}}};
-                     return res;
-                   }});
+  cases.push_back(
+      {"QdmReCovarianceH", rkey, cov, [&q, R, z] {
+         auto a = HostArray::Empty(QDM_TYPE_DOUBLE), r = HostArray::Empty(QDM_TYPE_COMPLEX);
+         double v = 0;
+         Result res{q.QdmReCovarianceH(*R, z.p, a, r, &v), {}};
+         res.outputs = {
+             {"coefficients", a.Reals()}, {"poles", Flat(r.Complexes())}, {"variance", {v}}};
+         return res;
+       }});
   cases.push_back({"QdmCxCovarianceH", ckey, cov, [&q, C, z] {
-                     auto a = HostArray::Empty(QDM_TYPE_COMPLEX), r = HostArray::Empty(QDM_TYPE_COMPLEX);
+                     auto a = HostArray::Empty(QDM_TYPE_COMPLEX),
+                          r = HostArray::Empty(QDM_TYPE_COMPLEX);
                      double v = 0;
                      Result res{q.QdmCxCovarianceH(*C, z.p, a, r, &v), {}};
-                     res.outputs = {{"coefficients", Flat(a.Complexes())}, {"poles", Flat(r.Complexes())}, {"variance", {v}}};
+                     res.outputs = {{"coefficients", Flat(a.Complexes())},
+                                    {"poles", Flat(r.Complexes())},
+                                    {"variance", {v}}};
                      return res;
                    }});
   const std::string pcar = P({{"p", z.p}, {"k", z.k}});
   cases.push_back({"QdmRePCARH", rkey, pcar, [&q, R, z] {
-                     auto a = HostArray::Empty(QDM_TYPE_DOUBLE), r = HostArray::Empty(QDM_TYPE_COMPLEX);
+                     auto a = HostArray::Empty(QDM_TYPE_DOUBLE),
+                          r = HostArray::Empty(QDM_TYPE_COMPLEX);
                      Result res{q.QdmRePCARH(*R, z.p, z.k, a, r), {}};
                      res.outputs = {{"coefficients", a.Reals()}, {"poles", Flat(r.Complexes())}};
                      return res;
                    }});
-  cases.push_back({"QdmCxPCARH", ckey, pcar, [&q, C, z] {
-                     auto a = HostArray::Empty(QDM_TYPE_COMPLEX), r = HostArray::Empty(QDM_TYPE_COMPLEX);
-                     Result res{q.QdmCxPCARH(*C, z.p, z.k, a, r), {}};
-                     res.outputs = {{"coefficients", Flat(a.Complexes())}, {"poles", Flat(r.Complexes())}};
-                     return res;
-                   }});
+  cases.push_back(
+      {"QdmCxPCARH", ckey, pcar, [&q, C, z] {
+         auto a = HostArray::Empty(QDM_TYPE_COMPLEX), r = HostArray::Empty(QDM_TYPE_COMPLEX);
+         Result res{q.QdmCxPCARH(*C, z.p, z.k, a, r), {}};
+         res.outputs = {{"coefficients", Flat(a.Complexes())}, {"poles", Flat(r.Complexes())}};
+         return res;
+       }});
   auto modes = [](Result& res, HostArray& amp, HostArray& ph, HostArray& dm, HostArray& fr) {
-    res.outputs = {{"amplitude", amp.Reals()}, {"phase", ph.Reals()}, {"damping", dm.Reals()},
+    res.outputs = {{"amplitude", amp.Reals()},
+                   {"phase", ph.Reals()},
+                   {"damping", dm.Reals()},
                    {"frequency", fr.Reals()}};
   };
   const std::string prony = P({{"p", z.p}, {"fs", fs}});
   cases.push_back({"QdmRePronyH", rkey, prony, [&q, R, z, fs, modes] {
-                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10), dm = HostArray::Empty(10), fr = HostArray::Empty(10);
+                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10),
+                          dm = HostArray::Empty(10), fr = HostArray::Empty(10);
                      Result res{q.QdmRePronyH(*R, z.p, fs, &kTrue, amp, ph, dm, fr), {}};
                      modes(res, amp, ph, dm, fr);
                      return res;
                    }});
   cases.push_back({"QdmCxPronyH", ckey, prony, [&q, C, z, fs, modes] {
-                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10), dm = HostArray::Empty(10), fr = HostArray::Empty(10);
+                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10),
+                          dm = HostArray::Empty(10), fr = HostArray::Empty(10);
                      Result res{q.QdmCxPronyH(*C, z.p, fs, amp, ph, dm, fr), {}};
                      modes(res, amp, ph, dm, fr);
                      return res;
                    }});
   const std::string pencil = P({{"L", z.L}, {"M", z.M}, {"fs", fs}});
-  cases.push_back({"QdmReMatrixPencilH", rkey, pencil, [&q, R, z, fs, modes] {
-                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10), dm = HostArray::Empty(10), fr = HostArray::Empty(10);
-                     double mse = 0;
-                     Result res{q.QdmReMatrixPencilH(*R, z.L, z.M, fs, &kTrue, amp, ph, dm, fr, &mse), {}};
-                     modes(res, amp, ph, dm, fr);
-                     res.outputs.push_back({"mse", {mse}});
-                     return res;
-                   }});
+  cases.push_back(
+      {"QdmReMatrixPencilH", rkey, pencil, [&q, R, z, fs, modes] {
+         auto amp = HostArray::Empty(10), ph = HostArray::Empty(10), dm = HostArray::Empty(10),
+              fr = HostArray::Empty(10);
+         double mse = 0;
+         Result res{q.QdmReMatrixPencilH(*R, z.L, z.M, fs, &kTrue, amp, ph, dm, fr, &mse), {}};
+         modes(res, amp, ph, dm, fr);
+         res.outputs.push_back({"mse", {mse}});
+         return res;
+       }});
   cases.push_back({"QdmCxMatrixPencilH", ckey, pencil, [&q, C, z, fs, modes] {
-                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10), dm = HostArray::Empty(10), fr = HostArray::Empty(10);
+                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10),
+                          dm = HostArray::Empty(10), fr = HostArray::Empty(10);
                      double mse = 0;
                      Result res{q.QdmCxMatrixPencilH(*C, z.L, z.M, fs, amp, ph, dm, fr, &mse), {}};
                      modes(res, amp, ph, dm, fr);
@@ -262,17 +277,29 @@ void AddCases(const qdmtest::QdmApi& q, std::vector<Case>& cases, const std::str
                    }});
   const std::string ps = P({{"p", z.p}, {"m", z.points}, {"k", z.k}, {"fs", fs}});
   cases.push_back({"QdmRePCARPowerSpectrumH", rkey, ps, [&q, R, z, fs] {
-                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10), fr = HostArray::Empty(10), s = HostArray::Empty(10);
+                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10),
+                          fr = HostArray::Empty(10), s = HostArray::Empty(10);
                      double f0 = 0, df = 0, e = 0;
-                     Result res{q.QdmRePCARPowerSpectrumH(*R, z.p, z.points, z.k, fs, &kTrue, amp, ph, fr, &f0, &df, s, &e), {}};
-                     res.outputs = {{"amplitude", amp.Reals()}, {"frequency", fr.Reals()}, {"spectrum", s.Reals()}, {"fitError", {e}}};
+                     Result res{q.QdmRePCARPowerSpectrumH(*R, z.p, z.points, z.k, fs, &kTrue, amp,
+                                                          ph, fr, &f0, &df, s, &e),
+                                {}};
+                     res.outputs = {{"amplitude", amp.Reals()},
+                                    {"frequency", fr.Reals()},
+                                    {"spectrum", s.Reals()},
+                                    {"fitError", {e}}};
                      return res;
                    }});
   cases.push_back({"QdmCxPCARPowerSpectrumH", ckey, ps, [&q, C, z, fs] {
-                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10), fr = HostArray::Empty(10), s = HostArray::Empty(10);
+                     auto amp = HostArray::Empty(10), ph = HostArray::Empty(10),
+                          fr = HostArray::Empty(10), s = HostArray::Empty(10);
                      double f0 = 0, df = 0, e = 0;
-                     Result res{q.QdmCxPCARPowerSpectrumH(*C, z.p, z.points, z.k, fs, amp, ph, fr, &f0, &df, s, &e), {}};
-                     res.outputs = {{"amplitude", amp.Reals()}, {"frequency", fr.Reals()}, {"spectrum", s.Reals()}, {"fitError", {e}}};
+                     Result res{q.QdmCxPCARPowerSpectrumH(*C, z.p, z.points, z.k, fs, amp, ph, fr,
+                                                          &f0, &df, s, &e),
+                                {}};
+                     res.outputs = {{"amplitude", amp.Reals()},
+                                    {"frequency", fr.Reals()},
+                                    {"spectrum", s.Reals()},
+                                    {"fitError", {e}}};
                      return res;
                    }});
 }
@@ -319,9 +346,10 @@ int RunThreads(const qdmtest::QdmApi& q, int threads) {
   }
   for (auto& th : pool) th.join();
   const double wall = std::chrono::duration<double>(std::chrono::steady_clock::now() - t0).count();
-  std::printf("{\"threads\":%d,\"calls\":%d,\"wall_per_call\":%s,\"failures\":%d,\"blas\":\"%s\"}\n",
-              threads, threads * calls, Num(wall / (threads * calls)).c_str(), bad.load(),
-              BlasDescription().c_str());
+  std::printf(
+      "{\"threads\":%d,\"calls\":%d,\"wall_per_call\":%s,\"failures\":%d,\"blas\":\"%s\"}\n",
+      threads, threads * calls, Num(wall / (threads * calls)).c_str(), bad.load(),
+      BlasDescription().c_str());
   return bad.load() == 0 ? 0 : 1;
 }
 
@@ -363,10 +391,16 @@ int main(int argc, char** argv) {
     std::vector<Cx> xc;
   };
   std::vector<Sized> sets;
-  sets.push_back({{1024, 16, 4, 256, 4, 1024}, "real1024", "complex1024", RealRecord(1024, 1),
+  sets.push_back({{1024, 16, 4, 256, 4, 1024},
+                  "real1024",
+                  "complex1024",
+                  RealRecord(1024, 1),
                   ComplexRecord(1024, 2)});
-  sets.push_back({{16384, 64, 4, 64, 4, 16384}, "real16384", "complex16384",
-                  RealRecord(16384, 3), ComplexRecord(16384, 4)});
+  sets.push_back({{16384, 64, 4, 64, 4, 16384},
+                  "real16384",
+                  "complex16384",
+                  RealRecord(16384, 3),
+                  ComplexRecord(16384, 4)});
 
   if (extra) {
     // Outputs only, no times: the records scaled to the ends of the range, and
@@ -383,8 +417,10 @@ int main(int argc, char** argv) {
     const auto xr = RealRecord(1024, 1);
     const auto xc = ComplexRecord(1024, 2);
     sets = {};
-    sets.push_back({z, "real1024x1e150", "complex1024x1e150", scaled(xr, 1e150), scaledc(xc, 1e150)});
-    sets.push_back({z, "real1024x1e-150", "complex1024x1e-150", scaled(xr, 1e-150), scaledc(xc, 1e-150)});
+    sets.push_back(
+        {z, "real1024x1e150", "complex1024x1e150", scaled(xr, 1e150), scaledc(xc, 1e150)});
+    sets.push_back(
+        {z, "real1024x1e-150", "complex1024x1e-150", scaled(xr, 1e-150), scaledc(xc, 1e-150)});
     std::vector<double> cr(1024);
     std::vector<Cx> cc(1024);
     for (int t = 0; t < 1024; ++t) {
@@ -407,15 +443,16 @@ int main(int argc, char** argv) {
   }
   if (!only.empty()) {  // --only EXPORT:RECORD, either part may be empty
     const std::string name = only.substr(0, only.find(':'));
-    const std::string record = only.find(':') == std::string::npos ? "" : only.substr(only.find(':') + 1);
+    const std::string record =
+        only.find(':') == std::string::npos ? "" : only.substr(only.find(':') + 1);
     std::erase_if(cases, [&](const Case& c) {
       return (!name.empty() && c.name != name) || (!record.empty() && c.record != record);
     });
   }
   out += BlasDescription() + "\",\n\"records\":{";
   for (size_t i = 0; i < sets.size(); ++i) {
-    out += std::string(i ? ",\n" : "\n") + "\"" + sets[i].rkey + "\":" + List(sets[i].xr) + ",\n\"" +
-           sets[i].ckey + "\":" + List(Flat(sets[i].xc));
+    out += std::string(i ? ",\n" : "\n") + "\"" + sets[i].rkey + "\":" + List(sets[i].xr) +
+           ",\n\"" + sets[i].ckey + "\":" + List(Flat(sets[i].xc));
   }
   out += "},\n\"cases\":[";
   if (!records_only) {
@@ -424,11 +461,12 @@ int main(int argc, char** argv) {
       const Result r = c.run();
       const double t = g_batches == 0 ? 0.0 : BestTime([&] { (void)c.run(); });
       std::fprintf(stderr, "%-26s %-13s %10.3f ms\n", c.name.c_str(), c.record.c_str(), 1e3 * t);
-      out += std::string(i ? ",\n" : "\n") + "{\"name\":\"" + c.name + "\",\"record\":\"" + c.record +
-             "\",\"params\":" + c.params + ",\"seconds\":" + Num(t) +
+      out += std::string(i ? ",\n" : "\n") + "{\"name\":\"" + c.name + "\",\"record\":\"" +
+             c.record + "\",\"params\":" + c.params + ",\"seconds\":" + Num(t) +
              ",\"status\":" + std::to_string(r.status) + ",\"outputs\":{";
       for (size_t j = 0; j < r.outputs.size(); ++j) {
-        out += std::string(j ? "," : "") + "\"" + r.outputs[j].first + "\":" + List(r.outputs[j].second);
+        out += std::string(j ? "," : "") + "\"" + r.outputs[j].first +
+               "\":" + List(r.outputs[j].second);
       }
       out += "}}";
     }

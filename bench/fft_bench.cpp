@@ -236,9 +236,9 @@ int main(int argc, char** argv) {
   // (3, 5 and 15 times powers of two, and mixed 2^a 3^b 5^c); other lengths.
   std::vector<int> lengths;
   for (int n = 8; n <= (1 << 20); n *= 2) lengths.push_back(n);
-  for (int n : {1536, 3072, 12288, 49152, 196608, 786432, 1280, 5120, 20480, 81920, 327680,
-                1310720, 3840, 15360, 61440, 245760, 983040, 1000, 2160, 6750, 18000, 50625,
-                93312, 253125, 472392, 1000000})
+  for (int n : {1536,  3072,   12288,   49152, 196608, 786432, 1280,   5120,   20480,
+                81920, 327680, 1310720, 3840,  15360,  61440,  245760, 983040, 1000,
+                2160,  6750,   18000,   50625, 93312,  253125, 472392, 1000000})
     lengths.push_back(n);
   for (int n : {1763, 2438, 30030, 1009, 4999, 10007}) lengths.push_back(n);
   if (only > 0) lengths.assign(1, only);
@@ -246,8 +246,8 @@ int main(int argc, char** argv) {
   if (csv) {
     std::printf("kind,n,qdm_ns,fftw_ns,ratio,fftw_measure_ns\n");
   } else {
-    std::printf("%-8s %7s %12s %12s %7s %14s %7s\n", "kind", "n", "qdm ns", "fftw est ns",
-                "ratio", "fftw meas ns", "ratio");
+    std::printf("%-8s %7s %12s %12s %7s %14s %7s\n", "kind", "n", "qdm ns", "fftw est ns", "ratio",
+                "fftw meas ns", "ratio");
   }
   for (const char* kind : {"complex", "real", "inverse"}) {
     for (int n : lengths) {

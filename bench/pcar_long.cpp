@@ -54,9 +54,9 @@ int main(int argc, char** argv) {
       if (route == 0 && n > denseMaxN) continue;
       a[route].assign(static_cast<size_t>(p) + 1, Cx(0.0, 0.0));
       const auto t0 = std::chrono::steady_clock::now();
-      const StatusCode st = PcarSolverComplex(x.data(), n, p, k,
-                                              route ? PcarSolver::kKrylov : PcarSolver::kDense,
-                                              a[route].data(), roots.data());
+      const StatusCode st =
+          PcarSolverComplex(x.data(), n, p, k, route ? PcarSolver::kKrylov : PcarSolver::kDense,
+                            a[route].data(), roots.data());
       t[route] = Seconds(t0);
       if (st != status::kOk) std::printf("n %d route %d: status %d\n", n, route, st);
     }
@@ -68,7 +68,8 @@ int main(int argc, char** argv) {
     double da = NAN;
     if (!a[0].empty()) {
       da = 0.0;
-      for (int32_t i = 0; i <= p; ++i) da = std::max(da, std::abs(a[0][size_t(i)] - a[1][size_t(i)]));
+      for (int32_t i = 0; i <= p; ++i)
+        da = std::max(da, std::abs(a[0][size_t(i)] - a[1][size_t(i)]));
     }
     std::printf("%7d %6d %10.3f %10.3f %10.3f %12.2f %10.1e\n", n, p, t[0], t[1], tr, tr / t[1],
                 da);

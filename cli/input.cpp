@@ -25,8 +25,10 @@ size_t Utf8Length(std::string_view text, size_t i) {
   size_t length = 0;
   unsigned char low = 0x80, high = 0xbf;  // the second byte's range
   if (c >= 0xc2 && c <= 0xdf) length = 2, low = c == 0xc2 ? 0xa0 : 0x80;
-  if (c >= 0xe0 && c <= 0xef) length = 3, low = c == 0xe0 ? 0xa0 : 0x80, high = c == 0xed ? 0x9f : 0xbf;
-  if (c >= 0xf0 && c <= 0xf4) length = 4, low = c == 0xf0 ? 0x90 : 0x80, high = c == 0xf4 ? 0x8f : 0xbf;
+  if (c >= 0xe0 && c <= 0xef)
+    length = 3, low = c == 0xe0 ? 0xa0 : 0x80, high = c == 0xed ? 0x9f : 0xbf;
+  if (c >= 0xf0 && c <= 0xf4)
+    length = 4, low = c == 0xf0 ? 0x90 : 0x80, high = c == 0xf4 ? 0x8f : 0xbf;
   if (length == 0 || i + length > text.size() || at(1) < low || at(1) > high) return 0;
   for (size_t k = 2; k < length; ++k)
     if (at(k) < 0x80 || at(k) > 0xbf) return 0;
@@ -75,8 +77,7 @@ class Lines {
       if (line->size() + take > kMaxLineBytes)
         Bad(Where() + "a line longer than " + std::to_string(kMaxLineBytes >> 20) +
             " MiB: not a CSV signal");
-      if (std::memchr(first, '\0', take))
-        Bad(Where() + "a NUL byte: not a text file");
+      if (std::memchr(first, '\0', take)) Bad(Where() + "a NUL byte: not a text file");
       line->append(first, take);
       begin_ += take + (newline ? 1 : 0);
       if (newline) return true;
@@ -126,7 +127,7 @@ std::vector<std::string_view> Split(std::string_view text, const CsvFormat& form
     }
     return fields;
   }
-  for (size_t i = 0;; ) {
+  for (size_t i = 0;;) {
     const size_t end = std::min(text.find(format.delimiter, i), text.size());
     std::string_view f = Trim(text.substr(i, end - i));
     if (f.size() >= 2 && f.front() == '"' && f.back() == '"') f = f.substr(1, f.size() - 2);
@@ -143,9 +144,8 @@ bool SignedDigits(std::string_view s) {
   return Digits(s.substr(!s.empty() && (s[0] == '-' || s[0] == '+')));
 }
 bool NoCaseIs(std::string_view s, std::string_view word) {
-  return s.size() == word.size() &&
-         std::equal(s.begin(), s.end(), word.begin(),
-                    [](char a, char b) { return (a | 0x20) == b; });
+  return s.size() == word.size() && std::equal(s.begin(), s.end(), word.begin(),
+                                               [](char a, char b) { return (a | 0x20) == b; });
 }
 
 // A field that is meant as a number, well formed or not: a digit first (after a
@@ -153,8 +153,8 @@ bool NoCaseIs(std::string_view s, std::string_view word) {
 bool LooksNumeric(std::string_view f) {
   if (!f.empty() && (f[0] == '-' || f[0] == '+')) f.remove_prefix(1);
   if (!f.empty() && f[0] == '.') f.remove_prefix(1);
-  return (!f.empty() && f[0] >= '0' && f[0] <= '9') || NoCaseIs(f, "nan") ||
-         NoCaseIs(f, "inf") || NoCaseIs(f, "infinity");
+  return (!f.empty() && f[0] >= '0' && f[0] <= '9') || NoCaseIs(f, "nan") || NoCaseIs(f, "inf") ||
+         NoCaseIs(f, "infinity");
 }
 
 enum class Parsed { kNumber, kNotNumber, kOutOfRange };
@@ -275,9 +275,10 @@ Signal ReadCsv(std::FILE* in, const std::string& name, const CsvFormat& format) 
     }
     if (unnamedPair) {
       long long k = 0;
-      const bool integer = SignedDigits(f[0]) &&
-                           std::from_chars(f[0].data() + (f[0][0] == '+'),
-                                           f[0].data() + f[0].size(), k).ec == std::errc();
+      const bool integer =
+          SignedDigits(f[0]) &&
+          std::from_chars(f[0].data() + (f[0][0] == '+'), f[0].data() + f[0].size(), k).ec ==
+              std::errc();
       counting = counting && integer && (rows == 0 || k == previous + 1);
       previous = k;
       commaDecimals = commaDecimals && integer && Digits(f[1]);
@@ -286,12 +287,14 @@ Signal ReadCsv(std::FILE* in, const std::string& name, const CsvFormat& format) 
   }
   if (rows == 0) Bad(shown + ": no samples");
   if (unnamedPair && counting && rows >= 2)
-    Bad(shown + ": the first of two columns counts up by one (an index or a year?): give "
-                "--column 2 for the samples, or --columns 1,2 to read both as complex");
+    Bad(shown +
+        ": the first of two columns counts up by one (an index or a year?): give "
+        "--column 2 for the samples, or --columns 1,2 to read both as complex");
   if (unnamedPair && commaDecimals)
-    Bad(shown + ": every line is an integer, a comma and digits, as numbers with a decimal "
-                "comma are: give --delimiter ';' to read the comma as a decimal point, or "
-                "--columns 1,2 to read two columns as complex");
+    Bad(shown +
+        ": every line is an integer, a comma and digits, as numbers with a decimal "
+        "comma are: give --delimiter ';' to read the comma as a decimal point, or "
+        "--columns 1,2 to read two columns as complex");
   if (rows > INT32_MAX) Bad(shown + ": more than 2^31 - 1 samples");
   s.complex = pick.size() == 2;
   s.n = static_cast<int32_t>(rows);

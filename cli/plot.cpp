@@ -23,9 +23,7 @@ namespace {
 
 constexpr size_t kMaxPicture = size_t{64} << 20;
 
-[[noreturn]] void PlotFailed(const std::string& message) {
-  throw Failure{kOutput, {}, message};
-}
+[[noreturn]] void PlotFailed(const std::string& message) { throw Failure{kOutput, {}, message}; }
 
 // A directory of our own under $TMPDIR (or /tmp), removed with what it holds.
 class PrivateDirectory {
@@ -49,7 +47,8 @@ class PrivateDirectory {
   void Write(const char* name, const std::function<void(std::FILE*)>& write) {
     const std::string file = Add(name);
     std::FILE* f = std::fopen(file.c_str(), "wbx");
-    if (f == nullptr) PlotFailed("cannot write gnuplot's input: " + std::string(std::strerror(errno)));
+    if (f == nullptr)
+      PlotFailed("cannot write gnuplot's input: " + std::string(std::strerror(errno)));
     try {
       write(f);
     } catch (...) {
@@ -71,7 +70,8 @@ std::string LastLine(const std::string& file) {
   std::string text, last;
   if (std::FILE* f = std::fopen(file.c_str(), "rb")) {
     char chunk[4096];
-    for (size_t got; (got = std::fread(chunk, 1, sizeof chunk, f)) > 0 && text.size() < kMaxPicture;)
+    for (size_t got;
+         (got = std::fread(chunk, 1, sizeof chunk, f)) > 0 && text.size() < kMaxPicture;)
       text.append(chunk, got);
     std::fclose(f);
   }
@@ -112,7 +112,8 @@ bool RunGnuplot(const std::string& script, const std::vector<PlotFile>& files,
   dir.Add("errors.txt");
 
   int pipeFds[2];
-  if (pipe2(pipeFds, O_CLOEXEC) != 0) PlotFailed("cannot run gnuplot: " + std::string(std::strerror(errno)));
+  if (pipe2(pipeFds, O_CLOEXEC) != 0)
+    PlotFailed("cannot run gnuplot: " + std::string(std::strerror(errno)));
   posix_spawn_file_actions_t actions;
   posix_spawn_file_actions_init(&actions);
   posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
@@ -145,7 +146,8 @@ bool RunGnuplot(const std::string& script, const std::vector<PlotFile>& files,
   while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
   }
   const std::string what = "gnuplot could not draw " + Shown(png, kNameShown) + ": ";
-  if (WIFSIGNALED(status)) PlotFailed(what + "killed by signal " + std::to_string(WTERMSIG(status)));
+  if (WIFSIGNALED(status))
+    PlotFailed(what + "killed by signal " + std::to_string(WTERMSIG(status)));
   if (!WIFEXITED(status) || WEXITSTATUS(status) != 0)
     PlotFailed(what + LastLine(dir.path() + "/errors.txt"));
   if (tooBig || picture.compare(0, 4, "\x89PNG") != 0)

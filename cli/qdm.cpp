@@ -142,16 +142,16 @@ std::unique_ptr<double[]> SpectrumOutput(int32_t length) {
   try {
     return std::unique_ptr<double[]>(new double[std::max<size_t>(length, 2)]);
   } catch (const std::bad_alloc&) {
-    throw Failure{kFailed, {},
+    throw Failure{kFailed,
+                  {},
                   "no memory for a spectrum of " + std::to_string(length) + " values (" +
                       std::to_string((uint64_t(length) * sizeof(double)) >> 20) + " MiB)"};
   }
 }
 
 // The twins of a plain-API function that take the same arguments after the samples.
-#define QDM_TWIN(fn, ...)                                                                \
-  Check(s.complex ? fn##_complex(cx, __VA_ARGS__) : fn##_real(re, __VA_ARGS__), #fn, \
-        s.complex, r)
+#define QDM_TWIN(fn, ...) \
+  Check(s.complex ? fn##_complex(cx, __VA_ARGS__) : fn##_real(re, __VA_ARGS__), #fn, s.complex, r)
 
 // Rows of named columns: row i of column c is values[c][i * stride]; null columns are left out.
 Json Rows(std::initializer_list<const char*> names, std::vector<const double*> values, size_t n,
@@ -179,7 +179,7 @@ Json Poles(const double* z, size_t n, double rate) {
 }
 
 int32_t SolverOf(const Options& o) {
-  return o.solver == "krylov" ? QDM_SOLVER_KRYLOV
+  return o.solver == "krylov"  ? QDM_SOLVER_KRYLOV
          : o.solver == "dense" ? QDM_SOLVER_DENSE
                                : QDM_SOLVER_AUTO;
 }
@@ -211,9 +211,15 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   double variance = 0.0, mse = 0.0, f0 = 0.0, df = 0.0, fitError = 0.0;
   int32_t count = 0, order = 0;
   switch (m) {
-    case kCovariance: QDM_TWIN(qdm_covariance, n, p, a, z, &variance); break;
-    case kPcar: QDM_TWIN(qdm_pcar_solver, n, p, k, SolverOf(o), a, z); break;
-    case kMdl: QDM_TWIN(qdm_mdl_order, n, upper, minOrder, &order); break;
+    case kCovariance:
+      QDM_TWIN(qdm_covariance, n, p, a, z, &variance);
+      break;
+    case kPcar:
+      QDM_TWIN(qdm_pcar_solver, n, p, k, SolverOf(o), a, z);
+      break;
+    case kMdl:
+      QDM_TWIN(qdm_mdl_order, n, upper, minOrder, &order);
+      break;
     case kCovSpectrum:
       QDM_TWIN(qdm_covariance_psd, n, p, points, rate, db.get(), &f0, &df, &variance);
       break;
@@ -223,8 +229,8 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
             "qdm_prony", s.complex, r);
       break;
     case kPencil:
-      Check(s.complex ? qdm_matrix_pencil_solver_complex(cx, n, L, M, rate, SolverOf(o), amp,
-                                                         phase, damping, freq, &count, &mse)
+      Check(s.complex ? qdm_matrix_pencil_solver_complex(cx, n, L, M, rate, SolverOf(o), amp, phase,
+                                                         damping, freq, &count, &mse)
                       : qdm_matrix_pencil_solver_real(re, n, L, M, rate, flag, SolverOf(o), amp,
                                                       phase, damping, freq, &count, &mse),
             "qdm_matrix_pencil_solver", s.complex, r);
@@ -232,8 +238,8 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     case kPcarSpectrum:
       Check(s.complex ? qdm_pcar_psd_complex(cx, n, p, points, k, rate, amp, phase, freq, &count,
                                              db.get(), &f0, &df, &fitError)
-                      : qdm_pcar_psd_real(re, n, p, points, k, rate, flag, amp, phase, freq,
-                                          &count, db.get(), &f0, &df, &fitError),
+                      : qdm_pcar_psd_real(re, n, p, points, k, rate, flag, amp, phase, freq, &count,
+                                          db.get(), &f0, &df, &fitError),
             "qdm_pcar_psd", s.complex, r);
       break;
   }
@@ -400,7 +406,8 @@ void WriteCsv(std::FILE* out, const Record& r) {
 // with quotes escaped and every backslash doubled (the reader removes one).
 std::string PlotText(const std::string& text) {
   std::string out;
-  for (const char c : Shown(text, 1024, true)) out += c == '\\' ? std::string(2, c) : std::string(1, c);
+  for (const char c : Shown(text, 1024, true))
+    out += c == '\\' ? std::string(2, c) : std::string(1, c);
   return out;
 }
 
@@ -457,11 +464,13 @@ bool Plot(const std::string& png, const Record& r) {
               "'#1f5fa8' title 'modes', '' using 'frequency_hz':'amplitude':(sprintf('%.4g Hz', "
               "column('frequency_hz'))) with labels offset 0,1 notitle";
   } else {
-    script += "set parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
-              "set ylabel 'Imaginary'\n" + terminal +
-              "plot cos(t), sin(t) with lines lc rgb 'gray' title 'unit circle', 'data.csv' "
-              "using 1:2 with points pt 7 ps 1.5 lc rgb '#1f5fa8' title '" +
-              std::string(key == "roots" ? "roots" : "poles") + "'";
+    script +=
+        "set parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
+        "set ylabel 'Imaginary'\n" +
+        terminal +
+        "plot cos(t), sin(t) with lines lc rgb 'gray' title 'unit circle', 'data.csv' "
+        "using 1:2 with points pt 7 ps 1.5 lc rgb '#1f5fa8' title '" +
+        std::string(key == "roots" ? "roots" : "poles") + "'";
   }
   return RunGnuplot(script + "\n", files, png);
 }
@@ -526,8 +535,11 @@ int RunBatch(Method m, const Options& o) {
     records[i].reset();
     lock.unlock();
     if (r.json.is_null())
-      r.json = {{"input", o.files[i]}, {"method", kMethods[m][0]}, {"status", nullptr},
-                {"exit", kFailed}, {"error", Shown(o.files[i], kNameShown) + ": out of memory"}};
+      r.json = {{"input", o.files[i]},
+                {"method", kMethods[m][0]},
+                {"status", nullptr},
+                {"exit", kFailed},
+                {"error", Shown(o.files[i], kNameShown) + ": out of memory"}};
     WriteJson(stdout, r, -1);
     if (!r.warning.empty())
       std::fprintf(stderr, "qdm: %s: warning: %s\n", Shown(o.files[i], kNameShown).c_str(),
@@ -567,7 +579,9 @@ int RunSingle(Method m, const Options& o) {
 
 // CLI11 takes `--order ''` as no value at all; here it is an error.
 const CLI::Validator kNonEmpty(
-    [](std::string& value) { return value.empty() ? std::string("an empty value") : std::string(); },
+    [](std::string& value) {
+      return value.empty() ? std::string("an empty value") : std::string();
+    },
     "", "NonEmpty");
 
 // --column(s) and --delimiter into the CSV format; a usage message, or "".
@@ -575,10 +589,14 @@ std::string MakeFormat(Options& o) {
   CsvFormat& f = o.format;
   f.maxBytes = o.maxInputBytes;
   const std::string& d = o.delimiter;
-  if (d == "tab" || d == "\t") f.delimiter = '\t';
-  else if (d == "space" || d == " ") f.blanks = true;
-  else if (d == "," || d == ";" || d == "|") f.delimiter = d[0];
-  else return "--delimiter takes ',', ';', '|', tab or space, not '" + Shown(d, kFieldShown) + "'";
+  if (d == "tab" || d == "\t")
+    f.delimiter = '\t';
+  else if (d == "space" || d == " ")
+    f.blanks = true;
+  else if (d == "," || d == ";" || d == "|")
+    f.delimiter = d[0];
+  else
+    return "--delimiter takes ',', ';', '|', tab or space, not '" + Shown(d, kFieldShown) + "'";
   if (o.columns.empty()) return "";
   for (size_t i = 0;;) {
     const size_t end = std::min(o.columns.find(',', i), o.columns.size());
@@ -590,7 +608,8 @@ std::string MakeFormat(Options& o) {
                                  [](const std::string& c) { return c.empty(); });
   if (f.columns.size() > 2 || empty)
     return "--column takes one column (real samples) or two, as N,M or NAME,NAME (real, "
-           "imaginary), not '" + Shown(o.columns, kFieldShown) + "'";
+           "imaginary), not '" +
+           Shown(o.columns, kFieldShown) + "'";
   return "";
 }
 

@@ -56,8 +56,8 @@ Signal ReadCsv(std::FILE* in, const std::string& name, const CsvFormat& format);
 // files, and writes the picture it prints to `png`. False: no gnuplot on PATH.
 // Throws a Failure with exit 3 when gnuplot fails or `png` cannot be written.
 struct PlotFile {
-  const char* name;                          // a fixed name inside the directory
-  std::function<void(std::FILE*)> write;     // writes its contents
+  const char* name;                       // a fixed name inside the directory
+  std::function<void(std::FILE*)> write;  // writes its contents
 };
 bool RunGnuplot(const std::string& script, const std::vector<PlotFile>& files,
                 const std::string& png);

@@ -77,8 +77,7 @@ pthread_mutex_t g_plan_mutex;
 }
 
 StatusCode PlanMutexCreate() {
-  return pthread_mutex_init(&g_plan_mutex, nullptr) == 0 ? status::kOk
-                                                         : status::kIllegalArgument;
+  return pthread_mutex_init(&g_plan_mutex, nullptr) == 0 ? status::kOk : status::kIllegalArgument;
 }
 
 void PlanMutexClose() { pthread_mutex_destroy(&g_plan_mutex); }
@@ -113,9 +112,9 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE, DWORD reason, LPVOID) {
 // DllMain call: there the program's start-up attaches it instead.
 __attribute__((constructor)) static void QdmAttachInProgram() {
   HMODULE self = nullptr;
-  if (GetModuleHandleExA(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
-                             GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
-                         reinterpret_cast<LPCSTR>(&QdmAttachInProgram), &self) &&
+  if (GetModuleHandleExA(
+          GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS | GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
+          reinterpret_cast<LPCSTR>(&QdmAttachInProgram), &self) &&
       self == GetModuleHandleA(nullptr))
     Attach();
 }

@@ -8,7 +8,7 @@
 // The status every internal routine returns. An enumeration over int32_t, so
 // that it reads and compares as the integer it is, but [[nodiscard]]: every
 // call whose status is dropped without a (void) is a compile-time warning.
-enum [[nodiscard]] StatusCode : int32_t {};
+enum [[nodiscard]] StatusCode : int32_t{};
 using Complex = std::complex<double>;  // same layout as two doubles, real part first
 
 // Status values. 0 is success; small positive values are estimator argument
@@ -19,31 +19,31 @@ namespace status {
 constexpr StatusCode kOk{0};
 
 // estimator argument errors
-constexpr StatusCode kEmptyInput{1};          // n < 1
-constexpr StatusCode kBadOrder{11};           // order / pencil parameter out of range
-constexpr StatusCode kBadCount{12};           // order <= 0 (some families), components / k / M <= 0
-constexpr StatusCode kCountAboveOrder{13};    // components / k / M above the order or L
-constexpr StatusCode kBadMinOrder{14};        // MDL minOrder < 1
-constexpr StatusCode kBadMdlUpper{15};        // MDL L not above minOrder, or above floor(2n/3)
-constexpr StatusCode kNoModes{16};            // amplitude fit asked for no modes
-constexpr StatusCode kBadSpectrumSize{17};    // spectrum size m < 2
-constexpr StatusCode kBadSampleRate{18};      // sampling rate not positive
+constexpr StatusCode kEmptyInput{1};        // n < 1
+constexpr StatusCode kBadOrder{11};         // order / pencil parameter out of range
+constexpr StatusCode kBadCount{12};         // order <= 0 (some families), components / k / M <= 0
+constexpr StatusCode kCountAboveOrder{13};  // components / k / M above the order or L
+constexpr StatusCode kBadMinOrder{14};      // MDL minOrder < 1
+constexpr StatusCode kBadMdlUpper{15};      // MDL L not above minOrder, or above floor(2n/3)
+constexpr StatusCode kNoModes{16};          // amplitude fit asked for no modes
+constexpr StatusCode kBadSpectrumSize{17};  // spectrum size m < 2
+constexpr StatusCode kBadSampleRate{18};    // sampling rate not positive
 
 // numeric library
-constexpr StatusCode kRankDeficient{20001};   // warning: rank < min(rows, cols)
+constexpr StatusCode kRankDeficient{20001};  // warning: rank < min(rows, cols)
 constexpr StatusCode kNoMemory{-20001};
-constexpr StatusCode kBadSize{-20003};        // a size argument below 1
-constexpr StatusCode kNegativeDim{-20004};    // negative matrix-product dimension
-constexpr StatusCode kBadOption{-20061};      // option argument out of range
-constexpr StatusCode kNoConvergence{-20062};  // LAPACK INFO > 0, root iteration limit
-constexpr StatusCode kBadPolynomial{-20063};  // NaN coefficient or degree < 1
-constexpr StatusCode kNonFinite{-20068};      // rejected by HasNonFinite*
-constexpr StatusCode kRootNaN{-20116};        // root iteration produced NaN
+constexpr StatusCode kBadSize{-20003};              // a size argument below 1
+constexpr StatusCode kNegativeDim{-20004};          // negative matrix-product dimension
+constexpr StatusCode kBadOption{-20061};            // option argument out of range
+constexpr StatusCode kNoConvergence{-20062};        // LAPACK INFO > 0, root iteration limit
+constexpr StatusCode kBadPolynomial{-20063};        // NaN coefficient or degree < 1
+constexpr StatusCode kNonFinite{-20068};            // rejected by HasNonFinite*
+constexpr StatusCode kRootNaN{-20116};              // root iteration produced NaN
 constexpr StatusCode kKrylovNoConvergence{-20070};  // Lanczos restarts exhausted
-constexpr StatusCode kIllegalArgument{-20999};  // LAPACK INFO < 0; real FFT length mismatch
+constexpr StatusCode kIllegalArgument{-20999};      // LAPACK INFO < 0; real FFT length mismatch
 
 // FFT engine
-constexpr StatusCode kFftLengthMismatch{-1};      // complex driver
+constexpr StatusCode kFftLengthMismatch{-1};          // complex driver
 constexpr StatusCode kFftRealLengthMismatch{-20999};  // real driver
 }  // namespace status
 

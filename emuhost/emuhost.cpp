@@ -19,7 +19,7 @@ namespace {
 struct Header {
   size_t capacity;  // elements
   size_t elementSize;
-  size_t pad;       // keeps the visible block 16-byte aligned
+  size_t pad;  // keeps the visible block 16-byte aligned
   size_t pad2;
 };
 static_assert(sizeof(Header) % 16 == 0);
@@ -111,8 +111,7 @@ int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArrayHandle* ha
 
 QdmArrayHandle EmuMakeHandle(int32_t typeCode, int32_t count, const double* values) {
   QdmArrayHandle h = nullptr;
-  if (Resize(typeCode, 1, &h, count < 0 ? 0 : static_cast<size_t>(count)) != 0)
-    return nullptr;
+  if (Resize(typeCode, 1, &h, count < 0 ? 0 : static_cast<size_t>(count)) != 0) return nullptr;
   std::memcpy(*h, &count, 4);
   if (values != nullptr && count > 0)
     std::memcpy(reinterpret_cast<char*>(*h) + 4, values,

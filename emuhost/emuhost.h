@@ -13,13 +13,13 @@
 #include "qdm.h"
 
 #if defined(_WIN32)
-#  if defined(EMUHOST_BUILDING)
-#    define EMUHOST_API __declspec(dllexport)
-#  else
-#    define EMUHOST_API __declspec(dllimport)
-#  endif
+#if defined(EMUHOST_BUILDING)
+#define EMUHOST_API __declspec(dllexport)
 #else
-#  define EMUHOST_API __attribute__((visibility("default")))
+#define EMUHOST_API __declspec(dllimport)
+#endif
+#else
+#define EMUHOST_API __attribute__((visibility("default")))
 #endif
 
 #ifdef __cplusplus
@@ -60,8 +60,7 @@ EMUHOST_API void EmuLastResize(int32_t* typeCode, int32_t* numDims, size_t* coun
 /* Arguments of resize call number `call` (1-based, as counted by
  * EmuResizeCalls); the most recent 1024 calls are kept. Returns 0 if that call
  * is no longer (or not yet) in the log. */
-EMUHOST_API int32_t EmuResizeAt(int64_t call, int32_t* typeCode, int32_t* numDims,
-                                size_t* count);
+EMUHOST_API int32_t EmuResizeAt(int64_t call, int32_t* typeCode, int32_t* numDims, size_t* count);
 
 #ifdef __cplusplus
 }

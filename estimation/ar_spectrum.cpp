@@ -98,8 +98,7 @@ void WindowInPlace(double* x, int32_t m, int32_t mode) {
 
 // Common tail of both evaluators on the rotated power P (L values):
 // reciprocal, peak normalisation into result->values, dB, grid.
-StatusCode FinishSpectrum(double* P, int32_t L, int32_t recip, double fs,
-                          SpectrumResult* result) {
+StatusCode FinishSpectrum(double* P, int32_t L, int32_t recip, double fs, SpectrumResult* result) {
   if (recip != 0)
     for (int32_t i = 0; i < L; ++i) P[i] = 1.0 / P[i];  // a zero power gives +inf
   double peak = 0.0;
@@ -165,8 +164,8 @@ StatusCode ArSpectrumComplex(Complex* a, int32_t m, int32_t recip, double fs, in
   return FinishSpectrum(P.get(), L, recip, fs, result);
 }
 
-StatusCode ArSpectrumReal(double* a, int32_t m, int32_t recip, double fs, int32_t N,
-                          int32_t mode, SpectrumResult* result) {
+StatusCode ArSpectrumReal(double* a, int32_t m, int32_t recip, double fs, int32_t N, int32_t mode,
+                          SpectrumResult* result) {
   if (m < 1) return status::kBadSize;
   if (WindowKindOfMode(mode) < 0) return status::kBadOption;
   WindowInPlace(a, m, mode);

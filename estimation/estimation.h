@@ -35,12 +35,12 @@ StatusCode VecSubComplex(const Complex* u, const Complex* v, int32_t count, Comp
 // fitting error E.
 [[nodiscard]] StatusCode ModeAmplitudesComplex(const Complex* x, int32_t n, const Complex* z,
                                                int32_t k, Complex* A, double* E);
-[[nodiscard]] StatusCode ModeAmplitudesReal(const double* x, int32_t n, const Complex* z,
-                                            int32_t k, Complex* A, double* E);
+[[nodiscard]] StatusCode ModeAmplitudesReal(const double* x, int32_t n, const Complex* z, int32_t k,
+                                            Complex* A, double* E);
 // Amplitude, phase, damping (per sample), frequency (Hz) per reported mode.
 StatusCode ModeParameters(const Complex* A, int32_t kA, const Complex* z, int32_t kz, double fs,
-                          int32_t realFlag, double* amp, double* phase, double* damp,
-                          double* freq, int32_t* count);
+                          int32_t realFlag, double* amp, double* phase, double* damp, double* freq,
+                          int32_t* count);
 
 // ---- Prony ------------------------------------------------------------------------------
 [[nodiscard]] StatusCode PronyComplex(const Complex* x, int32_t n, int32_t p, double fs,
@@ -87,9 +87,8 @@ bool PcarPrefersKrylov(int32_t n, int32_t p, int32_t k, bool complex);
 StatusCode ScaleRowsByInverseReal(double* A, int32_t rows, int32_t cols, const double* s);
 StatusCode ScaleRowsByInverseComplex(Complex* A, int32_t rows, int32_t cols, const double* s);
 [[nodiscard]] StatusCode MatrixPencilReal(const double* x, int32_t n, int32_t L, int32_t M,
-                                          double fs, int32_t realFlag, double* amp,
-                                          double* phase, double* damp, double* freq, double* mse,
-                                          int32_t* count);
+                                          double fs, int32_t realFlag, double* amp, double* phase,
+                                          double* damp, double* freq, double* mse, int32_t* count);
 [[nodiscard]] StatusCode MatrixPencilComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
                                              double fs, double* amp, double* phase, double* damp,
                                              double* freq, double* mse, int32_t* count);
@@ -115,13 +114,13 @@ bool PencilPrefersKrylov(int32_t n, int32_t L, int32_t M, bool complex);
 // ---- minimum description length ------------------------------------------------------------
 [[nodiscard]] StatusCode MdlOrderReal(const double* x, int32_t n, int32_t L, int32_t minOrder,
                                       int32_t* order);
-[[nodiscard]] StatusCode MdlOrderComplex(const Complex* x, int32_t n, int32_t L,
-                                         int32_t minOrder, int32_t* order);
+[[nodiscard]] StatusCode MdlOrderComplex(const Complex* x, int32_t n, int32_t L, int32_t minOrder,
+                                         int32_t* order);
 // The same search with every candidate's amplitudes fitted in full (the forms
 // above pass over, unfitted, the candidates a bounded fast score rules out):
 // the reference they must agree with, for tests and benchmarks.
-[[nodiscard]] StatusCode MdlOrderFullReal(const double* x, int32_t n, int32_t L,
-                                          int32_t minOrder, int32_t* order);
+[[nodiscard]] StatusCode MdlOrderFullReal(const double* x, int32_t n, int32_t L, int32_t minOrder,
+                                          int32_t* order);
 [[nodiscard]] StatusCode MdlOrderFullComplex(const Complex* x, int32_t n, int32_t L,
                                              int32_t minOrder, int32_t* order);
 
@@ -135,21 +134,19 @@ struct SpectrumResult {
 int32_t IntLog2(int32_t x);
 // Spectrum length for m requested points: the smallest power of two >= m.
 int32_t SpectrumLength(int32_t m);
-[[nodiscard]] StatusCode CovPowerSpectrumComplex(const Complex* x, int32_t n, int32_t p,
-                                                 int32_t N, double fs, SpectrumResult* result,
+[[nodiscard]] StatusCode CovPowerSpectrumComplex(const Complex* x, int32_t n, int32_t p, int32_t N,
+                                                 double fs, SpectrumResult* result,
                                                  double* variance);
 [[nodiscard]] StatusCode CovPowerSpectrumReal(const double* x, int32_t n, int32_t p, int32_t N,
-                                              double fs, SpectrumResult* result,
-                                              double* variance);
-[[nodiscard]] StatusCode PcarPowerSpectrumComplex(const Complex* x, int32_t n, int32_t p,
-                                                  int32_t k, int32_t N, double fs, double* amp,
-                                                  double* phase, double* freq, double* fitError,
+                                              double fs, SpectrumResult* result, double* variance);
+[[nodiscard]] StatusCode PcarPowerSpectrumComplex(const Complex* x, int32_t n, int32_t p, int32_t k,
+                                                  int32_t N, double fs, double* amp, double* phase,
+                                                  double* freq, double* fitError,
                                                   SpectrumResult* result, int32_t* count);
 [[nodiscard]] StatusCode PcarPowerSpectrumReal(const double* x, int32_t n, int32_t p, int32_t k,
-                                               int32_t N, double fs, int32_t realFlag,
-                                               double* amp, double* phase, double* freq,
-                                               double* fitError, SpectrumResult* result,
-                                               int32_t* count);
+                                               int32_t N, double fs, int32_t realFlag, double* amp,
+                                               double* phase, double* freq, double* fitError,
+                                               SpectrumResult* result, int32_t* count);
 [[nodiscard]] StatusCode ArSpectrumComplex(Complex* a, int32_t m, int32_t recip, double fs,
                                            int32_t N, int32_t mode, SpectrumResult* result);
 [[nodiscard]] StatusCode ArSpectrumReal(double* a, int32_t m, int32_t recip, double fs, int32_t N,

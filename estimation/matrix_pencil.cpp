@@ -173,9 +173,9 @@ StatusCode ScaleRows(T* A, int32_t rows, int32_t cols, const double* s) {
 
 // ---- estimator ------------------------------------------------------------------------------
 template <typename T>
-StatusCode MatrixPencil(const T* x, int32_t n, int32_t L, int32_t M, double fs,
-                        int32_t realFlag, double* amp, double* phase, double* damp, double* freq,
-                        double* mse, int32_t* count, Route route = Route::kDense) {
+StatusCode MatrixPencil(const T* x, int32_t n, int32_t L, int32_t M, double fs, int32_t realFlag,
+                        double* amp, double* phase, double* damp, double* freq, double* mse,
+                        int32_t* count, Route route = Route::kDense) {
   if (n < 1) return status::kEmptyInput;
   if (L < 0 || L > MaxOrder(n)) return status::kBadOrder;
   if (M < 1) return status::kBadCount;
@@ -196,8 +196,8 @@ StatusCode MatrixPencil(const T* x, int32_t n, int32_t L, int32_t M, double fs,
   if (st != status::kOk) return st;
   st = ModeAmplitudes(x, n, poles.get(), order, amplitudes.get(), mse);
   if (st != status::kOk) return st;
-  return ModeParameters(amplitudes.get(), order, poles.get(), order, fs, realFlag, amp, phase,
-                        damp, freq, count);
+  return ModeParameters(amplitudes.get(), order, poles.get(), order, fs, realFlag, amp, phase, damp,
+                        freq, count);
 }
 
 }  // namespace
@@ -221,8 +221,8 @@ StatusCode MatrixPencilReal(const double* x, int32_t n, int32_t L, int32_t M, do
 }
 // Complex data have no conjugate pairs to fold: every mode is reported (flag 0).
 StatusCode MatrixPencilComplex(const Complex* x, int32_t n, int32_t L, int32_t M, double fs,
-                               double* amp, double* phase, double* damp, double* freq,
-                               double* mse, int32_t* count) {
+                               double* amp, double* phase, double* damp, double* freq, double* mse,
+                               int32_t* count) {
   return MatrixPencil<Complex>(x, n, L, M, fs, 0, amp, phase, damp, freq, mse, count);
 }
 // Measured on one core with OpenBLAS: the dense route spends about 3e-10 s
@@ -249,15 +249,14 @@ Route RouteOf(PencilSolver solver, int32_t n, int32_t L, int32_t M, bool complex
 }  // namespace
 
 StatusCode MatrixPencilSolverReal(const double* x, int32_t n, int32_t L, int32_t M, double fs,
-                                  int32_t realFlag, PencilSolver solver, double* amp,
-                                  double* phase, double* damp, double* freq, double* mse,
-                                  int32_t* count) {
+                                  int32_t realFlag, PencilSolver solver, double* amp, double* phase,
+                                  double* damp, double* freq, double* mse, int32_t* count) {
   return MatrixPencil<double>(x, n, L, M, fs, realFlag, amp, phase, damp, freq, mse, count,
                               RouteOf(solver, n, L, M, false));
 }
-StatusCode MatrixPencilSolverComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
-                                     double fs, PencilSolver solver, double* amp, double* phase,
-                                     double* damp, double* freq, double* mse, int32_t* count) {
+StatusCode MatrixPencilSolverComplex(const Complex* x, int32_t n, int32_t L, int32_t M, double fs,
+                                     PencilSolver solver, double* amp, double* phase, double* damp,
+                                     double* freq, double* mse, int32_t* count) {
   return MatrixPencil<Complex>(x, n, L, M, fs, 0, amp, phase, damp, freq, mse, count,
                                RouteOf(solver, n, L, M, true));
 }

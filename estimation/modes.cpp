@@ -80,8 +80,8 @@ StatusCode ModeAmplitudesComplex(const Complex* x, int32_t n, const Complex* z, 
                                  Complex* A, double* E) {
   return ModeAmplitudes<Complex>(x, n, z, k, A, E);
 }
-StatusCode ModeAmplitudesReal(const double* x, int32_t n, const Complex* z, int32_t k,
-                              Complex* A, double* E) {
+StatusCode ModeAmplitudesReal(const double* x, int32_t n, const Complex* z, int32_t k, Complex* A,
+                              double* E) {
   return ModeAmplitudes<double>(x, n, z, k, A, E);
 }
 
@@ -91,8 +91,8 @@ StatusCode ModeAmplitudesReal(const double* x, int32_t n, const Complex* z, int3
 // that member's own |A_i|, not doubled. Damping is ln|z| unguarded, so a pole
 // at 0 gives -inf.
 StatusCode ModeParameters(const Complex* A, int32_t kA, const Complex* z, int32_t kz, double fs,
-                          int32_t realFlag, double* amp, double* phase, double* damp,
-                          double* freq, int32_t* count) {
+                          int32_t realFlag, double* amp, double* phase, double* damp, double* freq,
+                          int32_t* count) {
   const double scale = fs / kTwoPi;
   if (realFlag == 0) {
     for (int32_t i = 0; i < kz; ++i) {

@@ -124,8 +124,8 @@ StatusCode PcarEstimate(const T* x, int32_t n, int32_t p, int32_t k, T* a, Compl
   if (!w || !poly || !polyC) return status::kNoMemory;
 
   // w = pinv(A) b over the k strongest singular components of A.
-  StatusCode st = route == Route::kKrylov ? SolveKrylov(x, n, p, k, w.get())
-                                          : SolveDense(x, n, p, k, w.get());
+  StatusCode st =
+      route == Route::kKrylov ? SolveKrylov(x, n, p, k, w.get()) : SolveDense(x, n, p, k, w.get());
   if (st != status::kOk) return st;
 
   a[0] = T(1.0);
@@ -147,8 +147,7 @@ StatusCode PcarEstimate(const T* x, int32_t n, int32_t p, int32_t k, T* a, Compl
 
 }  // namespace
 
-StatusCode PcarThresholdReal(const double* A, int32_t rows, int32_t cols, int32_t k,
-                             double* tau) {
+StatusCode PcarThresholdReal(const double* A, int32_t rows, int32_t cols, int32_t k, double* tau) {
   return PcarThreshold<double>(A, rows, cols, k, tau);
 }
 StatusCode PcarThresholdComplex(const Complex* A, int32_t rows, int32_t cols, int32_t k,
@@ -198,7 +197,7 @@ StatusCode PcarSolverReal(const double* x, int32_t n, int32_t p, int32_t k, Pcar
                           double* a, Complex* roots) {
   return PcarEstimate<double>(x, n, p, k, a, roots, RouteOf(solver, n, p, k, false));
 }
-StatusCode PcarSolverComplex(const Complex* x, int32_t n, int32_t p, int32_t k,
-                             PcarSolver solver, Complex* a, Complex* roots) {
+StatusCode PcarSolverComplex(const Complex* x, int32_t n, int32_t p, int32_t k, PcarSolver solver,
+                             Complex* a, Complex* roots) {
   return PcarEstimate<Complex>(x, n, p, k, a, roots, RouteOf(solver, n, p, k, true));
 }

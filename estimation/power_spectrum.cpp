@@ -96,6 +96,5 @@ StatusCode PcarPowerSpectrumReal(const double* x, int32_t n, int32_t p, int32_t 
                                  double fs, int32_t realFlag, double* amp, double* phase,
                                  double* freq, double* fitError, SpectrumResult* result,
                                  int32_t* count) {
-  return PcarPowerSpectrum(x, n, p, k, N, fs, realFlag, amp, phase, freq, fitError, result,
-                           count);
+  return PcarPowerSpectrum(x, n, p, k, N, fs, realFlag, amp, phase, freq, fitError, result, count);
 }

@@ -38,8 +38,8 @@ StatusCode Prony(const T* x, int32_t n, int32_t p, double fs, int32_t realFlag, 
   double fit_error = 0.0;  // not reported
   st = ModeAmplitudes(x, n, poles.get(), p, amplitudes.get(), &fit_error);
   if (st != status::kOk) return st;
-  return ModeParameters(amplitudes.get(), p, poles.get(), p, fs, realFlag, amp, phase, damp,
-                        freq, count);
+  return ModeParameters(amplitudes.get(), p, poles.get(), p, fs, realFlag, amp, phase, damp, freq,
+                        count);
 }
 
 }  // namespace

@@ -35,8 +35,8 @@ inline StatusCode AdjointMatMul(const double* A, const double* B, int32_t k, int
                                 double* C) {
   return AdjointMatMulReal(A, B, k, m, n, C);
 }
-inline StatusCode AdjointMatMul(const Complex* A, const Complex* B, int32_t k, int32_t m,
-                                int32_t n, Complex* C) {
+inline StatusCode AdjointMatMul(const Complex* A, const Complex* B, int32_t k, int32_t m, int32_t n,
+                                Complex* C) {
   return AdjointMatMulComplex(A, B, k, m, n, C);
 }
 // Transpose for real data, conjugate transpose for complex data.
@@ -50,8 +50,7 @@ inline StatusCode AdjointInto(Complex* A, int32_t m, int32_t n, Complex* out) {
 inline StatusCode Svd(const double* A, int32_t m, int32_t n, double* U, double* S, double* V) {
   return SvdReal(A, m, n, U, S, V, 0);
 }
-inline StatusCode Svd(const Complex* A, int32_t m, int32_t n, Complex* U, double* S,
-                      Complex* V) {
+inline StatusCode Svd(const Complex* A, int32_t m, int32_t n, Complex* U, double* S, Complex* V) {
   return SvdComplex(A, m, n, U, S, V, 0);
 }
 // The leading `count` singular triplets.
@@ -63,12 +62,12 @@ inline StatusCode SvdLeading(const Complex* A, int32_t m, int32_t n, int32_t cou
                              double* S, Complex* V) {
   return SvdLeadingComplex(A, m, n, count, U, S, V);
 }
-inline StatusCode SvdLeadingRight(const double* A, int32_t m, int32_t n, int32_t count,
-                                  double* S, double* V) {
+inline StatusCode SvdLeadingRight(const double* A, int32_t m, int32_t n, int32_t count, double* S,
+                                  double* V) {
   return SvdLeadingRightReal(A, m, n, count, S, V);
 }
-inline StatusCode SvdLeadingRight(const Complex* A, int32_t m, int32_t n, int32_t count,
-                                  double* S, Complex* V) {
+inline StatusCode SvdLeadingRight(const Complex* A, int32_t m, int32_t n, int32_t count, double* S,
+                                  Complex* V) {
   return SvdLeadingRightComplex(A, m, n, count, S, V);
 }
 // Pseudo-inverse with tolerance tol, over A's own storage.
@@ -79,8 +78,8 @@ inline StatusCode PseudoInverse(Complex* A, int32_t m, int32_t n, double tol) {
   return PseudoInverseComplex(A, m, n, tol, nullptr);
 }
 // X = pinv(A) B over the `keep` strongest singular components of A.
-inline StatusCode TruncatedSolve(const double* A, int32_t m, int32_t n, const double* B,
-                                 double* X, int32_t keep) {
+inline StatusCode TruncatedSolve(const double* A, int32_t m, int32_t n, const double* B, double* X,
+                                 int32_t keep) {
   return LeastSquaresTruncatedReal(A, m, n, B, 1, X, keep);
 }
 inline StatusCode TruncatedSolve(const Complex* A, int32_t m, int32_t n, const Complex* B,
@@ -124,8 +123,8 @@ inline StatusCode ForwardBackwardSvdLeading(const double* x, int32_t n, int32_t 
                                             double* S, double* U, double* V) {
   return ForwardBackwardSvdLeadingReal(x, n, p, count, S, U, V);
 }
-inline StatusCode ForwardBackwardSvdLeading(const Complex* x, int32_t n, int32_t p,
-                                            int32_t count, double* S, Complex* U, Complex* V) {
+inline StatusCode ForwardBackwardSvdLeading(const Complex* x, int32_t n, int32_t p, int32_t count,
+                                            double* S, Complex* U, Complex* V) {
   return ForwardBackwardSvdLeadingComplex(x, n, p, count, S, U, V);
 }
 // Non-zero when any value is a NaN or an infinity.
@@ -135,8 +134,8 @@ inline StatusCode HankelProductFft(const double* x, int32_t rows, int32_t cols, 
                                    int32_t k, double* Z) {
   return HankelProductFftReal(x, rows, cols, V, k, Z);
 }
-inline StatusCode HankelProductFft(const Complex* x, int32_t rows, int32_t cols,
-                                   const Complex* V, int32_t k, Complex* Z) {
+inline StatusCode HankelProductFft(const Complex* x, int32_t rows, int32_t cols, const Complex* V,
+                                   int32_t k, Complex* Z) {
   return HankelProductFftComplex(x, rows, cols, V, k, Z);
 }
 // Eigenvalues only of a general matrix; the matrix is left as it is.
@@ -157,8 +156,7 @@ inline StatusCode BuildForward(const Complex* x, int32_t n, int32_t p, Complex* 
 inline StatusCode BuildBackward(const double* x, int32_t n, int32_t p, double* b, double* A) {
   return BuildBackwardMatrixReal(x, n, p, b, A);
 }
-inline StatusCode BuildBackward(const Complex* x, int32_t n, int32_t p, Complex* b,
-                                Complex* A) {
+inline StatusCode BuildBackward(const Complex* x, int32_t n, int32_t p, Complex* b, Complex* A) {
   return BuildBackwardMatrixComplex(x, n, p, b, A);
 }
 inline StatusCode Reverse(const double* src, double* dst, int32_t count) {

@@ -80,9 +80,9 @@ inline Module RuntimeModule() {
   void* address = reinterpret_cast<void*>(&NumericArrayResize);
 #if defined(_WIN32)
   HMODULE module = nullptr;
-  GetModuleHandleExA(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
-                         GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
-                     static_cast<LPCSTR>(address), &module);
+  GetModuleHandleExA(
+      GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS | GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
+      static_cast<LPCSTR>(address), &module);
   return reinterpret_cast<Module>(module);
 #else
   Dl_info info{};
@@ -93,11 +93,13 @@ inline Module RuntimeModule() {
 
 // ---- the exports -------------------------------------------------------------------------
 
-#define QDM_HOST_EXPORTS(X)                                                          \
+// clang-format off
+#define QDM_HOST_EXPORTS(X)                                                            \
   X(SetGFRTModule) X(QdmReCovarianceH) X(QdmCxCovarianceH) X(QdmRePCARH) X(QdmCxPCARH) \
-  X(QdmRePronyH) X(QdmCxPronyH) X(QdmReMatrixPencilH) X(QdmCxMatrixPencilH)          \
-  X(QdmReMinDescriptLenH) X(QdmCxMinDescriptLenH) X(QdmReCovPowerSpectrH)            \
+  X(QdmRePronyH) X(QdmCxPronyH) X(QdmReMatrixPencilH) X(QdmCxMatrixPencilH)            \
+  X(QdmReMinDescriptLenH) X(QdmCxMinDescriptLenH) X(QdmReCovPowerSpectrH)              \
   X(QdmCxCovPowerSpectrH) X(QdmRePCARPowerSpectrumH) X(QdmCxPCARPowerSpectrumH)
+// clang-format on
 
 // Typed pointers to the fifteen exports, named as the exports are.
 struct QdmApi {
@@ -115,8 +117,9 @@ inline QdmApi LoadQdm(const std::string& path, Module runtime = EmulatedHostModu
   QdmApi api;
   std::string error;
   api.module = OpenModule(path, &error);
-  if (api.module == nullptr) throw std::runtime_error("cannot load the library " + path + ": " + error);
-#define QDM_HOST_RESOLVE(name)                                                    \
+  if (api.module == nullptr)
+    throw std::runtime_error("cannot load the library " + path + ": " + error);
+#define QDM_HOST_RESOLVE(name)                                                      \
   api.name = reinterpret_cast<decltype(api.name)>(ModuleSymbol(api.module, #name)); \
   if (api.name == nullptr) throw std::runtime_error(path + " does not export " #name);
   QDM_HOST_EXPORTS(QDM_HOST_RESOLVE)
@@ -133,8 +136,9 @@ class HostArray {
  public:
   // A type-10 array holding `values`, count set.
   static HostArray Real(std::span<const double> values) {
-    return HostArray(EmuMakeHandle(QDM_TYPE_DOUBLE, static_cast<int32_t>(values.size()),
-                                   values.data()), QDM_TYPE_DOUBLE);
+    return HostArray(
+        EmuMakeHandle(QDM_TYPE_DOUBLE, static_cast<int32_t>(values.size()), values.data()),
+        QDM_TYPE_DOUBLE);
   }
   static HostArray Real(std::initializer_list<double> values) {
     return Real(std::span<const double>(values.begin(), values.size()));

@@ -26,8 +26,7 @@ int main(int argc, char** argv) {
   qdm_complex* poles = malloc(sizeof(qdm_complex) * (size_t)p);   /* p poles */
   double variance = 0.0;
   /* C before C23 wants the cast to add const to a pointer to arrays. */
-  const int32_t status =
-      qdm_covariance_complex((const qdm_complex*)x, n, p, a, poles, &variance);
+  const int32_t status = qdm_covariance_complex((const qdm_complex*)x, n, p, a, poles, &variance);
   if (status < 0) {
     fprintf(stderr, "qdm_covariance_complex: %d: %s\n", status, qdm_status_text(status));
     return 2;

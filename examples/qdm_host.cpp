@@ -75,11 +75,14 @@ Signal ReadCsv(const std::string& path) {
     if (line.find_first_not_of(" \t\r") == std::string::npos || line[0] == '#') continue;
     std::vector<std::string> fields(1);
     for (const char c : line)
-      if (c == ',') fields.emplace_back();
-      else if (c != ' ' && c != '\t' && c != '\r') fields.back() += c;
+      if (c == ',')
+        fields.emplace_back();
+      else if (c != ' ' && c != '\t' && c != '\r')
+        fields.back() += c;
     if (columns == 0) columns = fields.size();
     if (columns > 2 || fields.size() != columns)
-      Fail(1, path + ":" + std::to_string(lineNo) + ": expected 1 or 2 columns, as on the first line");
+      Fail(1,
+           path + ":" + std::to_string(lineNo) + ": expected 1 or 2 columns, as on the first line");
     for (const std::string& f : fields) {
       double v = 0.0;
       if (!ParseNumber(f, &v))
@@ -117,9 +120,9 @@ int main(int argc, char** argv) {
     Fail(1, "no method given (covariance, prony, pcar, pencil, mdl, covspectrum, pcarspectrum)");
   const std::string method = argv[1];
   std::map<std::string, std::string> options = {
-      {"--order", ""}, {"--components", ""}, {"--pencil", ""}, {"--modes", ""},
-      {"--upper", ""}, {"--min-order", ""},  {"--points", ""}, {"--rate", ""},
-      {"--example", "real"}, {"--library", ""}, {"--real-signal", ""}, {"--json", ""}};
+      {"--order", ""},       {"--components", ""}, {"--pencil", ""},      {"--modes", ""},
+      {"--upper", ""},       {"--min-order", ""},  {"--points", ""},      {"--rate", ""},
+      {"--example", "real"}, {"--library", ""},    {"--real-signal", ""}, {"--json", ""}};
   std::string file;
   for (int i = 2; i < argc; ++i) {
     const std::string arg = argv[i];
@@ -206,9 +209,10 @@ int main(int argc, char** argv) {
       status = cx ? e.QdmCxPronyH(data, p, rate, amplitude, phase, damping, frequency)
                   : e.QdmRePronyH(data, p, rate, &realSignal, amplitude, phase, damping, frequency);
     else
-      status = cx ? e.QdmCxMatrixPencilH(data, L, M, rate, amplitude, phase, damping, frequency, &mse)
-                  : e.QdmReMatrixPencilH(data, L, M, rate, &realSignal, amplitude, phase, damping,
-                                         frequency, &mse);
+      status =
+          cx ? e.QdmCxMatrixPencilH(data, L, M, rate, amplitude, phase, damping, frequency, &mse)
+             : e.QdmReMatrixPencilH(data, L, M, rate, &realSignal, amplitude, phase, damping,
+                                    frequency, &mse);
     if (method == "prony") {
       Member(parameters, "order", p);
     } else {
@@ -247,15 +251,18 @@ int main(int argc, char** argv) {
   } else {
     Fail(1, "unknown method '" + method + "'");
   }
-  if (status != 0) Fail(2, method + " returned " + std::to_string(status) + ": " + StatusText(status));
-  if (method != "mdl" && method != "pcar" && method != "covariance") Member(parameters, "rate_hz", rate);
+  if (status != 0)
+    Fail(2, method + " returned " + std::to_string(status) + ": " + StatusText(status));
+  if (method != "mdl" && method != "pcar" && method != "covariance")
+    Member(parameters, "rate_hz", rate);
   if (method.find("spectrum") != std::string::npos) {
     Member(results, "f0_hz", f0);
     Member(results, "df_hz", df);
     Member(results, "spectrum_db", spectrum);
   }
-  std::printf("{\"method\": \"%s\", \"signal\": {\"type\": \"%s\", \"samples\": %d},\n"
-              " \"parameters\": {%s},\n \"status\": 0,\n \"results\": {%s}}\n",
-              method.c_str(), cx ? "complex" : "real", s.n, parameters.c_str(), results.c_str());
+  std::printf(
+      "{\"method\": \"%s\", \"signal\": {\"type\": \"%s\", \"samples\": %d},\n"
+      " \"parameters\": {%s},\n \"status\": 0,\n \"results\": {%s}}\n",
+      method.c_str(), cx ? "complex" : "real", s.n, parameters.c_str(), results.c_str());
   return 0;
 }

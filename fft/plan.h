@@ -28,9 +28,9 @@ constexpr int32_t kFftLeafFirstMin = 16384;
 constexpr int32_t kFftRealByHalfMin = 1024;
 
 // Factor kinds.
-constexpr int32_t kFftKindKernel = 0;  // specialised straight-line kernel
+constexpr int32_t kFftKindKernel = 0;   // specialised straight-line kernel
 constexpr int32_t kFftKindGeneric = 1;  // generic odd prime below 50
-constexpr int32_t kFftKindRader = 2;   // prime of 50 or more, by Rader's method
+constexpr int32_t kFftKindRader = 2;    // prime of 50 or more, by Rader's method
 
 // for t = 0..c-1: DFT of inputs t*li + q*ls, q = 0..r-1, to outputs t*lo + q*os
 // (the recursion's leaves: li = is, ls = c*is, lo = r*os).
@@ -64,7 +64,7 @@ struct FftStage {
   // butterfly 4g + i at place 0, 2, 1, 3 for i = 0..3 (the lane order of the
   // four-lane interleaved loads). Butterfly 0 and those past m - 1 hold (1, 0).
   double* twGrouped;
-  FftPlan* raderPlan;  // kind 2: plan of length r-1
+  FftPlan* raderPlan;     // kind 2: plan of length r-1
   double* raderKernelRe;  // kind 2: transformed convolution kernel, r-1 values
   double* raderKernelIm;
   int32_t* raderIndex;         // kind 2: 0, 1, g^(r-2), ..., g (mod r)
@@ -137,5 +137,5 @@ int32_t FftFactorize(int32_t n, int32_t* factor, int32_t* kind);
 [[nodiscard]] StatusCode FftRaderLeafReal(const FftStage* st, int32_t r, const double* in,
                                           double* out, ptrdiff_t is, ptrdiff_t os, ptrdiff_t c);
 [[nodiscard]] StatusCode FftRaderTwiddleReal(const FftStage* st, int32_t r, double* data,
-                                             const double* twCos, const double* twSin,
-                                             ptrdiff_t os, ptrdiff_t m);
+                                             const double* twCos, const double* twSin, ptrdiff_t os,
+                                             ptrdiff_t m);

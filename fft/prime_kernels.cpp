@@ -74,9 +74,9 @@ void GenericDft(const FftStage* st, int32_t r, const double* xr, const double* x
 // paired-load kernels throughout. Output legs 1..r-1 serve as the second
 // buffer, so y must not overlap the scratch; y may equal x. Legs j >= 1 are
 // twiddled by (wc[j-1] + i ws[j-1]) when wc is non-null.
-StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const double* xi,
-                    ptrdiff_t is, double* yr, double* yi, ptrdiff_t os, const double* wc,
-                    const double* ws, double* scratch) {
+StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const double* xi, ptrdiff_t is,
+                    double* yr, double* yi, ptrdiff_t os, const double* wc, const double* ws,
+                    double* scratch) {
   const int32_t len = r - 1;
   double* br = scratch;  // interleaved: element q at 2q
   double* bi = scratch + 1;
@@ -270,8 +270,8 @@ StatusCode FftGenericLeafComplex(const FftStage* st, int32_t r, const double* in
   WorkArray<double> scratch = AllocWork<double>(2 * static_cast<size_t>(r));
   if (!scratch) return status::kNoMemory;
   for (ptrdiff_t t = 0; t < c; ++t) {
-    GenericDft(st, r, inRe + t * is, inIm + t * is, c * is, outRe + t * r * os,
-               outIm + t * r * os, os, nullptr, nullptr, scratch.get());
+    GenericDft(st, r, inRe + t * is, inIm + t * is, c * is, outRe + t * r * os, outIm + t * r * os,
+               os, nullptr, nullptr, scratch.get());
   }
   return status::kOk;
 }
@@ -328,12 +328,12 @@ StatusCode FftGenericLeafReal(const FftStage* st, int32_t r, const double* in, d
 
 StatusCode FftGenericTwiddleReal(const FftStage* st, int32_t r, double* data, const double* twCos,
                                  const double* twSin, ptrdiff_t os, ptrdiff_t m) {
-  return RealTwiddle(r, data, twCos, twSin, os, m, 2 * static_cast<size_t>(r),
-                     [st, r](const double* zr, const double* zi, double* yr, double* yi,
-                             double* scratch) {
-                       GenericDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
-                       return status::kOk;
-                     });
+  return RealTwiddle(
+      r, data, twCos, twSin, os, m, 2 * static_cast<size_t>(r),
+      [st, r](const double* zr, const double* zi, double* yr, double* yi, double* scratch) {
+        GenericDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
+        return status::kOk;
+      });
 }
 
 // ---- Rader --------------------------------------------------------------------------
@@ -343,9 +343,9 @@ StatusCode FftRaderLeafComplex(const FftStage* st, int32_t r, const double* inRe
   WorkArray<double> scratch = AllocWork<double>(2 * static_cast<size_t>(r - 1));
   if (!scratch) return status::kNoMemory;
   for (ptrdiff_t t = 0; t < c; ++t) {
-    const StatusCode status = RaderDft(st, r, inRe + t * is, inIm + t * is, c * is,
-                                       outRe + t * r * os, outIm + t * r * os, os, nullptr,
-                                       nullptr, scratch.get());
+    const StatusCode status =
+        RaderDft(st, r, inRe + t * is, inIm + t * is, c * is, outRe + t * r * os,
+                 outIm + t * r * os, os, nullptr, nullptr, scratch.get());
     if (status < 0) return status;
   }
   return status::kOk;
@@ -360,8 +360,8 @@ StatusCode FftRaderTwiddleComplex(const FftStage* st, int32_t r, double* re, dou
   for (ptrdiff_t k = 0; k < m; ++k) {
     const double* wc = k == 0 ? nullptr : twCos + (k - 1) * (r - 1);
     const double* ws = k == 0 ? nullptr : twSin + (k - 1) * (r - 1);
-    const StatusCode status = RaderDft(st, r, re + k * os, im + k * os, s, re + k * os,
-                                       im + k * os, s, wc, ws, scratch.get());
+    const StatusCode status = RaderDft(st, r, re + k * os, im + k * os, s, re + k * os, im + k * os,
+                                       s, wc, ws, scratch.get());
     if (status < 0) return status;
   }
   return status::kOk;
@@ -369,18 +369,18 @@ StatusCode FftRaderTwiddleComplex(const FftStage* st, int32_t r, double* re, dou
 
 StatusCode FftRaderLeafReal(const FftStage* st, int32_t r, const double* in, double* out,
                             ptrdiff_t is, ptrdiff_t os, ptrdiff_t c) {
-  return RealLeaf(r, in, out, is, os, c, 2 * static_cast<size_t>(r - 1),
-                  [st, r](const double* zr, const double* zi, double* yr, double* yi,
-                          double* scratch) {
-                    return RaderDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
-                  });
+  return RealLeaf(
+      r, in, out, is, os, c, 2 * static_cast<size_t>(r - 1),
+      [st, r](const double* zr, const double* zi, double* yr, double* yi, double* scratch) {
+        return RaderDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
+      });
 }
 
 StatusCode FftRaderTwiddleReal(const FftStage* st, int32_t r, double* data, const double* twCos,
                                const double* twSin, ptrdiff_t os, ptrdiff_t m) {
-  return RealTwiddle(r, data, twCos, twSin, os, m, 2 * static_cast<size_t>(r - 1),
-                     [st, r](const double* zr, const double* zi, double* yr, double* yi,
-                             double* scratch) {
-                       return RaderDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
-                     });
+  return RealTwiddle(
+      r, data, twCos, twSin, os, m, 2 * static_cast<size_t>(r - 1),
+      [st, r](const double* zr, const double* zi, double* yr, double* yi, double* scratch) {
+        return RaderDft(st, r, zr, zi, 2, yr, yi, 2, nullptr, nullptr, scratch);
+      });
 }

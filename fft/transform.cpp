@@ -46,8 +46,7 @@ StatusCode Leaf(const FftPlan* p, int32_t L, const double* inRe, const double* i
 
 // The combining pass of stage s over m butterflies, in place.
 template <bool kReal>
-StatusCode Combine(const FftPlan* p, int32_t s, double* re, double* im, ptrdiff_t os,
-                   ptrdiff_t m) {
+StatusCode Combine(const FftPlan* p, int32_t s, double* re, double* im, ptrdiff_t os, ptrdiff_t m) {
   const int32_t r = p->factor[s];
   const FftStage* st = p->stage[s];
   if constexpr (kReal) {
@@ -76,8 +75,8 @@ StatusCode Combine(const FftPlan* p, int32_t s, double* re, double* im, ptrdiff_
 // Stage s of current length len = r*m: sub-transforms of the r decimated
 // input sequences into consecutive blocks of m outputs, then the combining pass.
 template <bool kReal>
-StatusCode Stage(const FftPlan* p, int32_t s, const double* inRe, const double* inIm,
-                 double* outRe, double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t len) {
+StatusCode Stage(const FftPlan* p, int32_t s, const double* inRe, const double* inIm, double* outRe,
+                 double* outIm, ptrdiff_t is, ptrdiff_t os, ptrdiff_t len) {
   const int32_t r = p->factor[s];
   const ptrdiff_t m = len / r;
   StatusCode st = status::kOk;
@@ -133,8 +132,8 @@ StatusCode LeafFirst(const FftPlan* p, const double* inRe, const double* inIm, d
   ptrdiff_t place = 0;
   for (ptrdiff_t b = 0; b < blocks; ++b) {
     const ptrdiff_t at = b * r0 * is;
-    p->complexLeaf[last](inRe + at, inIm + at, outRe + place * os, outIm + place * os, is, ls,
-                         lo, os, r0);
+    p->complexLeaf[last](inRe + at, inIm + at, outRe + place * os, outIm + place * os, is, ls, lo,
+                         os, r0);
     for (int32_t s = 1; s < last; ++s) {  // next block: count up the digits j1, j2, ...
       place += weight[s];
       if (++digit[s] < p->factor[s]) break;
@@ -246,7 +245,7 @@ void MergeHalves(const double* in, double* y, ptrdiff_t is, ptrdiff_t n, const d
     }
   }
   for (; 2 * k < h; ++k) {
-    const double pr = in[k * is], pi = in[(n - k) * is];  // X_k
+    const double pr = in[k * is], pi = in[(n - k) * is];        // X_k
     const double ur = in[(h - k) * is], ui = in[(h + k) * is];  // X_(h-k)
     const double ar = pr + ur, ai = pi - ui;
     const double br = pr - ur, bi = pi + ui;
@@ -267,8 +266,7 @@ void MergeHalves(const double* in, double* y, ptrdiff_t is, ptrdiff_t n, const d
 // z_j = x_2j + i x_(2j+1) and Z = DFT_h(z), the transforms of the even and
 // odd samples are E_k = (Z_k + conj Z_(h-k))/2 and O_k = (Z_k - conj Z_(h-k))/2i,
 // and X_k = E_k + W^k O_k, X_(h-k) = conj(E_k - W^k O_k), W = exp(-2 pi i/n).
-StatusCode RealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t is,
-                      ptrdiff_t os) {
+StatusCode RealByHalf(const FftPlan* p, const double* in, double* out, ptrdiff_t is, ptrdiff_t os) {
   const FftPlan* half = FftRealHalf(p);
   const ptrdiff_t n = p->n;
   WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
@@ -307,8 +305,8 @@ StatusCode HalfComplexToRealByHalf(const FftPlan* p, const double* in, double* o
 // Im X_k over the whole Hermitian X (u_(n-k) = Re X_k + Im X_k), U = DFT(u)
 // has Re U_j = sum Re X_k cos, Im U_j = sum Im X_k sin, so n x_j = Re U_j -
 // Im U_j and n x_(n-j) = Re U_j + Im U_j.
-StatusCode HalfComplexToRealByHartley(const FftPlan* p, const double* in, double* out,
-                                      ptrdiff_t is, ptrdiff_t os) {
+StatusCode HalfComplexToRealByHartley(const FftPlan* p, const double* in, double* out, ptrdiff_t is,
+                                      ptrdiff_t os) {
   const ptrdiff_t n = p->n;
   WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(n));
   if (!work) return status::kNoMemory;
@@ -341,8 +339,7 @@ StatusCode FftComplex(const FftPlan* plan, const double* inRe, const double* inI
 StatusCode FftReal(const FftPlan* plan, const double* in, double* out, int32_t inStride,
                    int32_t outStride, int32_t n) {
   if (plan == nullptr || n != plan->n) return status::kFftRealLengthMismatch;
-  if (n % 2 == 0 && n >= kFftRealByHalfMin)
-    return RealByHalf(plan, in, out, inStride, outStride);
+  if (n % 2 == 0 && n >= kFftRealByHalfMin) return RealByHalf(plan, in, out, inStride, outStride);
   return Run<true>(plan, in, nullptr, out, nullptr, inStride, outStride);
 }
 

@@ -31,13 +31,12 @@ extern HostFunctionRecord g_host_functions[1];
 inline HostFunctionRecord& NumericArrayResizeRecord() { return g_host_functions[0]; }
 
 // The host's signature of NumericArrayResize.
-using NumericArrayResizeFn = int32_t (*)(int32_t typeCode, int32_t numDims,
-                                         QdmArrayHandle* handle, size_t count);
+using NumericArrayResizeFn = int32_t (*)(int32_t typeCode, int32_t numDims, QdmArrayHandle* handle,
+                                         size_t count);
 
 // Call stub: called exactly like the host function, resolving it on first use,
 // and returns the host function's own result unchanged (0 or a host error).
-int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArrayHandle* handle,
-                           size_t count);
+int32_t NumericArrayResize(int32_t typeCode, int32_t numDims, QdmArrayHandle* handle, size_t count);
 
 // The function address of a record, resolved if still null. Never returns
 // null: a missing host or function ends the process.

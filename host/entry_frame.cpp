@@ -35,8 +35,8 @@ StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* hand
   bool have_all = static_cast<bool>(input);
   for (size_t i = 0; i < entry.outputs.size(); ++i) {
     const OutputArray& out = entry.outputs[i];
-    outputs[i] = AllocWork<double>(static_cast<size_t>(out.length) *
-                                   DoublesPerElement(out.typeCode));
+    outputs[i] =
+        AllocWork<double>(static_cast<size_t>(out.length) * DoublesPerElement(out.typeCode));
     have_all = have_all && outputs[i];
   }
   if (!have_all) return status::kNoMemory;
@@ -69,10 +69,16 @@ StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* hand
   for (size_t j = 0; j < entry.outDoubles.size(); ++j) {
     double value = call.outDoubles[j];
     switch (entry.outDoubles[j].role) {
-      case OutDoubleRole::kEstimator: break;
-      case OutDoubleRole::kSpectrumF0: value = call.spectrum.f0; break;
-      case OutDoubleRole::kSpectrumDf: value = call.spectrum.df; break;
-      case OutDoubleRole::kPassThrough: continue;
+      case OutDoubleRole::kEstimator:
+        break;
+      case OutDoubleRole::kSpectrumF0:
+        value = call.spectrum.f0;
+        break;
+      case OutDoubleRole::kSpectrumDf:
+        value = call.spectrum.df;
+        break;
+      case OutDoubleRole::kPassThrough:
+        continue;
     }
     std::memcpy(entry.outDoubles[j].host, &value, sizeof value);
   }
@@ -91,7 +97,8 @@ int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
   for (size_t i = 0; s == status::kOk && i < entry.outputs.size(); ++i) {
     const OutputArray& out = entry.outputs[i];
     // The host's own error code is carried as a status and mapped as one.
-    s = StatusCode{NumericArrayResize(out.typeCode, 1, &handles[i], static_cast<size_t>(out.length))};
+    s = StatusCode{
+        NumericArrayResize(out.typeCode, 1, &handles[i], static_cast<size_t>(out.length))};
     if (s != status::kOk && entry.onResizeFailure == ResizeFailure::kReturnAtOnce) {
       return MapStatus(s);
     }
@@ -118,9 +125,8 @@ int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
   return MapStatus(s);
 }
 
-int32_t RunMdlEntry(QdmArrayHandle data, int32_t inputType, int32_t n,
-                    StatusCode check, int32_t L, int32_t minOrder,
-                    int32_t* order, MdlEstimator estimate) {
+int32_t RunMdlEntry(QdmArrayHandle data, int32_t inputType, int32_t n, StatusCode check, int32_t L,
+                    int32_t minOrder, int32_t* order, MdlEstimator estimate) {
   if (check != status::kOk) return MapStatus(check);
   const size_t count = static_cast<size_t>(n);
   WorkArray<double> input = AllocWork<double>(count * DoublesPerElement(inputType));

@@ -87,9 +87,9 @@ inline constexpr int kMaxOutDoubles = 3;
 struct EntrySpec {
   QdmArrayHandle input;
   int32_t inputType;
-  int32_t n;  // the input block's count
-  StatusCode check;  // the first failed argument check, 0 if all pass
-  std::span<const OutputArray> outputs;  // in resize order, at most kMaxOutputs
+  int32_t n;                              // the input block's count
+  StatusCode check;                       // the first failed argument check, 0 if all pass
+  std::span<const OutputArray> outputs;   // in resize order, at most kMaxOutputs
   std::span<const OutDouble> outDoubles;  // at most kMaxOutDoubles
   ResizeFailure onResizeFailure = ResizeFailure::kEmptyOutputs;
 };
@@ -136,8 +136,7 @@ int32_t RunEntry(const EntrySpec& entry, const Estimator& estimator) {
 // a failed estimator sets the result to 0.
 using MdlEstimator = StatusCode (*)(const void* x, int32_t n, int32_t L, int32_t minOrder,
                                     int32_t* order);
-int32_t RunMdlEntry(QdmArrayHandle data, int32_t inputType, int32_t n,
-                    StatusCode check, int32_t L, int32_t minOrder,
-                    int32_t* order, MdlEstimator estimate);
+int32_t RunMdlEntry(QdmArrayHandle data, int32_t inputType, int32_t n, StatusCode check, int32_t L,
+                    int32_t minOrder, int32_t* order, MdlEstimator estimate);
 
 }  // namespace host

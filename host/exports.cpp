@@ -32,10 +32,9 @@ int32_t FlagValue(const uint8_t* flag) { return static_cast<int32_t>(*flag); }
 // ---- Prony ------------------------------------------------------------------------------
 
 template <typename Estimate>
-int32_t PronyEntry(QdmArrayHandle data, int32_t type, int32_t p, double rate,
-                   QdmArrayHandle amp, QdmArrayHandle phase, QdmArrayHandle damp,
-                   QdmArrayHandle freq, ResizeFailure onResizeFailure,
-                   const Estimate& estimate) {
+int32_t PronyEntry(QdmArrayHandle data, int32_t type, int32_t p, double rate, QdmArrayHandle amp,
+                   QdmArrayHandle phase, QdmArrayHandle damp, QdmArrayHandle freq,
+                   ResizeFailure onResizeFailure, const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
   const StatusCode check = checks::Prony(n, p, rate);
   const OutputArray outputs[] = {{amp, kReal, p, CountSource::kModes},
@@ -60,9 +59,8 @@ int32_t ArEntry(QdmArrayHandle data, int32_t type, int32_t n, StatusCode check, 
 }
 
 template <typename Estimate>
-int32_t CovarianceEntry(QdmArrayHandle data, int32_t type, int32_t p,
-                        QdmArrayHandle coefficients, QdmArrayHandle poles, double* variance,
-                        const Estimate& estimate) {
+int32_t CovarianceEntry(QdmArrayHandle data, int32_t type, int32_t p, QdmArrayHandle coefficients,
+                        QdmArrayHandle poles, double* variance, const Estimate& estimate) {
   const int32_t n = host::BlockCount(data);
   const OutDouble outDoubles[] = {{variance, OutDoubleRole::kEstimator}};
   return ArEntry(data, type, n, checks::Covariance(n, p), p, coefficients, poles, outDoubles,
@@ -95,8 +93,8 @@ int32_t PencilEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t M, dou
 
 // ---- MDL --------------------------------------------------------------------------------
 
-int32_t MdlEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t minOrder,
-                 int32_t* order, host::MdlEstimator estimate) {
+int32_t MdlEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t minOrder, int32_t* order,
+                 host::MdlEstimator estimate) {
   const int32_t n = host::BlockCount(data);
   return host::RunMdlEntry(data, type, n, checks::Mdl(n, L, minOrder), L, minOrder, order,
                            estimate);
@@ -117,11 +115,10 @@ int32_t CovSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t m
   const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
                                   {df, OutDoubleRole::kSpectrumDf},
                                   {variance, OutDoubleRole::kEstimator}};
-  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles},
-                        [&](EntryCall& c) {
-                          c.spectrum.values = c.RealOutput(0);
-                          return estimate(c, N);
-                        });
+  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles}, [&](EntryCall& c) {
+    c.spectrum.values = c.RealOutput(0);
+    return estimate(c, N);
+  });
 }
 
 template <typename Estimate>
@@ -156,8 +153,8 @@ int32_t PcarSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t 
 extern "C" {
 
 QDM_API int32_t QdmCxPronyH(QdmArrayHandle data, int32_t p, double samplingRate,
-                            QdmArrayHandle amplitude, QdmArrayHandle phase,
-                            QdmArrayHandle damping, QdmArrayHandle frequency) {
+                            QdmArrayHandle amplitude, QdmArrayHandle phase, QdmArrayHandle damping,
+                            QdmArrayHandle frequency) {
   const int32_t n = host::BlockCount(data);
   return PronyEntry(data, kCx, p, samplingRate, amplitude, phase, damping, frequency,
                     ResizeFailure::kEmptyOutputs, [&](EntryCall& c) {
@@ -213,37 +210,33 @@ QDM_API int32_t QdmRePCARH(QdmArrayHandle data, int32_t p, int32_t components,
                            QdmArrayHandle coefficients, QdmArrayHandle roots) {
   const int32_t n = host::BlockCount(data);
   return PcarEntry(data, kReal, p, components, coefficients, roots, [&](EntryCall& c) {
-    return PcarEstimateReal(c.RealInput(), n, p, components, c.RealOutput(1),
-                            c.ComplexOutput(0));
+    return PcarEstimateReal(c.RealInput(), n, p, components, c.RealOutput(1), c.ComplexOutput(0));
   });
 }
 
-QDM_API int32_t QdmCxMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M,
-                                   double samplingRate, QdmArrayHandle amplitude,
-                                   QdmArrayHandle phase, QdmArrayHandle damping,
-                                   QdmArrayHandle frequency, double* mse) {
+QDM_API int32_t QdmCxMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M, double samplingRate,
+                                   QdmArrayHandle amplitude, QdmArrayHandle phase,
+                                   QdmArrayHandle damping, QdmArrayHandle frequency, double* mse) {
   const int32_t n = host::BlockCount(data);
   return PencilEntry(data, kCx, L, M, samplingRate, amplitude, phase, damping, frequency, mse,
                      [&](EntryCall& c) {
                        return MatrixPencilComplex(c.ComplexInput(), n, L, M, samplingRate,
-                                                  c.RealOutput(0), c.RealOutput(1),
-                                                  c.RealOutput(2), c.RealOutput(3),
-                                                  &c.outDoubles[0], &c.modes);
+                                                  c.RealOutput(0), c.RealOutput(1), c.RealOutput(2),
+                                                  c.RealOutput(3), &c.outDoubles[0], &c.modes);
                      });
 }
 
-QDM_API int32_t QdmReMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M,
-                                   double samplingRate, const uint8_t* realSignal,
-                                   QdmArrayHandle amplitude, QdmArrayHandle phase,
-                                   QdmArrayHandle damping, QdmArrayHandle frequency,
-                                   double* mse) {
+QDM_API int32_t QdmReMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M, double samplingRate,
+                                   const uint8_t* realSignal, QdmArrayHandle amplitude,
+                                   QdmArrayHandle phase, QdmArrayHandle damping,
+                                   QdmArrayHandle frequency, double* mse) {
   const int32_t n = host::BlockCount(data);
   return PencilEntry(data, kReal, L, M, samplingRate, amplitude, phase, damping, frequency, mse,
                      [&](EntryCall& c) {
                        return MatrixPencilReal(c.RealInput(), n, L, M, samplingRate,
                                                FlagValue(realSignal), c.RealOutput(0),
-                                               c.RealOutput(1), c.RealOutput(2),
-                                               c.RealOutput(3), &c.outDoubles[0], &c.modes);
+                                               c.RealOutput(1), c.RealOutput(2), c.RealOutput(3),
+                                               &c.outDoubles[0], &c.modes);
                      });
 }
 
@@ -251,8 +244,7 @@ QDM_API int32_t QdmCxMinDescriptLenH(QdmArrayHandle data, int32_t L, int32_t min
                                      int32_t* order) {
   return MdlEntry(data, kCx, L, minOrder, order,
                   [](const void* x, int32_t n, int32_t upper, int32_t lower, int32_t* chosen) {
-                    return MdlOrderComplex(static_cast<const Complex*>(x), n, upper, lower,
-                                           chosen);
+                    return MdlOrderComplex(static_cast<const Complex*>(x), n, upper, lower, chosen);
                   });
 }
 
@@ -264,21 +256,20 @@ QDM_API int32_t QdmReMinDescriptLenH(QdmArrayHandle data, int32_t L, int32_t min
                   });
 }
 
-QDM_API int32_t QdmCxCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m,
-                                     double samplingRate, double* f0, double* df,
-                                     QdmArrayHandle spectrum, double* noiseVariance) {
+QDM_API int32_t QdmCxCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m, double samplingRate,
+                                     double* f0, double* df, QdmArrayHandle spectrum,
+                                     double* noiseVariance) {
   const int32_t n = host::BlockCount(data);
   return CovSpectrumEntry(data, kCx, p, m, samplingRate, f0, df, spectrum, noiseVariance,
                           [&](EntryCall& c, int32_t N) {
-                            return CovPowerSpectrumComplex(c.ComplexInput(), n, p, N,
-                                                           samplingRate, &c.spectrum,
-                                                           &c.outDoubles[2]);
+                            return CovPowerSpectrumComplex(c.ComplexInput(), n, p, N, samplingRate,
+                                                           &c.spectrum, &c.outDoubles[2]);
                           });
 }
 
-QDM_API int32_t QdmReCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m,
-                                     double samplingRate, double* f0, double* df,
-                                     QdmArrayHandle spectrum, double* noiseVariance) {
+QDM_API int32_t QdmReCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m, double samplingRate,
+                                     double* f0, double* df, QdmArrayHandle spectrum,
+                                     double* noiseVariance) {
   const int32_t n = host::BlockCount(data);
   return CovSpectrumEntry(data, kReal, p, m, samplingRate, f0, df, spectrum, noiseVariance,
                           [&](EntryCall& c, int32_t N) {
@@ -289,18 +280,16 @@ QDM_API int32_t QdmReCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m,
 
 QDM_API int32_t QdmCxPCARPowerSpectrumH(QdmArrayHandle data, int32_t p, int32_t m, int32_t k,
                                         double samplingRate, QdmArrayHandle amplitude,
-                                        QdmArrayHandle phase, QdmArrayHandle frequency,
-                                        double* f0, double* df, QdmArrayHandle spectrum,
-                                        double* fitError) {
+                                        QdmArrayHandle phase, QdmArrayHandle frequency, double* f0,
+                                        double* df, QdmArrayHandle spectrum, double* fitError) {
   const int32_t n = host::BlockCount(data);
-  return PcarSpectrumEntry(data, kCx, p, m, k, samplingRate, amplitude, phase, frequency, f0,
-                           df, spectrum, fitError, ResizeFailure::kEmptyOutputs,
-                           [&](EntryCall& c, int32_t N) {
-                             return PcarPowerSpectrumComplex(
-                                 c.ComplexInput(), n, p, k, N, samplingRate, c.RealOutput(0),
-                                 c.RealOutput(1), c.RealOutput(2), &c.outDoubles[2],
-                                 &c.spectrum, &c.modes);
-                           });
+  return PcarSpectrumEntry(
+      data, kCx, p, m, k, samplingRate, amplitude, phase, frequency, f0, df, spectrum, fitError,
+      ResizeFailure::kEmptyOutputs, [&](EntryCall& c, int32_t N) {
+        return PcarPowerSpectrumComplex(c.ComplexInput(), n, p, k, N, samplingRate, c.RealOutput(0),
+                                        c.RealOutput(1), c.RealOutput(2), &c.outDoubles[2],
+                                        &c.spectrum, &c.modes);
+      });
 }
 
 // A failed resize returns at once here, leaving the outputs as they are; the
@@ -311,14 +300,13 @@ QDM_API int32_t QdmRePCARPowerSpectrumH(QdmArrayHandle data, int32_t p, int32_t 
                                         QdmArrayHandle frequency, double* f0, double* df,
                                         QdmArrayHandle spectrum, double* fitError) {
   const int32_t n = host::BlockCount(data);
-  return PcarSpectrumEntry(data, kReal, p, m, k, samplingRate, amplitude, phase, frequency, f0,
-                           df, spectrum, fitError, ResizeFailure::kReturnAtOnce,
-                           [&](EntryCall& c, int32_t N) {
-                             return PcarPowerSpectrumReal(
-                                 c.RealInput(), n, p, k, N, samplingRate, FlagValue(realSignal),
-                                 c.RealOutput(0), c.RealOutput(1), c.RealOutput(2),
-                                 &c.outDoubles[2], &c.spectrum, &c.modes);
-                           });
+  return PcarSpectrumEntry(
+      data, kReal, p, m, k, samplingRate, amplitude, phase, frequency, f0, df, spectrum, fitError,
+      ResizeFailure::kReturnAtOnce, [&](EntryCall& c, int32_t N) {
+        return PcarPowerSpectrumReal(c.RealInput(), n, p, k, N, samplingRate, FlagValue(realSignal),
+                                     c.RealOutput(0), c.RealOutput(1), c.RealOutput(2),
+                                     &c.outDoubles[2], &c.spectrum, &c.modes);
+      });
 }
 
 }  // extern "C"

@@ -39,13 +39,13 @@
 #include <stdint.h>
 
 #if defined(_WIN32)
-#  if defined(QDM_BUILDING_LIBRARY)
-#    define QDM_API __declspec(dllexport)
-#  else
-#    define QDM_API __declspec(dllimport)
-#  endif
+#if defined(QDM_BUILDING_LIBRARY)
+#define QDM_API __declspec(dllexport)
 #else
-#  define QDM_API __attribute__((visibility("default")))
+#define QDM_API __declspec(dllimport)
+#endif
+#else
+#define QDM_API __attribute__((visibility("default")))
 #endif
 
 #ifdef __cplusplus
@@ -94,11 +94,10 @@ QDM_API int32_t QdmCxPCARH(QdmArrayHandle data, int32_t p, int32_t components,
  *  host resize error. */
 QDM_API int32_t QdmRePronyH(QdmArrayHandle data, int32_t p, double samplingRate,
                             const uint8_t* realSignal, QdmArrayHandle amplitude,
-                            QdmArrayHandle phase, QdmArrayHandle damping,
-                            QdmArrayHandle frequency);
+                            QdmArrayHandle phase, QdmArrayHandle damping, QdmArrayHandle frequency);
 QDM_API int32_t QdmCxPronyH(QdmArrayHandle data, int32_t p, double samplingRate,
-                            QdmArrayHandle amplitude, QdmArrayHandle phase,
-                            QdmArrayHandle damping, QdmArrayHandle frequency);
+                            QdmArrayHandle amplitude, QdmArrayHandle phase, QdmArrayHandle damping,
+                            QdmArrayHandle frequency);
 
 /** Matrix pencil with pencil parameter L and M modes (see
  *  qdm_matrix_pencil_real()); mse: mean squared fitting error. Checks: n < 1:
@@ -106,15 +105,13 @@ QDM_API int32_t QdmCxPronyH(QdmArrayHandle data, int32_t p, double samplingRate,
  *  samplingRate <= 0: -42418. Resizes: the four outputs to M elements; their
  *  count is the number of modes reported (at most min(M, n - L, L)). Other
  *  statuses: -20001, -20068, -20062, -20999, a host resize error. */
-QDM_API int32_t QdmReMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M,
-                                   double samplingRate, const uint8_t* realSignal,
-                                   QdmArrayHandle amplitude, QdmArrayHandle phase,
-                                   QdmArrayHandle damping, QdmArrayHandle frequency,
-                                   double* mse);
-QDM_API int32_t QdmCxMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M,
-                                   double samplingRate, QdmArrayHandle amplitude,
+QDM_API int32_t QdmReMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M, double samplingRate,
+                                   const uint8_t* realSignal, QdmArrayHandle amplitude,
                                    QdmArrayHandle phase, QdmArrayHandle damping,
                                    QdmArrayHandle frequency, double* mse);
+QDM_API int32_t QdmCxMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M, double samplingRate,
+                                   QdmArrayHandle amplitude, QdmArrayHandle phase,
+                                   QdmArrayHandle damping, QdmArrayHandle frequency, double* mse);
 
 /** Minimum description length order between minOrder and the upper order L (see
  *  qdm_mdl_order_real()). Checks: n < 1: -42401; minOrder < 1: -42414;
@@ -132,12 +129,12 @@ QDM_API int32_t QdmCxMinDescriptLenH(QdmArrayHandle data, int32_t L, int32_t min
  *  -42412; m <= 1 or m > 2^30: -42417; samplingRate <= 0: -42418. Resizes: the
  *  spectrum to N. Other statuses: -20001, -20062, -20063, -20116, a host
  *  resize error; f0, df and noiseVariance are 0.0 after any failure. */
-QDM_API int32_t QdmReCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m,
-                                     double samplingRate, double* f0, double* df,
-                                     QdmArrayHandle spectrum, double* noiseVariance);
-QDM_API int32_t QdmCxCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m,
-                                     double samplingRate, double* f0, double* df,
-                                     QdmArrayHandle spectrum, double* noiseVariance);
+QDM_API int32_t QdmReCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m, double samplingRate,
+                                     double* f0, double* df, QdmArrayHandle spectrum,
+                                     double* noiseVariance);
+QDM_API int32_t QdmCxCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m, double samplingRate,
+                                     double* f0, double* df, QdmArrayHandle spectrum,
+                                     double* noiseVariance);
 
 /** Principal-component AR power spectrum with the k modes nearest the unit
  *  circle (amplitude, phase, frequency; see qdm_pcar_psd_real()). Checks:
@@ -153,9 +150,8 @@ QDM_API int32_t QdmRePCARPowerSpectrumH(QdmArrayHandle data, int32_t p, int32_t 
                                         QdmArrayHandle spectrum, double* fitError);
 QDM_API int32_t QdmCxPCARPowerSpectrumH(QdmArrayHandle data, int32_t p, int32_t m, int32_t k,
                                         double samplingRate, QdmArrayHandle amplitude,
-                                        QdmArrayHandle phase, QdmArrayHandle frequency,
-                                        double* f0, double* df, QdmArrayHandle spectrum,
-                                        double* fitError);
+                                        QdmArrayHandle phase, QdmArrayHandle frequency, double* f0,
+                                        double* df, QdmArrayHandle spectrum, double* fitError);
 
 #ifdef __cplusplus
 }

@@ -82,13 +82,13 @@
 #include "qdm_version.h"
 
 #if defined(_WIN32)
-#  if defined(QDM_BUILDING_API)
-#    define QDM_PLAIN_API __declspec(dllexport)
-#  else
-#    define QDM_PLAIN_API __declspec(dllimport)
-#  endif
+#if defined(QDM_BUILDING_API)
+#define QDM_PLAIN_API __declspec(dllexport)
 #else
-#  define QDM_PLAIN_API __attribute__((visibility("default")))
+#define QDM_PLAIN_API __declspec(dllimport)
+#endif
+#else
+#define QDM_PLAIN_API __attribute__((visibility("default")))
 #endif
 
 #ifdef __cplusplus
@@ -172,9 +172,8 @@ QDM_PLAIN_API int32_t qdm_covariance_complex(const qdm_complex* x, int32_t n, in
  *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_POLYNOMIAL, ::QDM_ERR_ROOT_NAN,
  *   ::QDM_ERR_NON_FINITE_RESULT, ::QDM_ERR_KRYLOV_NO_CONVERGENCE.
  * @{ */
-QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order,
-                                    int32_t components, double* coefficients,
-                                    qdm_complex* roots);
+QDM_PLAIN_API int32_t qdm_pcar_real(const double* x, int32_t n, int32_t order, int32_t components,
+                                    double* coefficients, qdm_complex* roots);
 QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t order,
                                        int32_t components, qdm_complex* coefficients,
                                        qdm_complex* roots);
@@ -196,8 +195,8 @@ QDM_PLAIN_API int32_t qdm_pcar_complex(const qdm_complex* x, int32_t n, int32_t 
  *  applies to the route taken. Besides their statuses, ::QDM_ERR_SOLVER and
  *  ::QDM_ERR_KRYLOV_NO_CONVERGENCE. */
 QDM_PLAIN_API int32_t qdm_pcar_solver_real(const double* x, int32_t n, int32_t order,
-                                           int32_t components, int32_t solver,
-                                           double* coefficients, qdm_complex* roots);
+                                           int32_t components, int32_t solver, double* coefficients,
+                                           qdm_complex* roots);
 QDM_PLAIN_API int32_t qdm_pcar_solver_complex(const qdm_complex* x, int32_t n, int32_t order,
                                               int32_t components, int32_t solver,
                                               qdm_complex* coefficients, qdm_complex* roots);
@@ -225,9 +224,9 @@ QDM_PLAIN_API int32_t qdm_pcar_solver_complex(const qdm_complex* x, int32_t n, i
 QDM_PLAIN_API int32_t qdm_prony_real(const double* x, int32_t n, int32_t order, double fs,
                                      int32_t real_signal, double* amplitude, double* phase,
                                      double* damping, double* frequency, int32_t* modes);
-QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t order,
-                                        double fs, double* amplitude, double* phase,
-                                        double* damping, double* frequency, int32_t* modes);
+QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t order, double fs,
+                                        double* amplitude, double* phase, double* damping,
+                                        double* frequency, int32_t* modes);
 /** @} */
 
 /* ---------------------------------------------------------------------------- */
@@ -259,8 +258,8 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_real(const double* x, int32_t n, int32_t
                                              double* frequency, int32_t* modes, double* mse);
 QDM_PLAIN_API int32_t qdm_matrix_pencil_complex(const qdm_complex* x, int32_t n, int32_t pencil,
                                                 int32_t order, double fs, double* amplitude,
-                                                double* phase, double* damping,
-                                                double* frequency, int32_t* modes, double* mse);
+                                                double* phase, double* damping, double* frequency,
+                                                int32_t* modes, double* mse);
 
 /** How the matrix pencil finds the leading singular triplets of its
  *  (n - L)-by-L data matrix (and principal-component AR those of its
@@ -288,11 +287,10 @@ typedef enum qdm_solver {
  *  Besides their statuses, ::QDM_ERR_SOLVER and
  *  ::QDM_ERR_KRYLOV_NO_CONVERGENCE. */
 QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_real(const double* x, int32_t n, int32_t pencil,
-                                                    int32_t order, double fs,
-                                                    int32_t real_signal, int32_t solver,
-                                                    double* amplitude, double* phase,
-                                                    double* damping, double* frequency,
-                                                    int32_t* modes, double* mse);
+                                                    int32_t order, double fs, int32_t real_signal,
+                                                    int32_t solver, double* amplitude,
+                                                    double* phase, double* damping,
+                                                    double* frequency, int32_t* modes, double* mse);
 QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int32_t n,
                                                        int32_t pencil, int32_t order, double fs,
                                                        int32_t solver, double* amplitude,
@@ -351,10 +349,9 @@ QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int
 QDM_PLAIN_API int32_t qdm_covariance_psd_real(const double* x, int32_t n, int32_t order,
                                               int32_t points, double fs, double* spectrum,
                                               double* f0, double* df, double* noise_variance);
-QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n,
-                                                 int32_t order, int32_t points, double fs,
-                                                 double* spectrum, double* f0, double* df,
-                                                 double* noise_variance);
+QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n, int32_t order,
+                                                 int32_t points, double fs, double* spectrum,
+                                                 double* f0, double* df, double* noise_variance);
 /** @} */
 
 /* ---------------------------------------------------------------------------- */
@@ -384,16 +381,16 @@ QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n
  *   ::QDM_ERR_ROOT_NAN,
  *   ::QDM_ERR_NON_FINITE_RESULT.
  * @{ */
-QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t order,
-                                        int32_t points, int32_t components, double fs,
-                                        int32_t real_signal, double* amplitude, double* phase,
-                                        double* frequency, int32_t* modes, double* spectrum,
-                                        double* f0, double* df, double* fit_error);
+QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t order, int32_t points,
+                                        int32_t components, double fs, int32_t real_signal,
+                                        double* amplitude, double* phase, double* frequency,
+                                        int32_t* modes, double* spectrum, double* f0, double* df,
+                                        double* fit_error);
 QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int32_t order,
                                            int32_t points, int32_t components, double fs,
                                            double* amplitude, double* phase, double* frequency,
-                                           int32_t* modes, double* spectrum, double* f0,
-                                           double* df, double* fit_error);
+                                           int32_t* modes, double* spectrum, double* f0, double* df,
+                                           double* fit_error);
 /** @} */
 
 #ifdef __cplusplus

@@ -24,7 +24,8 @@
     "order zero, negative or above floor(2n/3), or components, k or M zero or negative")       \
   X(QDM_ERR_COUNT_ABOVE_ORDER, -42413, "components, k or M greater than the order or L")       \
   X(QDM_ERR_MIN_ORDER, -42414, "MDL minimum order below 1")                                    \
-  X(QDM_ERR_MDL_UPPER, -42415, "MDL upper order not above the minimum order, or above floor(2n/3)") \
+  X(QDM_ERR_MDL_UPPER, -42415,                                                                 \
+    "MDL upper order not above the minimum order, or above floor(2n/3)")                       \
   X(QDM_ERR_NO_MODES, -42416, "amplitude fit asked for no modes")                              \
   X(QDM_ERR_SPECTRUM_SIZE, -42417, "spectrum size below 2, or above 2^30")                     \
   X(QDM_ERR_SAMPLE_RATE, -42418, "sampling rate not positive")                                 \
@@ -33,9 +34,9 @@
     "the fit would need more work memory than the library's bound (QDM_MAX_WORK_BYTES)")       \
   X(QDM_ERR_NULL_POINTER, -42421, "a required pointer argument is null")                       \
   X(QDM_ERR_SPECTRUM_TOO_SHORT, -42422,                                                        \
-    "spectrum length (the power of two at or above the points asked for) below order + 1")    \
+    "spectrum length (the power of two at or above the points asked for) below order + 1")     \
   X(QDM_ERR_SOLVER, -42423,                                                                    \
-    "solver not one of QDM_SOLVER_AUTO, QDM_SOLVER_DENSE, QDM_SOLVER_KRYLOV")                 \
+    "solver not one of QDM_SOLVER_AUTO, QDM_SOLVER_DENSE, QDM_SOLVER_KRYLOV")                  \
   X(QDM_ERR_NON_FINITE_RESULT, -30001,                                                         \
     "a result of the fit is NaN or infinite (a degenerate record: zero, constant, a spike, a " \
     "ramp, or values beyond the range of double)")                                             \

@@ -136,8 +136,8 @@ StatusCode EigGeneralComplex(Complex* A, int32_t n, int32_t wantVectors, Complex
   Complex* work = a + nn;
   std::memcpy(a, A, nn * sizeof(Complex));
 
-  const StatusCode st = lapack::Geev(wantVectors == 1 ? 'V' : 'N', n, a, eigenvalues, vl.get(),
-                                     work, rwork.get());
+  const StatusCode st =
+      lapack::Geev(wantVectors == 1 ? 'V' : 'N', n, a, eigenvalues, vl.get(), work, rwork.get());
   if (st != status::kOk) return st;
 
   if (wantVectors == 1) {

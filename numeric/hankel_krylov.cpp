@@ -210,9 +210,7 @@ struct HankelOperator {
   int32_t Rows() const { return h.rows; }
   int32_t Cols() const { return h.cols; }
   StatusCode Init(const T* x, int32_t rows, int32_t cols) { return Setup(h, x, rows, cols); }
-  StatusCode Apply(const T* in, T* out, bool adjoint) {
-    return Product(h, in, 1, out, 1, adjoint);
-  }
+  StatusCode Apply(const T* in, T* out, bool adjoint) { return Product(h, in, 1, out, 1, adjoint); }
   void Release() { h.Release(); }
 };
 
@@ -427,8 +425,8 @@ StatusCode SvdLeadingOf(Op& op, int32_t count, double* S, T* U, T* V) {
       // v_{j+1} = A^H u_j minus its components along v_0 .. v_j.
       st = op.Apply(Uq + int64_t{j} * un, wv.get(), !flip);
       if (st != status::kOk) return st;
-      const double b = Orthogonalize(Vq, vn, j + 1, wv.get(), Norm(vn, wv.get()),
-                                     c.get(), c2.get());
+      const double b =
+          Orthogonalize(Vq, vn, j + 1, wv.get(), Norm(vn, wv.get()), c.get(), c2.get());
       scale = std::max(scale, b);
       beta = Extend(Vq, vn, j + 1, wv.get(), b, scale, c.get(), c2.get(), 4 + 2 * uint64_t(j));
       m = j + 1;
@@ -442,8 +440,8 @@ StatusCode SvdLeadingOf(Op& op, int32_t count, double* S, T* U, T* V) {
       if (st != status::kOk) return st;
       converged = true;
       for (int32_t i = 0; i < count; ++i) {
-        converged = converged &&
-                    beta * std::abs(P[(m - 1) + size_t(i) * m]) <= kKrylovTolerance * s[0];
+        converged =
+            converged && beta * std::abs(P[(m - 1) + size_t(i) * m]) <= kKrylovTolerance * s[0];
       }
     }
     const int32_t keep = converged ? count : std::min(k - 1, count + (k - count) / 2);
@@ -496,8 +494,8 @@ StatusCode HankelSvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t c
 }
 
 template <typename T>
-StatusCode ForwardBackwardSvdLeadingFft(const T* x, int32_t n, int32_t p, int32_t count,
-                                        double* S, T* U, T* V) {
+StatusCode ForwardBackwardSvdLeadingFft(const T* x, int32_t n, int32_t p, int32_t count, double* S,
+                                        T* U, T* V) {
   if (p < 1 || p >= n || count < 1 || count > std::min(int64_t{2} * (n - p), int64_t{p})) {
     return status::kBadSize;
   }
@@ -517,8 +515,8 @@ StatusCode HankelProductFftComplex(const Complex* x, int32_t rows, int32_t cols,
                                    int32_t k, Complex* Z) {
   return ProductFft<Complex>(x, rows, cols, V, k, Z, false);
 }
-StatusCode HankelAdjointProductFftReal(const double* x, int32_t rows, int32_t cols,
-                                       const double* U, int32_t k, double* W) {
+StatusCode HankelAdjointProductFftReal(const double* x, int32_t rows, int32_t cols, const double* U,
+                                       int32_t k, double* W) {
   return ProductFft<double>(x, rows, cols, U, k, W, true);
 }
 StatusCode HankelAdjointProductFftComplex(const Complex* x, int32_t rows, int32_t cols,
@@ -537,7 +535,7 @@ StatusCode ForwardBackwardSvdLeadingReal(const double* x, int32_t n, int32_t p, 
                                          double* S, double* U, double* V) {
   return ForwardBackwardSvdLeadingFft<double>(x, n, p, count, S, U, V);
 }
-StatusCode ForwardBackwardSvdLeadingComplex(const Complex* x, int32_t n, int32_t p,
-                                            int32_t count, double* S, Complex* U, Complex* V) {
+StatusCode ForwardBackwardSvdLeadingComplex(const Complex* x, int32_t n, int32_t p, int32_t count,
+                                            double* S, Complex* U, Complex* V) {
   return ForwardBackwardSvdLeadingFft<Complex>(x, n, p, count, S, U, V);
 }

@@ -53,8 +53,7 @@ constexpr int32_t kKrylovMaxRestarts = 200;
 [[nodiscard]] StatusCode HankelSvdLeadingReal(const double* x, int32_t rows, int32_t cols,
                                               int32_t count, double* S, double* U, double* V);
 [[nodiscard]] StatusCode HankelSvdLeadingComplex(const Complex* x, int32_t rows, int32_t cols,
-                                                 int32_t count, double* S, Complex* U,
-                                                 Complex* V);
+                                                 int32_t count, double* S, Complex* U, Complex* V);
 
 // The same for the forward-backward matrix [F; Bk] of x (n samples, order p,
 // 1 <= p < n, 1 <= count <= min(2(n - p), p)): its products are four Hankel

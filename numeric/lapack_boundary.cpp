@@ -265,13 +265,14 @@ StatusCode LeadingLeft(lapack_int m, lapack_int n, T* a, lapack_int lda, lapack_
 // ---- gelsd ----------------------------------------------------------------------------
 // IWORK: (3 depth + 14) k with depth = floor(log2 k), k = min(m, n): enough for
 // the divide-and-conquer tree of any block size.
-StatusCode Gelsd(lapack_int m, lapack_int n, lapack_int nrhs, double* a, lapack_int lda,
-                 double* b, lapack_int ldb, double* s, double rcond, lapack_int* rank) {
+StatusCode Gelsd(lapack_int m, lapack_int n, lapack_int nrhs, double* a, lapack_int lda, double* b,
+                 lapack_int ldb, double* s, double rcond, lapack_int* rank) {
   lapack_int info = 0;
   if (Injected(&info)) return Failed(Driver::kGelsd, info);
   const int64_t k = std::min(m, n);
   const int64_t depth = static_cast<int64_t>(std::log(static_cast<double>(k)) / std::log(2.0));
-  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>((3 * depth + 14) * k));
+  WorkArray<lapack_int> iwork =
+      AllocWorkUninit<lapack_int>(static_cast<size_t>((3 * depth + 14) * k));
   if (!iwork) return status::kNoMemory;
   double query = 0.0;
   lapack_int lwork = -1;
@@ -279,8 +280,8 @@ StatusCode Gelsd(lapack_int m, lapack_int n, lapack_int nrhs, double* a, lapack_
                 &info);
   WorkArray<double> work = QueriedWork(query, &lwork);
   if (!work) return status::kNoMemory;
-  LAPACK_dgelsd(&m, &n, &nrhs, a, &lda, b, &ldb, s, &rcond, rank, work.get(), &lwork,
-                iwork.get(), &info);
+  LAPACK_dgelsd(&m, &n, &nrhs, a, &lda, b, &ldb, s, &rcond, rank, work.get(), &lwork, iwork.get(),
+                &info);
   return Done(Driver::kGelsd, info);
 }
 
@@ -329,8 +330,7 @@ StatusCode Geqrt(lapack_int m, lapack_int n, double* a, lapack_int lda) {
   return Done(Driver::kGeqrf, info);
 }
 
-StatusCode Tpqrt(lapack_int m, lapack_int n, double* a, lapack_int lda, double* b,
-                 lapack_int ldb) {
+StatusCode Tpqrt(lapack_int m, lapack_int n, double* a, lapack_int lda, double* b, lapack_int ldb) {
   lapack_int info = 0;
   if (Injected(&info)) return Failed(Driver::kGeqrf, info);
   lapack_int nb = QrBlock(n, n);
@@ -437,12 +437,12 @@ StatusCode Pocon(lapack_int n, const Complex* a, lapack_int lda, double anorm, d
   return Done(Driver::kPotrf, info);
 }
 
-StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, double* a, lapack_int lda,
-                          lapack_int count, double* s, double* u, lapack_int ldu) {
+StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, double* a, lapack_int lda, lapack_int count,
+                          double* s, double* u, lapack_int ldu) {
   return LeadingLeft<double>(m, n, a, lda, count, s, u, ldu);
 }
-StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
-                          lapack_int count, double* s, Complex* u, lapack_int ldu) {
+StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, Complex* a, lapack_int lda, lapack_int count,
+                          double* s, Complex* u, lapack_int ldu) {
   return LeadingLeft<Complex>(m, n, a, lda, count, s, u, ldu);
 }
 

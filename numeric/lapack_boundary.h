@@ -39,8 +39,8 @@ inline void Gemm(int32_t m, int32_t n, int32_t k, const Complex* A, const Comple
                  bool adjointA = false) {
   const Complex one(1.0, 0.0);
   const Complex zero(0.0, 0.0);
-  cblas_zgemm(CblasRowMajor, adjointA ? CblasConjTrans : CblasNoTrans, CblasNoTrans, m, n, k,
-              &one, A, adjointA ? m : k, B, n, &zero, C, n);
+  cblas_zgemm(CblasRowMajor, adjointA ? CblasConjTrans : CblasNoTrans, CblasNoTrans, m, n, k, &one,
+              A, adjointA ? m : k, B, n, &zero, C, n);
 }
 
 // Row-major y (m) = A (m-by-k, lda = k) * x (k).
@@ -55,34 +55,33 @@ inline void Gemv(int32_t m, int32_t k, const Complex* A, const Complex* x, Compl
 
 // Column-major y = alpha op(A) x + beta y for the m-by-n A (lda >= m): op(A) x
 // has m values, op(A)^H x (adjointA) n. For a basis kept as contiguous columns.
-inline void GemvCol(bool adjointA, int32_t m, int32_t n, double alpha, const double* A,
-                    int32_t lda, const double* x, double beta, double* y) {
-  cblas_dgemv(CblasColMajor, adjointA ? CblasTrans : CblasNoTrans, m, n, alpha, A, lda, x, 1,
-              beta, y, 1);
+inline void GemvCol(bool adjointA, int32_t m, int32_t n, double alpha, const double* A, int32_t lda,
+                    const double* x, double beta, double* y) {
+  cblas_dgemv(CblasColMajor, adjointA ? CblasTrans : CblasNoTrans, m, n, alpha, A, lda, x, 1, beta,
+              y, 1);
 }
 inline void GemvCol(bool adjointA, int32_t m, int32_t n, Complex alpha, const Complex* A,
                     int32_t lda, const Complex* x, Complex beta, Complex* y) {
-  cblas_zgemv(CblasColMajor, adjointA ? CblasConjTrans : CblasNoTrans, m, n, &alpha, A, lda, x,
-              1, &beta, y, 1);
+  cblas_zgemv(CblasColMajor, adjointA ? CblasConjTrans : CblasNoTrans, m, n, &alpha, A, lda, x, 1,
+              &beta, y, 1);
 }
 // Column-major C (m-by-n, ldc) = A (m-by-k, lda) B (k-by-n, ldb).
-inline void GemmCol(int32_t m, int32_t n, int32_t k, const double* A, int32_t lda,
-                    const double* B, int32_t ldb, double* C, int32_t ldc) {
-  cblas_dgemm(CblasColMajor, CblasNoTrans, CblasNoTrans, m, n, k, 1.0, A, lda, B, ldb, 0.0, C,
-              ldc);
+inline void GemmCol(int32_t m, int32_t n, int32_t k, const double* A, int32_t lda, const double* B,
+                    int32_t ldb, double* C, int32_t ldc) {
+  cblas_dgemm(CblasColMajor, CblasNoTrans, CblasNoTrans, m, n, k, 1.0, A, lda, B, ldb, 0.0, C, ldc);
 }
 inline void GemmCol(int32_t m, int32_t n, int32_t k, const Complex* A, int32_t lda,
                     const Complex* B, int32_t ldb, Complex* C, int32_t ldc) {
   const Complex one(1.0, 0.0);
   const Complex zero(0.0, 0.0);
-  cblas_zgemm(CblasColMajor, CblasNoTrans, CblasNoTrans, m, n, k, &one, A, lda, B, ldb, &zero,
-              C, ldc);
+  cblas_zgemm(CblasColMajor, CblasNoTrans, CblasNoTrans, m, n, k, &one, A, lda, B, ldb, &zero, C,
+              ldc);
 }
 // x (n) replaced by op(A)^-1 x for the upper triangular A (column-major, lda),
 // op(A) = A, or its conjugate transpose with adjointA.
 inline void TrsvUpper(bool adjointA, int32_t n, const Complex* A, int32_t lda, Complex* x) {
-  cblas_ztrsv(CblasColMajor, CblasUpper, adjointA ? CblasConjTrans : CblasNoTrans, CblasNonUnit,
-              n, A, lda, x, 1);
+  cblas_ztrsv(CblasColMajor, CblasUpper, adjointA ? CblasConjTrans : CblasNoTrans, CblasNonUnit, n,
+              A, lda, x, 1);
 }
 // Euclidean norm of x (n values), without overflow or underflow on the way.
 inline double Nrm2(int32_t n, const double* x) { return cblas_dnrm2(n, x, 1); }
@@ -96,8 +95,7 @@ inline double Nrm2(int32_t n, const Complex* x) { return cblas_dznrm2(n, x, 1); 
 [[nodiscard]] StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, double* a, lapack_int lda,
                                double* s, double* u, lapack_int ldu, double* vt, lapack_int ldvt);
 [[nodiscard]] StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, Complex* a, lapack_int lda,
-                               double* s, Complex* u, lapack_int ldu, Complex* vt,
-                               lapack_int ldvt);
+                               double* s, Complex* u, lapack_int ldu, Complex* vt, lapack_int ldvt);
 
 // The `count` largest singular values (decreasing) of the m-by-n a and their
 // left singular vectors, u (m-by-count, ldu), as gesdd finds them; a is
@@ -115,8 +113,7 @@ inline double Nrm2(int32_t n, const Complex* x) { return cblas_dznrm2(n, x, 1); 
 
 // Householder QR, A = Q R: R in the upper triangle of a, Q as reflectors below
 // it and in tau (min(m, n) values).
-[[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, double* a, lapack_int lda,
-                               double* tau);
+[[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, double* a, lapack_int lda, double* tau);
 [[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
                                Complex* tau);
 

@@ -230,7 +230,8 @@ struct HankelRows {
   void operator()(T* W, int32_t ld, int32_t top, int32_t r0, int32_t h) const {
     const size_t bytes = static_cast<size_t>(h) * sizeof(T);
     for (int32_t j = 0; j < n; ++j) {
-      std::memcpy(static_cast<void*>(W + int64_t{j} * ld + top), x + int64_t{r0} + n - 1 - j, bytes);
+      std::memcpy(static_cast<void*>(W + int64_t{j} * ld + top), x + int64_t{r0} + n - 1 - j,
+                  bytes);
     }
     if (rhs) std::memcpy(static_cast<void*>(W + int64_t{n} * ld + top), x + int64_t{r0} + n, bytes);
   }
@@ -541,7 +542,7 @@ void Gradient(const Rows& rows, int32_t m, int32_t n, const Complex* w, Complex*
   }
   SplitInParts(wv, 2 * int64_t{n}, bits);
   std::fill(acc, acc + 16 * int64_t{n}, 0.0);
-  const Tile tile{re,  im,  hre, him, mre, mim, lre, lim, rows.ColumnBase(T), rows.ColumnStride(T),
+  const Tile tile{re, im, hre, him, mre, mim, lre, lim, rows.ColumnBase(T), rows.ColumnStride(T),
                   n};
   for (int32_t i0 = 0; i0 < m; i0 += T) {
     const int32_t h = std::min(T, m - i0);
@@ -598,7 +599,8 @@ void Refine(const Rows& rows, int32_t m, int32_t n, int32_t k, const Complex* V,
   Complex* dw = t + k;
   Gradient(rows, m, n, w, g, reinterpret_cast<double*>(dw + n));
   lapack::Gemm(k, 1, n, V, g, t, true);
-  for (int32_t i = 0; i < k; ++i) t[i] = S[i] > threshold ? t[i] / (S[i] * S[i]) : Complex(0.0, 0.0);
+  for (int32_t i = 0; i < k; ++i)
+    t[i] = S[i] > threshold ? t[i] / (S[i] * S[i]) : Complex(0.0, 0.0);
   lapack::Gemm(n, 1, k, V, t, dw);
   if (HasNonFiniteComplex(dw, n) != 0) return;
   for (int32_t j = 0; j < n; ++j) w[j] += dw[j];
@@ -661,8 +663,8 @@ StatusCode SvdSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, T* X
   }
   if (st != status::kOk) return st;
 
-  const double threshold = cut.relative ? std::max(m, n) * f.S[0] * cut.e
-                                        : TruncationThreshold(f.S, k, cut.keep);
+  const double threshold =
+      cut.relative ? std::max(m, n) * f.S[0] * cut.e : TruncationThreshold(f.S, k, cut.keep);
   int32_t count = 0;
   for (int32_t i = 0; i < k; ++i) count += f.S[i] > threshold ? 1 : 0;
   *kept = count;
@@ -765,7 +767,8 @@ template <typename Rows>
 StatusCode GelsdFolded(const Rows& system, int32_t m, int32_t n, int32_t nrhs, double* X,
                        double rcond) {
   const int64_t nn = int64_t{n} * n;
-  WorkArray<double> small = AllocWorkUninit<double>(static_cast<size_t>(nn + int64_t{n} * nrhs + n));
+  WorkArray<double> small =
+      AllocWorkUninit<double>(static_cast<size_t>(nn + int64_t{n} * nrhs + n));
   if (!small) return status::kNoMemory;
   double* R = small.get();
   double* y = R + nn;
@@ -798,8 +801,8 @@ StatusCode GelsdDense(const double* A, int32_t m, int32_t n, const double* B, in
   WorkArray<double> sv = AllocWorkUninit<double>(static_cast<size_t>(k));
   if (!sv) return status::kNoMemory;
 
-  StatusCode st = lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(),
-                                lapack_rcond, &rank);
+  StatusCode st =
+      lapack::Gelsd(m, n, nrhs, a_col.get(), m, rhs.get(), ldb, sv.get(), lapack_rcond, &rank);
   if (st != status::kOk) return st;
 
   st = rank < k ? status::kRankDeficient : status::kOk;
@@ -878,8 +881,7 @@ StatusCode ForwardSolve(const T* x, int32_t n, int32_t p, T* w, double rcond) {
 }
 }  // namespace
 
-StatusCode ForwardLeastSquaresReal(const double* x, int32_t n, int32_t p, double* w,
-                                   double rcond) {
+StatusCode ForwardLeastSquaresReal(const double* x, int32_t n, int32_t p, double* w, double rcond) {
   return ForwardSolve<double>(x, n, p, w, rcond);
 }
 
@@ -909,7 +911,8 @@ StatusCode QrReduceHankel(const T* x, int32_t m, int32_t n, T* R) {
   if (m < 1 || n < 1 || m < n) return status::kBadSize;
   WorkArray<T> col = AllocWorkUninit<T>(static_cast<size_t>(int64_t{n} * n));
   if (!col) return status::kNoMemory;
-  const StatusCode st = FoldQr(HankelRows<T>{x, n, false}, m, n, 0, col.get(), static_cast<T*>(nullptr));
+  const StatusCode st =
+      FoldQr(HankelRows<T>{x, n, false}, m, n, 0, col.get(), static_cast<T*>(nullptr));
   if (st != status::kOk) return st;
   TransposeTo(col.get(), n, n, R, false);
   return status::kOk;

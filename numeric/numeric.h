@@ -87,8 +87,8 @@ double TruncationThreshold(const double* S, int32_t count, int32_t keep);
 // i < n - p. The answer, statuses and call-record notes are those of
 // LeastSquaresReal / LeastSquaresComplex on the formed A and b with nrhs = 1;
 // a tall system (n - p >= 2p) is never formed.
-[[nodiscard]] StatusCode ForwardLeastSquaresReal(const double* x, int32_t n, int32_t p,
-                                                 double* w, double rcond);
+[[nodiscard]] StatusCode ForwardLeastSquaresReal(const double* x, int32_t n, int32_t p, double* w,
+                                                 double rcond);
 [[nodiscard]] StatusCode ForwardLeastSquaresComplex(const Complex* x, int32_t n, int32_t p,
                                                     Complex* w, double rcond);
 // R (n-by-n, row-major, upper triangular, zeros below) of A = QR for the
@@ -96,8 +96,7 @@ double TruncationThreshold(const double* S, int32_t count, int32_t keep);
 // the forward prediction block of x, which is never formed. Q is not kept and
 // x is not screened; a non-finite R is refused with -20068.
 [[nodiscard]] StatusCode QrReduceHankelReal(const double* x, int32_t m, int32_t n, double* R);
-[[nodiscard]] StatusCode QrReduceHankelComplex(const Complex* x, int32_t m, int32_t n,
-                                               Complex* R);
+[[nodiscard]] StatusCode QrReduceHankelComplex(const Complex* x, int32_t m, int32_t n, Complex* R);
 // pinv(A), n-by-m, into out or over A when out is null.
 [[nodiscard]] StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol,
                                            double* out);
@@ -114,13 +113,13 @@ double TruncationThreshold(const double* S, int32_t count, int32_t keep);
                                            Complex* eigenvalues, Complex* vectors);
 // Symmetric / Hermitian: n real eigenvalues ascending. EigSymReal writes the
 // vectors over A when vectors is null.
-[[nodiscard]] StatusCode EigSymReal(double* A, int32_t n, int32_t wantVectors,
-                                    double* eigenvalues, double* vectors);
+[[nodiscard]] StatusCode EigSymReal(double* A, int32_t n, int32_t wantVectors, double* eigenvalues,
+                                    double* vectors);
 [[nodiscard]] StatusCode EigHermitianComplex(const Complex* A, int32_t n, int32_t wantVectors,
                                              double* eigenvalues, Complex* vectors);
 // hermitian = 0: EigGeneralComplex; 1: EigHermitianComplex with (w, 0) values.
-[[nodiscard]] StatusCode EigComplex(Complex* A, int32_t n, int32_t hermitian,
-                                    int32_t wantVectors, Complex* eigenvalues, Complex* vectors);
+[[nodiscard]] StatusCode EigComplex(Complex* A, int32_t n, int32_t hermitian, int32_t wantVectors,
+                                    Complex* eigenvalues, Complex* vectors);
 
 // ---- sorting and scalar helpers --------------------------------------------------
 // NaN values first, then the rest ascending (descending = 0) or descending.
@@ -128,8 +127,8 @@ double TruncationThreshold(const double* S, int32_t count, int32_t keep);
 [[nodiscard]] StatusCode SortReal(double* x, int32_t n, int32_t descending, double* out);
 // Largest and smallest non-NaN values with their first indices; all NaN:
 // NaN values and indices -1.
-[[nodiscard]] StatusCode MinMaxReal(const double* x, int32_t n, double* maxValue,
-                                    int32_t* maxIndex, double* minValue, int32_t* minIndex);
+[[nodiscard]] StatusCode MinMaxReal(const double* x, int32_t n, double* maxValue, int32_t* maxIndex,
+                                    double* minValue, int32_t* minIndex);
 StatusCode ComplexToPolar(double re, double im, double* magnitude, double* angle);
 StatusCode ComplexDivide(double a, double b, double c, double d, double* re, double* im);
 StatusCode ComplexSqrt(double re, double im, double* outRe, double* outIm);

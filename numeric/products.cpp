@@ -126,8 +126,8 @@ StatusCode AdjointMatMulReal(const double* A, const double* B, int32_t k, int32_
                              double* C) {
   return AdjointMatMul<double>(A, B, k, m, n, C);
 }
-StatusCode AdjointMatMulComplex(const Complex* A, const Complex* B, int32_t k, int32_t m,
-                                int32_t n, Complex* C) {
+StatusCode AdjointMatMulComplex(const Complex* A, const Complex* B, int32_t k, int32_t m, int32_t n,
+                                Complex* C) {
   return AdjointMatMul<Complex>(A, B, k, m, n, C);
 }
 

@@ -125,8 +125,8 @@ StatusCode SvdLeadingRightReal(const double* A, int32_t m, int32_t n, int32_t co
   return SvdLeadingRight<double>(A, m, n, count, S, V);
 }
 
-StatusCode SvdLeadingRightComplex(const Complex* A, int32_t m, int32_t n, int32_t count,
-                                  double* S, Complex* V) {
+StatusCode SvdLeadingRightComplex(const Complex* A, int32_t m, int32_t n, int32_t count, double* S,
+                                  Complex* V) {
   return SvdLeadingRight<Complex>(A, m, n, count, S, V);
 }
 

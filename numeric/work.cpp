@@ -24,8 +24,8 @@ std::atomic<int64_t> g_outstanding{0};
 // (kernel/x86_64/zdot.c) does the same to both vectors. Tried against guard
 // pages with the Haswell and SkylakeX kernels, no other BLAS routine the
 // library calls itself (copy, dot, gemv, gemm, real or complex) reads outside
-// its operands: only LAPACK's calls, on work blocks, need the guards. LAPACK hands it rows of a column-major matrix as x
-// (stride = the leading dimension: zlarf from the right, in zgebd2 and
+// its operands: only LAPACK's calls, on work blocks, need the guards. LAPACK hands it rows of a
+// column-major matrix as x (stride = the leading dimension: zlarf from the right, in zgebd2 and
 // zunml2), and the read then lands on the element of that row one column past
 // the matrix: (row + 1) elements past the end of its storage. The rows that
 // carry reflectors come before min(rows, columns), so a block of b bytes
@@ -110,7 +110,6 @@ StatusCode NumFree(void* ptr) {
   }
   return status::kOk;
 }
-
 
 void NumAllocFailAt(int64_t k, bool persistent) {
   g_fail_persistent.store(persistent, std::memory_order_relaxed);

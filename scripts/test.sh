@@ -6,7 +6,8 @@
 # regressions and then fuzzing for a minute; the AddressSanitizer +
 # UndefinedBehaviorSanitizer build, on OpenBLAS; then the Windows DLL under
 # wine (scripts/windows.sh). Installs what is missing on a fresh Debian 12
-# machine (run as root). The last lines printed are ctest's own summary; the
+# machine (run as root). It checks the sources' layout (.clang-format) first.
+# The last lines printed are ctest's own summary; the
 # exit status is non-zero if any suite failed. The Python package (python/) is
 # tested in both plain builds as ctest tests: python.pytest, and
 # python.install (pip, offline, into a virtual environment).
@@ -16,10 +17,14 @@ scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev 
   libopenblas0-pthread libopenblas-pthread-dev libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev \
   python3-numpy python3-pytest python3-matplotlib python3-venv python3-pip \
   pkg-config doxygen dpkg-dev libcli11-dev nlohmann-json3-dev gnuplot-nox \
-  clang-14 libclang-rt-14-dev valgrind || exit 1
+  clang-14 libclang-rt-14-dev clang-format-14 valgrind || exit 1
+
 
 jobs=$(nproc)
 failed=0
+# Formatting: every C and C++ source as .clang-format lays it out.
+git ls-files '*.c' '*.cpp' '*.h' '*.h.in' | xargs clang-format-14 --dry-run --Werror ||
+  { echo "format: run clang-format-14 -i on the files above"; failed=1; }
 # ccache, where installed, shares compile results between the trees.
 launcher=()
 command -v ccache >/dev/null &&

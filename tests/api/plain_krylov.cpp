@@ -31,14 +31,14 @@ Fit Pencil(const std::vector<double>& x, bool complex, int32_t L, int32_t M, int
   Fit f;
   for (auto& o : f.out) o.assign(static_cast<size_t>(M), -7.0);
   const int32_t n = static_cast<int32_t>(complex ? x.size() / 2 : x.size());
-  f.status = complex ? qdm_matrix_pencil_solver_complex(
-                           reinterpret_cast<const qdm_complex*>(x.data()), n, L, M, 1.0, solver,
-                           f.out[0].data(), f.out[1].data(), f.out[2].data(), f.out[3].data(),
-                           &f.count, &f.mse)
-                     : qdm_matrix_pencil_solver_real(x.data(), n, L, M, 1.0, 0, solver,
-                                                     f.out[0].data(), f.out[1].data(),
-                                                     f.out[2].data(), f.out[3].data(), &f.count,
-                                                     &f.mse);
+  f.status =
+      complex
+          ? qdm_matrix_pencil_solver_complex(reinterpret_cast<const qdm_complex*>(x.data()), n, L,
+                                             M, 1.0, solver, f.out[0].data(), f.out[1].data(),
+                                             f.out[2].data(), f.out[3].data(), &f.count, &f.mse)
+          : qdm_matrix_pencil_solver_real(x.data(), n, L, M, 1.0, 0, solver, f.out[0].data(),
+                                          f.out[1].data(), f.out[2].data(), f.out[3].data(),
+                                          &f.count, &f.mse);
   return f;
 }
 
@@ -69,11 +69,20 @@ std::vector<double> Record(Kind kind, int32_t n, bool complex) {
             0.5 * std::exp(std::complex<double>(-0.004, 1.9) * double(t)) +
             1e-3 * std::complex<double>(std::sin(7.3 * t * t), std::cos(3.1 * t * t));
         break;
-      case kZeros: break;
-      case kConstant: v = 1.5; break;
-      case kSpike: v = t == n / 2 ? 1.0 : 0.0; break;
-      case kRamp: v = 0.01 * t; break;
-      case kAlternating: v = t % 2 ? -1.0 : 1.0; break;
+      case kZeros:
+        break;
+      case kConstant:
+        v = 1.5;
+        break;
+      case kSpike:
+        v = t == n / 2 ? 1.0 : 0.0;
+        break;
+      case kRamp:
+        v = 0.01 * t;
+        break;
+      case kAlternating:
+        v = t % 2 ? -1.0 : 1.0;
+        break;
     }
     if (complex) {
       x[2 * size_t(t)] = v.real();
@@ -91,11 +100,11 @@ TEST(PlainKrylov, SameStatusesAsTheDenseRoute) {
     int32_t n, L, M;
   };
   const Row rows[] = {
-      {kModes, 300, 100, 4},  {kModes, 300, 190, 4},  // L > n/2: the wide orientation
+      {kModes, 300, 100, 4},   {kModes, 300, 190, 4},  // L > n/2: the wide orientation
       {kModes, 300, 199, 120},                         // M above r = n - L: fewer modes
-      {kModes, 12, 4, 4},     {kModes, 3, 2, 1},       // the subspace is the whole space
-      {kZeros, 200, 66, 3},   {kConstant, 200, 66, 3}, {kSpike, 200, 66, 3},
-      {kRamp, 200, 66, 3},    {kAlternating, 200, 66, 3},
+      {kModes, 12, 4, 4},      {kModes, 3, 2, 1},      // the subspace is the whole space
+      {kZeros, 200, 66, 3},    {kConstant, 200, 66, 3},    {kSpike, 200, 66, 3},
+      {kRamp, 200, 66, 3},     {kAlternating, 200, 66, 3},
   };
   for (const bool complex : {false, true}) {
     for (const Row& r : rows) {
@@ -117,7 +126,8 @@ TEST(PlainKrylov, SameStatusesAsTheDenseRoute) {
       } else {
         EXPECT_TRUE(krylov.count >= 0 && krylov.count <= r.M && std::isfinite(krylov.mse)) << where;
         for (const auto& o : krylov.out)
-          for (int32_t i = 0; i < krylov.count; ++i) EXPECT_TRUE(std::isfinite(o[size_t(i)])) << where;
+          for (int32_t i = 0; i < krylov.count; ++i)
+            EXPECT_TRUE(std::isfinite(o[size_t(i)])) << where;
       }
     }
   }
@@ -173,10 +183,10 @@ Ar Pcar(const std::vector<double>& x, bool complex, int32_t p, int32_t k, int32_
   f.z.assign(room * 2, -7.0);
   const int32_t n = static_cast<int32_t>(complex ? x.size() / 2 : x.size());
   auto* z = reinterpret_cast<qdm_complex*>(f.z.data());
-  f.status = complex ? qdm_pcar_solver_complex(reinterpret_cast<const qdm_complex*>(x.data()), n,
-                                               p, k, solver,
-                                               reinterpret_cast<qdm_complex*>(f.a.data()), z)
-                     : qdm_pcar_solver_real(x.data(), n, p, k, solver, f.a.data(), z);
+  f.status = complex
+                 ? qdm_pcar_solver_complex(reinterpret_cast<const qdm_complex*>(x.data()), n, p, k,
+                                           solver, reinterpret_cast<qdm_complex*>(f.a.data()), z)
+                 : qdm_pcar_solver_real(x.data(), n, p, k, solver, f.a.data(), z);
   return f;
 }
 
@@ -194,14 +204,14 @@ TEST(PlainKrylov, PcarSameStatusesAsTheDenseRoute) {
     int32_t n, p, k;
   };
   const Row rows[] = {
-      {kModes, 300, 100, 4},  {kModes, 300, 200, 4},   // p = 2n/3: 2q = p
-      {kModes, 300, 200, 200}, {kModes, 12, 8, 8},     // k = p: every component
-      {kModes, 3, 2, 1},      {kModes, 3, 2, 2},       // the smallest record
-      {kModes, 300, 201, 4},  {kModes, 300, -1, 4},    // order out of range
-      {kModes, 300, 100, 0},  {kModes, 300, 100, 101}, // count out of range
-      {kModes, 0, 0, 1},                               // no samples
-      {kZeros, 200, 66, 3},   {kConstant, 200, 66, 3}, {kSpike, 200, 66, 3},
-      {kRamp, 200, 66, 3},    {kAlternating, 200, 66, 3},
+      {kModes, 300, 100, 4},   {kModes, 300, 200, 4},    // p = 2n/3: 2q = p
+      {kModes, 300, 200, 200}, {kModes, 12, 8, 8},       // k = p: every component
+      {kModes, 3, 2, 1},       {kModes, 3, 2, 2},        // the smallest record
+      {kModes, 300, 201, 4},   {kModes, 300, -1, 4},     // order out of range
+      {kModes, 300, 100, 0},   {kModes, 300, 100, 101},  // count out of range
+      {kModes, 0, 0, 1},                                 // no samples
+      {kZeros, 200, 66, 3},    {kConstant, 200, 66, 3},    {kSpike, 200, 66, 3},
+      {kRamp, 200, 66, 3},     {kAlternating, 200, 66, 3},
   };
   for (const bool complex : {false, true}) {
     for (const Row& r : rows) {

@@ -121,12 +121,18 @@ TEST(PlainRecords, NoSuccessCarriesANonFiniteValue) {
 // 2 for variances and errors, 0 for the rest.
 int Power(const Export& x, bool outDouble, int i) {
   switch (x.family) {
-    case Family::kProny: return !outDouble && i == 0 ? 1 : 0;
-    case Family::kPencil: return outDouble ? 2 : i == 0 ? 1 : 0;
-    case Family::kCovariance: return outDouble ? 2 : 0;
-    case Family::kCovSpectrum: return outDouble && i == 2 ? 2 : 0;
-    case Family::kPcarSpectrum: return outDouble ? (i == 2 ? 2 : 0) : i == 0 ? 1 : 0;
-    default: return 0;
+    case Family::kProny:
+      return !outDouble && i == 0 ? 1 : 0;
+    case Family::kPencil:
+      return outDouble ? 2 : i == 0 ? 1 : 0;
+    case Family::kCovariance:
+      return outDouble ? 2 : 0;
+    case Family::kCovSpectrum:
+      return outDouble && i == 2 ? 2 : 0;
+    case Family::kPcarSpectrum:
+      return outDouble ? (i == 2 ? 2 : 0) : i == 0 ? 1 : 0;
+    default:
+      return 0;
   }
 }
 

@@ -47,8 +47,8 @@ std::vector<uint64_t> Fit(const Case& c, const std::vector<double>& x) {
       c.complex ? qdm_matrix_pencil_solver_complex(reinterpret_cast<const qdm_complex*>(x.data()),
                                                    c.n, c.L, M, 1.0, QDM_SOLVER_KRYLOV, o, o + M,
                                                    o + 2 * M, o + 3 * M, &count, &mse)
-                : qdm_matrix_pencil_solver_real(x.data(), c.n, c.L, M, 1.0, 1, QDM_SOLVER_KRYLOV,
-                                                o, o + M, o + 2 * M, o + 3 * M, &count, &mse);
+                : qdm_matrix_pencil_solver_real(x.data(), c.n, c.L, M, 1.0, 1, QDM_SOLVER_KRYLOV, o,
+                                                o + M, o + 2 * M, o + 3 * M, &count, &mse);
   std::vector<uint64_t> bits = {uint64_t(uint32_t(st)), uint64_t(uint32_t(count))};
   out.push_back(mse);
   for (double v : out) {

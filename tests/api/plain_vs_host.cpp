@@ -108,15 +108,15 @@ TEST(PlainApi, RefusesWhatTheHostFaceLetsThrough) {
   // matrices; the Krylov route, which the automatic choice takes, fits in the
   // bound and so reaches its first allocation (failed here). An unknown solver
   // is refused before anything else.
-  EXPECT_EQ(qdm_matrix_pencil_solver_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0,
-                                          QDM_SOLVER_DENSE, m, m, m, m, &modes, &var),
+  EXPECT_EQ(qdm_matrix_pencil_solver_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0, QDM_SOLVER_DENSE,
+                                          m, m, m, m, &modes, &var),
             QDM_ERR_WORK_LIMIT);
   EXPECT_EQ(
       qdm_matrix_pencil_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0, m, m, m, m, &modes, &var),
       QDM_ERR_NO_MEMORY);
   for (const int32_t solver : {-1, 3}) {
-    EXPECT_EQ(qdm_matrix_pencil_solver_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0, solver, m,
-                                            m, m, m, &modes, &var),
+    EXPECT_EQ(qdm_matrix_pencil_solver_real(big.data(), 1 << 21, 1 << 20, 4, 1.0, 0, solver, m, m,
+                                            m, m, &modes, &var),
               QDM_ERR_SOLVER);
   }
   NumAllocFailAt(0, false);
@@ -165,10 +165,10 @@ TEST(PlainApi, NoFailureIsReportedAsSuccess) {
 // own refusals and failures. The table must hold exactly these, each with a
 // text of its own, none of them the text of an unknown code.
 TEST(PlainApi, EveryDocumentedStatusHasItsOwnText) {
-  const std::set<int32_t> documented = {
-      0,      20001,  -42401, -42411, -42412, -42413, -42414, -42415, -42416, -42417,
-      -42418, -20001, -20003, -20004, -20061, -20062, -20063, -20068, -20116, -20999,
-      -1,     -42419, -42420, -42421, -42422, -42423, -30001, -20070};
+  const std::set<int32_t> documented = {0,      20001,  -42401, -42411, -42412, -42413, -42414,
+                                        -42415, -42416, -42417, -42418, -20001, -20003, -20004,
+                                        -20061, -20062, -20063, -20068, -20116, -20999, -1,
+                                        -42419, -42420, -42421, -42422, -42423, -30001, -20070};
   std::set<int32_t> table;
 #define QDM_TEST_STATUS(name, code, text) table.insert(code);
   QDM_STATUS_TABLE(QDM_TEST_STATUS)

@@ -22,18 +22,18 @@ constexpr double kNaN = NAN, kPi = 3.14159265358979323846;
 struct Case {
   std::string name;
   Family family;
-  bool cx;           // complex export, else a real one on the real parts of x
+  bool cx;  // complex export, else a real one on the real parts of x
   std::vector<C> x;
   Scalars s;
   uint8_t flag = 0;
   int32_t status = 0;
-  std::vector<C> coef;           // AR coefficients a[0..p]
-  std::vector<C> poles;          // each found among the roots
-  std::vector<Mode> modes;       // exactly these modes
-  bool ordered = false;          // modes in this order, else matched by frequency and damping
-  double tol = 1e-8;             // coefficients, poles, modes
-  double extra = kNaN, extraTol = 1e-20;  // noise variance, mse or amplitude-fit error
-  std::vector<C> spectrumOf;     // the AR vector whose spectrum is expected
+  std::vector<C> coef;      // AR coefficients a[0..p]
+  std::vector<C> poles;     // each found among the roots
+  std::vector<Mode> modes;  // exactly these modes
+  bool ordered = false;     // modes in this order, else matched by frequency and damping
+  double tol = 1e-8;        // coefficients, poles, modes
+  double extra = kNaN, extraTol = 1e-20;           // noise variance, mse or amplitude-fit error
+  std::vector<C> spectrumOf;                       // the AR vector whose spectrum is expected
   int32_t count = -1, orderLo = -1, orderHi = -1;  // modes reported, MDL order range
 };
 
@@ -80,8 +80,8 @@ std::vector<Case> Cases() {
     cases.push_back(std::move(k));
   };
   constexpr Family kCov = Family::kCovariance, kPcar = Family::kPcar, kProny = Family::kProny,
-                   kPencil = Family::kPencil, kMdl = Family::kMdl,
-                   kCovPsd = Family::kCovSpectrum, kPcarPsd = Family::kPcarSpectrum;
+                   kPencil = Family::kPencil, kMdl = Family::kMdl, kCovPsd = Family::kCovSpectrum,
+                   kPcarPsd = Family::kPcarSpectrum;
   V marple, marpleRe, A, b;
   std::ifstream in(std::filesystem::path(__FILE__).parent_path() / "../data/marple64.csv");
   double re, im;  // "re,im" rows
@@ -175,8 +175,8 @@ std::vector<Case> Cases() {
     add("noise, M > r", kPencil, cx, noise30, {30, 20, 14, 0, kFs}, {.count = 10});
   }
 
-  V xc = Signal({{1.0, 0.5, -0.01, 50.0}, {0.6, -2.2, -0.03, -130.0}, {0.4, 1.3, 0, 275.0}}, 64,
-                kFs);
+  V xc =
+      Signal({{1.0, 0.5, -0.01, 50.0}, {0.6, -2.2, -0.03, -130.0}, {0.4, 1.3, 0, 275.0}}, 64, kFs);
   V xr = Signal({{1.0, 0.3, -0.01, 70.0}, {0.7, 1.9, -0.02, 240.0}}, 64, kFs, true);
   for (int t = 0; t < 64; ++t) xc[t] += C(noise[t], noise[64 + t]), xr[t] += noise[t];
   add("3 modes, noisy", kMdl, true, xc, {64, 16, 1}, {.orderLo = 3, .orderHi = 3});
@@ -194,8 +194,8 @@ std::vector<Case> Cases() {
 
   // ---- covariance spectra: the spectrum of the exact model, N the power of two >= m ---------
   const V a2 = MonicFromRoots({std::polar(0.95, 0.4 * kPi), std::polar(0.95, -0.4 * kPi)});
-  const V a4 = MonicFromRoots({std::polar(0.97, 0.6), std::polar(0.9, -2.1), std::polar(0.8, 2.8),
-                               {-0.3, 0.2}});
+  const V a4 = MonicFromRoots(
+      {std::polar(0.97, 0.6), std::polar(0.9, -2.1), std::polar(0.8, 2.8), {-0.3, 0.2}});
   const V x2 = ArRecord(a2, {1.0, 1.37}, 60);
   for (const bool cx : {false, true}) {
     add("AR(2) resonance", kCovPsd, cx, x2, {60, 2, 200, 0, kFs}, {.extra = 0, .spectrumOf = a2});
@@ -275,8 +275,8 @@ TEST(Estimators, AnswersAgreeWithTheirOracles) {
         const int32_t n = c.out[0].Count();
         for (int i = 1; i < (spectrum ? 3 : 4); ++i) EXPECT_EQ(c.out[i].Count(), n);
         const std::vector<double> amp = c.out[0].Reals(), ph = c.out[1].Reals(),
-            damp = spectrum ? std::vector<double>(n, kNaN) : c.out[2].Reals(),
-            f = c.out[spectrum ? 2 : 3].Reals();
+                                  damp = spectrum ? std::vector<double>(n, kNaN) : c.out[2].Reals(),
+                                  f = c.out[spectrum ? 2 : 3].Reals();
         for (int32_t i = 0; i < n; ++i) modes.push_back({amp[i], ph[i], damp[i], f[i]});
         for (const Mode& m : modes) EXPECT_EQ(std::isnan(m.freq), std::isnan(s.fs));
         extra = c.d[spectrum ? 2 : 0];
@@ -290,23 +290,31 @@ TEST(Estimators, AnswersAgreeWithTheirOracles) {
         EXPECT_TRUE(c.order >= k.orderLo && c.order <= k.orderHi) << c.order;
         break;
     }
-    if (!k.coef.empty()) { EXPECT_LE(RelativeError(coef, k.coef), k.tol); }
+    if (!k.coef.empty()) {
+      EXPECT_LE(RelativeError(coef, k.coef), k.tol);
+    }
     for (const C& z : k.poles) {
       double best = INFINITY;
       for (const C& r : roots) best = std::min(best, std::abs(r - z));
       EXPECT_LE(best, k.tol) << z;
     }
-    if (k.count >= 0) { EXPECT_EQ(int32_t(modes.size()), k.count); }
+    if (k.count >= 0) {
+      EXPECT_EQ(int32_t(modes.size()), k.count);
+    }
     std::vector<Mode> want = k.modes;  // matched in order of frequency unless ordered
     const auto byFreq = [](const Mode& u, const Mode& v) { return u.freq < v.freq; };
     if (!k.ordered) std::sort(want.begin(), want.end(), byFreq);
     if (!k.ordered) std::sort(modes.begin(), modes.end(), byFreq);
-    if (!want.empty()) { ASSERT_EQ(modes.size(), want.size()); }
+    if (!want.empty()) {
+      ASSERT_EQ(modes.size(), want.size());
+    }
     for (size_t i = 0; i < want.size(); ++i) {
       const Mode &g = modes[i], &w = want[i];
       EXPECT_NEAR(g.amp, w.amp, k.tol * std::max(1.0, w.amp)) << "mode " << i;
       EXPECT_NEAR(std::remainder(g.phase - w.phase, 2 * kPi), 0.0, k.tol) << "mode " << i;
-      if (!spectrum) { EXPECT_NEAR(g.damp, w.damp, k.tol) << "mode " << i; }
+      if (!spectrum) {
+        EXPECT_NEAR(g.damp, w.damp, k.tol) << "mode " << i;
+      }
       EXPECT_NEAR(g.freq, w.freq, k.tol * std::max(1.0, std::abs(w.freq))) << "mode " << i;
     }
     if (x.family == Family::kPencil && k.flag == 0) {  // mse: the modes' misfit to the record
@@ -318,7 +326,9 @@ TEST(Estimators, AnswersAgreeWithTheirOracles) {
       }
       EXPECT_NEAR(extra, sum / s.n, 1e-8 * sum / s.n + 1e-20);
     }
-    if (!std::isnan(k.extra)) { EXPECT_NEAR(extra, k.extra, k.extraTol); }
+    if (!std::isnan(k.extra)) {
+      EXPECT_NEAR(extra, k.extra, k.extraTol);
+    }
     if (spectrum) {
       const int32_t N = SpectrumN(s.b);
       ASSERT_EQ(int32_t(db.size()), N);

@@ -35,23 +35,34 @@ struct ChildCase {
 TEST(HostBinding, LookupOrderAndFatalMessagesInChildProcesses) {
   const std::string lib = QDM_LIBRARY_PATH;
   const ChildCase cases[] = {
-      {"no host anywhere: first message at the first resize", {QDM_CHILD_NOHOST, "none"}, 1,
+      {"no host anywhere: first message at the first resize",
+       {QDM_CHILD_NOHOST, "none"},
+       1,
        kNoHost},
-      {"another loaded module is not a host", {QDM_CHILD_NOHOST, "loaded", QDM_NOFUNC_MODULE}, 1,
+      {"another loaded module is not a host",
+       {QDM_CHILD_NOHOST, "loaded", QDM_NOFUNC_MODULE},
+       1,
        kNoHost},
       {"executable probed for gGFRTVersion", {QDM_CHILD_HOST, "none"}, 0, nullptr},
       {"executable probed for AZNewHandle", {QDM_CHILD_AZHOST, "none"}, 0, nullptr},
-      {"already loaded run-time module", {QDM_CHILD_NOHOST, "loaded", QDM_GFRT_MODULE}, 0,
-       nullptr},
+      {"already loaded run-time module", {QDM_CHILD_NOHOST, "loaded", QDM_GFRT_MODULE}, 0, nullptr},
       {"override names the host", {QDM_CHILD_NOHOST, "module", QDM_GFRTEMU_MODULE}, 0, nullptr},
       {"override without the function: second message",
-       {QDM_CHILD_NOHOST, "module", QDM_NOFUNC_MODULE}, 1, kNoFunction},
+       {QDM_CHILD_NOHOST, "module", QDM_NOFUNC_MODULE},
+       1,
+       kNoFunction},
       {"override wins over an executable with gGFRTVersion",
-       {QDM_CHILD_HOST, "module", QDM_NOFUNC_MODULE}, 1, kNoFunction},
+       {QDM_CHILD_HOST, "module", QDM_NOFUNC_MODULE},
+       1,
+       kNoFunction},
       {"override wins over an executable with AZNewHandle",
-       {QDM_CHILD_AZHOST, "module", QDM_NOFUNC_MODULE}, 1, kNoFunction},
+       {QDM_CHILD_AZHOST, "module", QDM_NOFUNC_MODULE},
+       1,
+       kNoFunction},
       {"null override restores the automatic lookup",
-       {QDM_CHILD_HOST, "reset", QDM_NOFUNC_MODULE}, 0, nullptr},
+       {QDM_CHILD_HOST, "reset", QDM_NOFUNC_MODULE},
+       0,
+       nullptr},
   };
   for (const ChildCase& c : cases) {
     std::vector<std::string> argv = {c.argv[0], lib};
@@ -105,12 +116,21 @@ TEST(HostBinding, LibraryExportsExactlyTheFifteenFunctions) {
     if (fields >> address >> kind >> name) names.insert(name);
   }
   ASSERT_EQ(pclose(pipe), 0);
-  const std::set<std::string> expected = {
-      "SetGFRTModule",           "QdmReCovarianceH",       "QdmCxCovarianceH",
-      "QdmRePCARH",              "QdmCxPCARH",             "QdmRePronyH",
-      "QdmCxPronyH",             "QdmReMatrixPencilH",     "QdmCxMatrixPencilH",
-      "QdmReMinDescriptLenH",    "QdmCxMinDescriptLenH",   "QdmReCovPowerSpectrH",
-      "QdmCxCovPowerSpectrH",    "QdmRePCARPowerSpectrumH", "QdmCxPCARPowerSpectrumH"};
+  const std::set<std::string> expected = {"SetGFRTModule",
+                                          "QdmReCovarianceH",
+                                          "QdmCxCovarianceH",
+                                          "QdmRePCARH",
+                                          "QdmCxPCARH",
+                                          "QdmRePronyH",
+                                          "QdmCxPronyH",
+                                          "QdmReMatrixPencilH",
+                                          "QdmCxMatrixPencilH",
+                                          "QdmReMinDescriptLenH",
+                                          "QdmCxMinDescriptLenH",
+                                          "QdmReCovPowerSpectrH",
+                                          "QdmCxCovPowerSpectrH",
+                                          "QdmRePCARPowerSpectrumH",
+                                          "QdmCxPCARPowerSpectrumH"};
   EXPECT_EQ(names, expected);
 }
 #endif

@@ -71,9 +71,8 @@ const std::set<int32_t> kPlainStatuses = {
 // The host face has neither the warning nor the plain face's own refusals and
 // results screen, but the injected resize error.
 bool HostStatus(int32_t st) {
-  return st == HostCode(kResizeError) ||
-         (kPlainStatuses.count(st) && st != 20001 && st > -42419 &&
-          st != QDM_ERR_NON_FINITE_RESULT);
+  return st == HostCode(kResizeError) || (kPlainStatuses.count(st) && st != 20001 && st > -42419 &&
+                                          st != QDM_ERR_NON_FINITE_RESULT);
 }
 
 void Require(bool ok, const char* what, const Export& x, int32_t st) {

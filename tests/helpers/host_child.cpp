@@ -34,8 +34,8 @@
 QDM_CHILD_EXPORT void* AZNewHandle(int32_t bytes) {
   return std::malloc(static_cast<size_t>(bytes));
 }
-QDM_CHILD_EXPORT int32_t NumericArrayResize(
-    int32_t typeCode, int32_t numDims, QdmArrayHandle* handle, size_t count) {
+QDM_CHILD_EXPORT int32_t NumericArrayResize(int32_t typeCode, int32_t numDims,
+                                            QdmArrayHandle* handle, size_t count) {
   if (numDims != 1 || (typeCode != 10 && typeCode != 13)) return 1;
   const size_t bytes = 8 + count * (typeCode == 13 ? 16 : 8);
   void* block = std::realloc(**handle, bytes);
@@ -85,7 +85,8 @@ ULONG_PTR* ImportSlot(HMODULE module, const char* dll, const char* function) {
     auto* slots = reinterpret_cast<IMAGE_THUNK_DATA*>(base + entry->FirstThunk);
     for (; names->u1.AddressOfData != 0; ++names, ++slots) {
       if (IMAGE_SNAP_BY_ORDINAL(names->u1.Ordinal)) continue;
-      const auto* byName = reinterpret_cast<const IMAGE_IMPORT_BY_NAME*>(base + names->u1.AddressOfData);
+      const auto* byName =
+          reinterpret_cast<const IMAGE_IMPORT_BY_NAME*>(base + names->u1.AddressOfData);
       if (std::strcmp(reinterpret_cast<const char*>(byName->Name), function) == 0)
         return &slots->u1.Function;
     }

@@ -20,7 +20,9 @@ struct Mode {
   double amp, phase, damp, freq;  // phase in radians, damp per sample, freq in Hz
 };
 
-inline C Pole(const Mode& m, double fs) { return std::exp(C(m.damp, double(kTwoPiL) * m.freq / fs)); }
+inline C Pole(const Mode& m, double fs) {
+  return std::exp(C(m.damp, double(kTwoPiL) * m.freq / fs));
+}
 
 inline std::vector<C> Signal(const std::vector<Mode>& modes, int n, double fs, bool re = false) {
   std::vector<C> x(static_cast<size_t>(n));

@@ -30,14 +30,18 @@ TEST(Bounds, PredictionBlocksAndRootSelectionWriteExactlyTheirCells) {
     ASSERT_EQ(BuildBackwardMatrixReal(x.data(), n, p, bb.data(), Ab.data()), 0);
     EXPECT_TRUE(GuardIntact(b, bUsed) && GuardIntact(A, aUsed) && GuardIntact(bc, bUsed)) << p;
     EXPECT_TRUE(GuardIntact(Ac, aUsed) && GuardIntact(bb, bUsed) && GuardIntact(Ab, aUsed)) << p;
-    if (aUsed > 0) { EXPECT_EQ(A[aUsed - 1], x[n - p - 1]); }  // last row, farthest lag
+    if (aUsed > 0) {
+      EXPECT_EQ(A[aUsed - 1], x[n - p - 1]);
+    }  // last row, farthest lag
   }
   const std::vector<Complex> z = {{1.2, 0}, {0.99, 0}, {0, 0.5}, {-1, 0}};
   for (int32_t k = 0; k <= 4; ++k) {
     std::vector<Complex> out(size_t(k) + 2, Complex(kGuard));
     ASSERT_EQ(SelectRootsNearUnitCircle(z.data(), 4, k, out.data()), 0);
     EXPECT_TRUE(GuardIntact(out, size_t(k))) << "k=" << k;
-    if (k >= 3) { EXPECT_EQ(out[2], Complex(1.2, 0)); }  // -1, 0.99, 1.2: nearest first
+    if (k >= 3) {
+      EXPECT_EQ(out[2], Complex(1.2, 0));
+    }  // -1, 0.99, 1.2: nearest first
   }
 }
 

@@ -104,15 +104,16 @@ void CheckLength(int32_t n) {
     }
     for (int t = 0; t < 4; ++t) {
       const LD rel = std::sqrt(err[t] / std::max(norm[t / 2], 1e-300L));
-      EXPECT_LE(static_cast<double>(rel), bound) << "n = " << n << " transform " << t
-                                                 << (wide ? " wide" : " narrow");
+      EXPECT_LE(static_cast<double>(rel), bound)
+          << "n = " << n << " transform " << t << (wide ? " wide" : " narrow");
     }
     for (const auto* y : {&y1, &y2r, &y2i, &y3, &y4})
       outputs[wide].insert(outputs[wide].end(), y->begin(), y->end());
   }
   fftk::SetWideLanes(true);
   EXPECT_EQ(std::memcmp(outputs[0].data(), outputs[1].data(), outputs[0].size() * sizeof(double)),
-            0) << "n = " << n << ": the wide and narrow variants differ";
+            0)
+      << "n = " << n << ": the wide and narrow variants differ";
   FftPlanRelease(plan);
 }
 
@@ -211,9 +212,9 @@ void CheckInverse(int32_t n) {
 // (1022 and 1024 the two sides).
 TEST(Fft, HalfComplexToRealMatchesDirectSum) {
   for (int32_t n = 1; n <= 64; ++n) CheckInverse(n);
-  for (int32_t n : {97, 101, 106, 107, 120, 210, 214, 360, 900, 1000, 1024, 1125, 2048, 3000,
-                    3375, 1022, 4096, 4999, 5120, 10007, 15360, 30030, 49152, 65536, 245760, 262144,
-                    759375, 1048576})
+  for (int32_t n : {97,    101,   106,   107,   120,    210,    214,    360,    900,  1000,
+                    1024,  1125,  2048,  3000,  3375,   1022,   4096,   4999,   5120, 10007,
+                    15360, 30030, 49152, 65536, 245760, 262144, 759375, 1048576})
     CheckInverse(n);
   FftPlan* one = FftPlanAcquire(3);
   double in[3] = {1.0, 2.0, 3.0}, out[3] = {7.0, 7.0, 7.0};

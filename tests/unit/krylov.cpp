@@ -23,7 +23,8 @@ namespace {
 using Cx = std::complex<double>;
 using Lcx = std::complex<long double>;
 constexpr double kEps = 2.220446049250313e-16;
-template <typename T> constexpr bool kIsCx = !std::is_same_v<T, double>;
+template <typename T>
+constexpr bool kIsCx = !std::is_same_v<T, double>;
 
 Lcx Widen(double v) { return {v, 0.0L}; }
 Lcx Widen(Cx v) { return {v.real(), v.imag()}; }
@@ -46,7 +47,10 @@ std::vector<T> Record(Kind kind, int64_t n, int modes, uint32_t seed) {
       v += (1.0 + 0.5 * m) * std::exp(Cx(-0.5 / double(n), 2.0 * std::numbers::pi * f) * double(t));
     }
     v += sigma * Cx(g(gen), g(gen));
-    if constexpr (kIsCx<T>) x[static_cast<size_t>(t)] = v; else x[static_cast<size_t>(t)] = v.real() + v.imag();
+    if constexpr (kIsCx<T>)
+      x[static_cast<size_t>(t)] = v;
+    else
+      x[static_cast<size_t>(t)] = v.real() + v.imag();
   }
   return x;
 }
@@ -59,8 +63,10 @@ std::vector<Lcx> Direct(const std::vector<T>& x, int32_t rows, int32_t cols, con
   for (int32_t i = 0; i < rows; ++i)
     for (int32_t j = 0; j < cols; ++j) {
       const Lcx h = Widen(x[static_cast<size_t>(i + cols - 1 - j)]);
-      if (adjoint) out[size_t(j)] += std::conj(h) * Widen(v[i * stride]);
-      else out[size_t(i)] += h * Widen(v[j * stride]);
+      if (adjoint)
+        out[size_t(j)] += std::conj(h) * Widen(v[i * stride]);
+      else
+        out[size_t(i)] += h * Widen(v[j * stride]);
     }
   return out;
 }
@@ -77,10 +83,9 @@ struct Shape {
   Kind kind;
 };
 const Shape kShapes[] = {
-    {1, 1, 1, kNoise},       {7, 3, 3, kNoise},      {3, 7, 2, kNoise},
-    {200, 100, 4, kModes},   {100, 200, 4, kModes},  {341, 170, 8, kModes},
-    {300, 150, 3, kNoiseFree}, {240, 120, 2, kClose}, {500, 60, 16, kNoise},
-    {1000, 499, 6, kModes},
+    {1, 1, 1, kNoise},     {7, 3, 3, kNoise},      {3, 7, 2, kNoise},         {200, 100, 4, kModes},
+    {100, 200, 4, kModes}, {341, 170, 8, kModes},  {300, 150, 3, kNoiseFree}, {240, 120, 2, kClose},
+    {500, 60, 16, kNoise}, {1000, 499, 6, kModes},
 };
 
 template <typename T>
@@ -95,7 +100,10 @@ void CheckProducts() {
     std::uniform_real_distribution<double> d(-1, 1);
     auto draw = [&]() -> T {
       const double re = d(gen);
-      if constexpr (kIsCx<T>) return T(re, d(gen)); else return re;
+      if constexpr (kIsCx<T>)
+        return T(re, d(gen));
+      else
+        return re;
     };
     for (T& e : V) e = draw();
     for (T& e : U) e = draw();
@@ -125,16 +133,15 @@ void CheckProducts() {
 template <typename T>
 void CheckTriplets() {
   for (const Shape& s : kShapes) {
-    SCOPED_TRACE(testing::Message() << s.rows << "x" << s.cols << " count " << s.count
-                                    << " kind " << s.kind);
+    SCOPED_TRACE(testing::Message()
+                 << s.rows << "x" << s.cols << " count " << s.count << " kind " << s.kind);
     const int modes = std::max(1, s.count / 2);
     const std::vector<T> x = Record<T>(s.kind, s.rows + s.cols - 1, modes, 17);
     std::vector<double> S(size_t(s.count));
     std::vector<T> U(size_t(s.rows) * s.count), V(size_t(s.cols) * s.count);
     StatusCode st;
     if constexpr (kIsCx<T>) {
-      st = HankelSvdLeadingComplex(x.data(), s.rows, s.cols, s.count, S.data(), U.data(),
-                                   V.data());
+      st = HankelSvdLeadingComplex(x.data(), s.rows, s.cols, s.count, S.data(), U.data(), V.data());
     } else {
       st = HankelSvdLeadingReal(x.data(), s.rows, s.cols, s.count, S.data(), U.data(), V.data());
     }
@@ -142,12 +149,15 @@ void CheckTriplets() {
     // The dense singular values of the formed matrix.
     std::vector<T> H(size_t(s.rows) * s.cols);
     for (int32_t i = 0; i < s.rows; ++i)
-      for (int32_t j = 0; j < s.cols; ++j) H[size_t(i) * s.cols + j] = x[size_t(i + s.cols - 1 - j)];
+      for (int32_t j = 0; j < s.cols; ++j)
+        H[size_t(i) * s.cols + j] = x[size_t(i + s.cols - 1 - j)];
     const int32_t r = std::min(s.rows, s.cols);
     std::vector<double> Sd(static_cast<size_t>(r));
     std::vector<T> Ud(size_t(s.rows) * r), Vd(size_t(s.cols) * r);
-    if constexpr (kIsCx<T>) st = SvdComplex(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0);
-    else st = SvdReal(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0);
+    if constexpr (kIsCx<T>)
+      st = SvdComplex(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0);
+    else
+      st = SvdReal(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0);
     ASSERT_EQ(st, 0);
     const double s1 = Sd[0];
     for (int32_t i = 0; i < s.count; ++i) {
@@ -157,9 +167,11 @@ void CheckTriplets() {
       const auto hu = Direct(x, s.rows, s.cols, U.data() + i, s.count, true);
       long double r1 = 0, r2 = 0;
       for (int32_t a = 0; a < s.rows; ++a)
-        r1 += std::norm(hv[size_t(a)] - Widen(U[size_t(a) * s.count + i]) * (long double)S[size_t(i)]);
+        r1 += std::norm(hv[size_t(a)] -
+                        Widen(U[size_t(a) * s.count + i]) * (long double)S[size_t(i)]);
       for (int32_t b = 0; b < s.cols; ++b)
-        r2 += std::norm(hu[size_t(b)] - Widen(V[size_t(b) * s.count + i]) * (long double)S[size_t(i)]);
+        r2 += std::norm(hu[size_t(b)] -
+                        Widen(V[size_t(b) * s.count + i]) * (long double)S[size_t(i)]);
       EXPECT_LE(std::sqrt(r1), 1e-12 * s1) << "H v - s u, triplet " << i;
       EXPECT_LE(std::sqrt(r2), 1e-12 * s1) << "H^H u - s v, triplet " << i;
       for (int32_t j = 0; j <= i; ++j) {
@@ -216,7 +228,7 @@ struct Case {
 
 template <typename T>
 void Agree() {
-  const Case cases[] = {{256, 2, kModes, 40},  {256, 4, kModes, 10},   {1024, 8, kModes, 30},
+  const Case cases[] = {{256, 2, kModes, 40},     {256, 4, kModes, 10},  {1024, 8, kModes, 30},
                         {1024, 3, kNoiseFree, 0}, {1200, 2, kClose, 40}, {1536, 6, kModes, 20},
                         {999, 5, kModes, 25}};
   for (const Case& c : cases) {
@@ -227,7 +239,10 @@ void Agree() {
       std::mt19937_64 gen(29);
       std::normal_distribution<double> g(0.0, std::pow(10.0, -c.snr_db / 20.0));
       for (T& v : x) {
-        if constexpr (kIsCx<T>) v += T(g(gen), g(gen)); else v += g(gen);
+        if constexpr (kIsCx<T>)
+          v += T(g(gen), g(gen));
+        else
+          v += g(gen);
       }
     }
     const int32_t L = c.n / 3;
@@ -237,15 +252,15 @@ void Agree() {
     for (int route = 0; route < 2; ++route) {
       for (auto* v : {&a[route], &p[route], &d[route], &f[route]}) v->assign(size_t(c.M), 0.0);
       if constexpr (kIsCx<T>) {
-        st[route] = MatrixPencilSolverComplex(
-            x.data(), c.n, L, c.M, 1.0, route ? PencilSolver::kKrylov : PencilSolver::kDense,
-            a[route].data(), p[route].data(), d[route].data(),
-            f[route].data(), &mse[route], &count[route]);
+        st[route] = MatrixPencilSolverComplex(x.data(), c.n, L, c.M, 1.0,
+                                              route ? PencilSolver::kKrylov : PencilSolver::kDense,
+                                              a[route].data(), p[route].data(), d[route].data(),
+                                              f[route].data(), &mse[route], &count[route]);
       } else {
-        st[route] = MatrixPencilSolverReal(
-            x.data(), c.n, L, c.M, 1.0, 0, route ? PencilSolver::kKrylov : PencilSolver::kDense,
-            a[route].data(), p[route].data(), d[route].data(),
-            f[route].data(), &mse[route], &count[route]);
+        st[route] = MatrixPencilSolverReal(x.data(), c.n, L, c.M, 1.0, 0,
+                                           route ? PencilSolver::kKrylov : PencilSolver::kDense,
+                                           a[route].data(), p[route].data(), d[route].data(),
+                                           f[route].data(), &mse[route], &count[route]);
       }
     }
     ASSERT_EQ(st[0], st[1]);
@@ -283,7 +298,10 @@ namespace fb {
 
 template <typename T>
 T Conj(T v) {
-  if constexpr (kIsCx<T>) return std::conj(v); else return v;
+  if constexpr (kIsCx<T>)
+    return std::conj(v);
+  else
+    return v;
 }
 
 template <typename T>
@@ -312,11 +330,11 @@ struct Shape {
   int32_t count;  // 0: every count from 1 to min(2q, p)
 };
 const Shape kShapes[] = {
-    {2, 1, kNoise, 0},        {10, 3, kNoise, 0},       // q > p
-    {10, 6, kNoise, 0},       {20, 14, kNoise, 0},      // q < p: 2q > p, then 2q < p (wide)
-    {24, 16, kModes, 0},      {24, 9, kNoiseFree, 0},   // 2q = p; a rank-6 record
-    {300, 100, kModes, 8},    {300, 200, kModes, 8},    {301, 200, kNoiseFree, 5},
-    {600, 400, kModes, 16},   {240, 80, kClose, 3},     {500, 60, kNoise, 17},
+    {2, 1, kNoise, 0},      {10, 3, kNoise, 0},      // q > p
+    {10, 6, kNoise, 0},     {20, 14, kNoise, 0},     // q < p: 2q > p, then 2q < p (wide)
+    {24, 16, kModes, 0},    {24, 9, kNoiseFree, 0},  // 2q = p; a rank-6 record
+    {300, 100, kModes, 8},  {300, 200, kModes, 8},  {301, 200, kNoiseFree, 5},
+    {600, 400, kModes, 16}, {240, 80, kClose, 3},   {500, 60, kNoise, 17},
 };
 
 template <typename T>
@@ -328,13 +346,15 @@ void Check() {
     std::vector<double> Sd(size_t(r), 0.0);
     std::vector<T> Ud(size_t(rows) * r), Vd(size_t(s.p) * r);
     StatusCode st;
-    if constexpr (kIsCx<T>) st = SvdComplex(A.data(), rows, s.p, Ud.data(), Sd.data(), Vd.data(), 0);
-    else st = SvdReal(A.data(), rows, s.p, Ud.data(), Sd.data(), Vd.data(), 0);
+    if constexpr (kIsCx<T>)
+      st = SvdComplex(A.data(), rows, s.p, Ud.data(), Sd.data(), Vd.data(), 0);
+    else
+      st = SvdReal(A.data(), rows, s.p, Ud.data(), Sd.data(), Vd.data(), 0);
     ASSERT_EQ(st, 0);
     const double s1 = Sd[0];
     for (int32_t count = s.count ? s.count : 1; count <= (s.count ? s.count : r); ++count) {
-      SCOPED_TRACE(testing::Message() << "n " << s.n << " p " << s.p << " count " << count
-                                      << " kind " << s.kind);
+      SCOPED_TRACE(testing::Message()
+                   << "n " << s.n << " p " << s.p << " count " << count << " kind " << s.kind);
       std::vector<double> S(static_cast<size_t>(count));
       std::vector<T> U(size_t(rows) * count), V(size_t(s.p) * count);
       ASSERT_EQ(Leading(x, s.p, count, S.data(), U.data(), V.data()), 0);
@@ -386,10 +406,15 @@ TEST(ForwardBackwardFft, RefusesBadSizesAndCountsAllocations) {
   std::vector<Cx> x(60, Cx(1.0, 0.5)), U(120 * 8), V(40 * 8);
   std::vector<double> S(8);
   // Order 0, order n, count 0, count above min(2q, p) (p = 40, 2q = 40).
-  for (const auto& [n, p, count] : {std::array<int32_t, 3>{60, 0, 1}, {60, 60, 1}, {60, 20, 0},
-                                    {60, 40, 41}, {60, 50, 21}, {0, 0, 1}}) {
+  for (const auto& [n, p, count] : {std::array<int32_t, 3>{60, 0, 1},
+                                    {60, 60, 1},
+                                    {60, 20, 0},
+                                    {60, 40, 41},
+                                    {60, 50, 21},
+                                    {0, 0, 1}}) {
     EXPECT_EQ(ForwardBackwardSvdLeadingComplex(x.data(), n, p, count, S.data(), U.data(), V.data()),
-              -20003) << n << " " << p << " " << count;
+              -20003)
+        << n << " " << p << " " << count;
   }
   const std::vector<Cx> rec = Record<Cx>(kModes, 60, 2, 3);
   for (int64_t fail = 1;; ++fail) {
@@ -415,8 +440,10 @@ StatusCode Fit(const std::vector<T>& x, int32_t n, int32_t p, int32_t k, PcarSol
                std::vector<T>& a, std::vector<Cx>& roots) {
   a.assign(size_t(std::max(p, 0)) + 1, T(-7.0));
   roots.assign(size_t(std::max(p, 1)), Cx(-7.0, 0.0));
-  if constexpr (kIsCx<T>) return PcarSolverComplex(x.data(), n, p, k, solver, a.data(), roots.data());
-  else return PcarSolverReal(x.data(), n, p, k, solver, a.data(), roots.data());
+  if constexpr (kIsCx<T>)
+    return PcarSolverComplex(x.data(), n, p, k, solver, a.data(), roots.data());
+  else
+    return PcarSolverReal(x.data(), n, p, k, solver, a.data(), roots.data());
 }
 
 // Records of `modes` damped exponentials (their real parts for real data) at
@@ -432,7 +459,10 @@ std::vector<T> Modes(int32_t n, int modes, double snr_db, uint32_t seed) {
       v += (1.0 + 0.3 * m) *
            std::exp(Cx(-0.4 / n, 2.0 * std::numbers::pi * (0.04 + 0.43 * m / modes)) * double(t));
     if (snr_db > 0) v += Cx(g(gen), g(gen));
-    if constexpr (kIsCx<T>) x[size_t(t)] = v; else x[size_t(t)] = v.real();
+    if constexpr (kIsCx<T>)
+      x[size_t(t)] = v;
+    else
+      x[size_t(t)] = v.real();
   }
   return x;
 }
@@ -459,8 +489,8 @@ void Agree() {
       if (c.n > 2000 && p > c.n / 3) continue;  // the dense route alone takes seconds there
       for (const int32_t k : c.k) {
         if (k == 0 || (c.snr_db == 0 && k > rank * c.modes)) continue;
-        SCOPED_TRACE(testing::Message() << "n " << c.n << " p " << p << " k " << k << " snr "
-                                        << c.snr_db);
+        SCOPED_TRACE(testing::Message()
+                     << "n " << c.n << " p " << p << " k " << k << " snr " << c.snr_db);
         std::vector<T> a[2];
         std::vector<Cx> z[2];
         const StatusCode dense = Fit(x, c.n, p, k, PcarSolver::kDense, a[0], z[0]);
@@ -505,12 +535,12 @@ TEST(PcarKrylov, SameStatusesAtTheEdges) {
     int32_t n, p, k;
     double fill;  // every sample; NaN and infinity included
   };
-  const Edge edges[] = {{0, 0, 1, 1.0},   {9, 7, 1, 1.0},  {9, -1, 1, 1.0}, {9, 3, 0, 1.0},
-                        {9, 3, 4, 1.0},   {9, 6, 6, 0.0},  {40, 13, 3, 0.0}, {40, 13, 3, NAN},
+  const Edge edges[] = {{0, 0, 1, 1.0},        {9, 7, 1, 1.0}, {9, -1, 1, 1.0},  {9, 3, 0, 1.0},
+                        {9, 3, 4, 1.0},        {9, 6, 6, 0.0}, {40, 13, 3, 0.0}, {40, 13, 3, NAN},
                         {40, 13, 3, INFINITY}, {3, 2, 1, 0.0}, {3, 2, 2, 0.0}};
   for (const Edge& e : edges) {
-    SCOPED_TRACE(testing::Message() << "n " << e.n << " p " << e.p << " k " << e.k << " fill "
-                                    << e.fill);
+    SCOPED_TRACE(testing::Message()
+                 << "n " << e.n << " p " << e.p << " k " << e.k << " fill " << e.fill);
     std::vector<Cx> x(size_t(std::max(e.n, 1)), Cx(e.fill, 0.0)), a[2];
     std::vector<Cx> z[2];
     const StatusCode dense = pcar::Fit(x, e.n, e.p, e.k, PcarSolver::kDense, a[0], z[0]);

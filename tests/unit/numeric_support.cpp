@@ -21,7 +21,8 @@ namespace {
 
 using Cx = std::complex<double>;
 constexpr double kEps = 2.220446049250313e-16;
-template <typename T> constexpr bool kIsCx = !std::is_same_v<T, double>;
+template <typename T>
+constexpr bool kIsCx = !std::is_same_v<T, double>;
 
 long double Widen(double v) { return v; }
 std::complex<long double> Widen(Cx v) { return {v.real(), v.imag()}; }
@@ -38,7 +39,10 @@ std::vector<T> Random(int64_t rows, int64_t cols, uint32_t seed) {
   std::vector<T> a(static_cast<size_t>(rows * cols));
   for (T& v : a) {
     const double re = d(gen);
-    if constexpr (kIsCx<T>) v = T(re, d(gen)); else v = re;
+    if constexpr (kIsCx<T>)
+      v = T(re, d(gen));
+    else
+      v = re;
   }
   return a;
 }
@@ -72,7 +76,9 @@ double Diff(const std::vector<T>& a, const std::vector<T>& b) {
   return static_cast<double>(std::sqrt(s));
 }
 template <typename T>
-double Norm(const std::vector<T>& a) { return Diff(a, std::vector<T>(a.size())); }
+double Norm(const std::vector<T>& a) {
+  return Diff(a, std::vector<T>(a.size()));
+}
 
 // ||Q^H Q - I||_F for the m-by-c Q.
 template <typename T>
@@ -82,19 +88,36 @@ double OrthError(const T* Q, int64_t m, int64_t c) {
   return Norm(g);
 }
 
-struct Shape { int32_t m, n, rank, nrhs; };
+struct Shape {
+  int32_t m, n, rank, nrhs;
+};
 
 const Shape kShapes[] = {
-    {1, 1, 1, 1},   {5, 5, 5, 2},  {6, 6, 3, 1},   {7, 5, 5, 2},   {10, 4, 4, 3},
-    {5, 1, 1, 4},   {12, 5, 2, 2}, {1, 6, 1, 1},   {3, 7, 3, 2},   {8, 12, 3, 2},
-    {22, 42, 22, 1}, {40, 22, 22, 2},
-    {2000, 40, 40, 2}, {1500, 40, 12, 2},  // several row blocks of the QR fold
+    {1, 1, 1, 1},
+    {5, 5, 5, 2},
+    {6, 6, 3, 1},
+    {7, 5, 5, 2},
+    {10, 4, 4, 3},
+    {5, 1, 1, 4},
+    {12, 5, 2, 2},
+    {1, 6, 1, 1},
+    {3, 7, 3, 2},
+    {8, 12, 3, 2},
+    {22, 42, 22, 1},
+    {40, 22, 22, 2},
+    {2000, 40, 40, 2},
+    {1500, 40, 12, 2},  // several row blocks of the QR fold
     // either side of the width where a real solve leaves DGELSD
-    {1, 739, 1, 2}, {1, 740, 1, 2}, {2, 803, 2, 1},
+    {1, 739, 1, 2},
+    {1, 740, 1, 2},
+    {2, 803, 2, 1},
 };
 
 // A = F Q, the `rank` rows of Q orthonormal (Gram-Schmidt): they span the row space of A.
-template <typename T> struct Problem { std::vector<T> A, Q; };
+template <typename T>
+struct Problem {
+  std::vector<T> A, Q;
+};
 template <typename T>
 Problem<T> MakeProblem(const Shape& s, uint32_t seed) {
   Problem<T> p{{}, Random<T>(s.rank, s.n, seed)};
@@ -115,15 +138,20 @@ Problem<T> MakeProblem(const Shape& s, uint32_t seed) {
 
 template <typename R, typename X, typename P, typename... Args>
 StatusCode Twin(R real, X complex, P* first, Args... rest) {
-  if constexpr (kIsCx<std::remove_const_t<P>>) return complex(first, rest...);
-  else return real(first, rest...);
+  if constexpr (kIsCx<std::remove_const_t<P>>)
+    return complex(first, rest...);
+  else
+    return real(first, rest...);
 }
 
 const auto Svd = [](auto... a) { return Twin(SvdReal, SvdComplex, a...); };
 const auto SvdLeading = [](auto... a) { return Twin(SvdLeadingReal, SvdLeadingComplex, a...); };
 const auto SvdRight = [](auto... a) {
-  return Twin(SvdLeadingRightReal, SvdLeadingRightComplex, a...); };
-const auto QrHankel = [](auto... a) { return Twin(QrReduceHankelReal, QrReduceHankelComplex, a...); };
+  return Twin(SvdLeadingRightReal, SvdLeadingRightComplex, a...);
+};
+const auto QrHankel = [](auto... a) {
+  return Twin(QrReduceHankelReal, QrReduceHankelComplex, a...);
+};
 const auto Pinv = [](auto... a) { return Twin(PseudoInverseReal, PseudoInverseComplex, a...); };
 const auto MatMul = [](auto... a) { return Twin(MatMulReal, MatMulComplex, a...); };
 const auto Transpose = [](auto... a) { return Twin(TransposeReal, ConjTransposeComplex, a...); };
@@ -136,13 +164,18 @@ StatusCode Solve(int solver, const T* A, int32_t m, int32_t n, const T* B, int32
   if constexpr (kIsCx<T>)
     return solver == kTruncated ? LeastSquaresTruncatedComplex(A, m, n, B, nrhs, X, keep)
                                 : LeastSquaresComplex(A, m, n, B, nrhs, X, rcond);
-  else if (solver == kTruncated) return LeastSquaresTruncatedReal(A, m, n, B, nrhs, X, keep);
-  else if (solver == kPinv) return LeastSquaresPinvReal(A, m, n, B, nrhs, X, rcond);
-  else return LeastSquaresReal(A, m, n, B, nrhs, X, rcond);
+  else if (solver == kTruncated)
+    return LeastSquaresTruncatedReal(A, m, n, B, nrhs, X, keep);
+  else if (solver == kPinv)
+    return LeastSquaresPinvReal(A, m, n, B, nrhs, X, rcond);
+  else
+    return LeastSquaresReal(A, m, n, B, nrhs, X, rcond);
 }
-template <typename T> constexpr int kFirstSolver = kIsCx<T> ? kPinv : kGelsd;
+template <typename T>
+constexpr int kFirstSolver = kIsCx<T> ? kPinv : kGelsd;
 
-template <typename T> class Dense : public ::testing::Test {};
+template <typename T>
+class Dense : public ::testing::Test {};
 using Scalars = ::testing::Types<double, Cx>;
 TYPED_TEST_SUITE(Dense, Scalars);
 
@@ -154,7 +187,8 @@ double MoorePenroseError(const std::vector<T>& A, const std::vector<T>& P, int32
   return std::max({Diff(Prod(ap.data(), A.data(), m, m, n), A) / (na * na * np),
                    Diff(Prod(pa.data(), P.data(), n, n, m), P) / (np * np * na),
                    Diff(Adj(ap.data(), m, m), ap) / (na * np),
-                   Diff(Adj(pa.data(), n, n), pa) / (na * np)}) / (std::max(m, n) * kEps);
+                   Diff(Adj(pa.data(), n, n), pa) / (na * np)}) /
+         (std::max(m, n) * kEps);
 }
 
 // SVD, pseudo-inverse, the solves and the QR fold over the shape table.
@@ -221,9 +255,11 @@ TYPED_TEST(Dense, ShapeTableIdentities) {
       for (double scale : {1.0, 1e150, 1e-150}) {
         if (scale != 1.0 && s.m < 600) break;
         auto as = p.A, bs = b;
-        for (auto* z : {&as, &bs}) for (T& v : *z) v *= scale;
+        for (auto* z : {&as, &bs})
+          for (T& v : *z) v *= scale;
         ASSERT_EQ(Solve(solver, as.data(), s.m, s.n, bs.data(), s.nrhs, x.data(), -1.0, s.rank),
-                  want) << scale;
+                  want)
+            << scale;
         if (scale == 1.0) x1 = x;
         EXPECT_LT(Diff(x, x1), 1e-11 * Norm(x1)) << scale;
       }
@@ -247,8 +283,10 @@ TYPED_TEST(Dense, ShapeTableIdentities) {
       for (int32_t j = 0; j < i; ++j) EXPECT_EQ(r[i * s.n + j], T(0.0));
     const auto rh = Adj(r.data(), s.n, s.n), hh = Adj(h.data(), s.m, s.n);
     const double unit = Norm(h) * s.m * kEps;
-    EXPECT_LT(Diff(Prod(hh.data(), h.data(), s.n, s.m, s.n),
-                   Prod(rh.data(), r.data(), s.n, s.n, s.n)) / (unit * Norm(h)), 30.0);
+    EXPECT_LT(
+        Diff(Prod(hh.data(), h.data(), s.n, s.m, s.n), Prod(rh.data(), r.data(), s.n, s.n, s.n)) /
+            (unit * Norm(h)),
+        30.0);
   }
 }
 
@@ -260,10 +298,14 @@ TYPED_TEST(Dense, ThresholdsAndRankDecisions) {
                        b = {T(1.0), T(1e-20), T(1.0)};
   // rcond: the truncated solve's keep; x1 is 1 when 1e-20 is kept. DGELSD gets max(m, n) rcond,
   // or max(m, n) eps for a negative or NaN rcond; the pinv solves read zero as eps too.
-  const struct { int solver; double rcond; int32_t want; double x1; } cases[] = {
-      {kGelsd, -1.0, 20001, 0.0}, {kGelsd, NAN, 20001, 0.0}, {kGelsd, 1e-25, 0, 1.0},
-      {kPinv, 0.0, 20001, 0.0},   {kPinv, -1.0, 20001, 0.0}, {kPinv, 1e-22, 0, 1.0},
-      {kTruncated, 1, 0, 0.0},    {kTruncated, 2, 0, 1.0}};
+  const struct {
+    int solver;
+    double rcond;
+    int32_t want;
+    double x1;
+  } cases[] = {{kGelsd, -1.0, 20001, 0.0}, {kGelsd, NAN, 20001, 0.0}, {kGelsd, 1e-25, 0, 1.0},
+               {kPinv, 0.0, 20001, 0.0},   {kPinv, -1.0, 20001, 0.0}, {kPinv, 1e-22, 0, 1.0},
+               {kTruncated, 1, 0, 0.0},    {kTruncated, 2, 0, 1.0}};
   for (const auto& c : cases) {
     if (kIsCx<T> && c.solver == kGelsd) continue;
     SCOPED_TRACE(::testing::Message() << c.solver << " " << c.rcond);
@@ -277,8 +319,12 @@ TYPED_TEST(Dense, ThresholdsAndRankDecisions) {
     EXPECT_EQ(x, std::vector<T>(2, T(0.0)));
   }
   // pinv tolerance: negative selects max(m, n) S[0] eps; any other used as given.
-  for (auto [tol, p00, p11] : {std::tuple{-1.0, 1.0, 0.0}, {0.0, 1.0, 1e20}, {1e-21, 1.0, 1e20},
-                               {1e-20, 1.0, 0.0}, {1.0, 0.0, 0.0}, {NAN, 0.0, 0.0}}) {
+  for (auto [tol, p00, p11] : {std::tuple{-1.0, 1.0, 0.0},
+                               {0.0, 1.0, 1e20},
+                               {1e-21, 1.0, 1e20},
+                               {1e-20, 1.0, 0.0},
+                               {1.0, 0.0, 0.0},
+                               {NAN, 0.0, 0.0}}) {
     auto work = a;
     std::vector<T> p(6, T(7.0));
     ASSERT_EQ(Pinv(work.data(), 3, 2, tol, p.data()), 0);
@@ -294,8 +340,13 @@ TYPED_TEST(Dense, ThresholdsAndRankDecisions) {
 // constant record (rank 1) and a NaN.
 TYPED_TEST(Dense, ForwardSolveIsTheFormedSolve) {
   using T = TypeParam;
-  for (auto [n, p, kind] : {std::tuple{9000, 16, 0}, {36, 12, 0}, {35, 12, 0}, {200, 10, 1},
-                            {200, 10, 2}, {9000, 16, 3}, {1000, 7, 3}}) {
+  for (auto [n, p, kind] : {std::tuple{9000, 16, 0},
+                            {36, 12, 0},
+                            {35, 12, 0},
+                            {200, 10, 1},
+                            {200, 10, 2},
+                            {9000, 16, 3},
+                            {1000, 7, 3}}) {
     SCOPED_TRACE(::testing::Message() << n << " " << p << " " << kind);
     auto x = Random<T>(1, n, 41);
     if (kind == 1) x.assign(n, T(1.0));
@@ -311,8 +362,8 @@ TYPED_TEST(Dense, ForwardSolveIsTheFormedSolve) {
     std::vector<T> a(size_t(m) * p), w(p, T(7.0)), want(p, T(7.0));
     for (int32_t i = 0; i < m; ++i)
       for (int32_t j = 0; j < p; ++j) a[size_t(i) * p + j] = x[i + p - 1 - j];
-    const StatusCode got = Twin(ForwardLeastSquaresReal, ForwardLeastSquaresComplex, x.data(), n,
-                                p, w.data(), -1.0);
+    const StatusCode got =
+        Twin(ForwardLeastSquaresReal, ForwardLeastSquaresComplex, x.data(), n, p, w.data(), -1.0);
     EXPECT_EQ(got, Solve(kFirstSolver<T>, a.data(), m, p, x.data() + p, 1, want.data(), -1.0, 0));
     EXPECT_EQ(got, kind == 0 || kind == 3 ? 0 : kind == 1 ? 20001 : -20068);
     EXPECT_EQ(w, want);
@@ -332,7 +383,10 @@ TEST(DenseComplex, LongIllConditionedSystemWithAnExactAnswer) {
     std::mt19937_64 gen(51);
     std::uniform_int_distribution<int> base(-1000000, 1000000), wobble(-2, 2), coef(-9, 9);
     const auto draw = [&](auto& d) {
-      if constexpr (kIsCx<T>) return T(d(gen), d(gen)); else return T(d(gen));
+      if constexpr (kIsCx<T>)
+        return T(d(gen), d(gen));
+      else
+        return T(d(gen));
     };
     std::vector<T> a(size_t(m) * n), w(n), b(m), x(n, T(7.0));
     for (T& v : w) v = draw(coef);
@@ -363,13 +417,17 @@ TEST(LapackBoundary, InjectedInfoMapsPerDriver) {
       [&] { return EigSymReal(sym.data(), 4, 0, s.data(), nullptr); },
   };
   // call, INFO, status; persistent (the failure stays armed), m, n for the real solve
-  const struct { int call; int32_t info; int32_t want; int persistent, m, n; } cases[] = {
-      {0, 3, -20062, 0, 0, 0},   {0, -2, -20062, 0, 0, 0},    {1, 1, -20062, 0, 0, 0},
-      {1, -4, -20999, 0, 0, 0},  {3, -1, -20999, 0, 0, 0},    {4, 5, -20062, 0, 0, 0},
-      {0, 1, -20062, 1, 0, 0},   {2, 2, -20062, 0, 3, 4},     {2, -3, 20001, 0, 3, 4},
-      {2, -3, 20001, 0, 1, 739}, {2, -3, -20062, 0, 1, 740},  {2, -3, 20001, 0, 2, 802},
-      {2, -3, -20062, 0, 2, 803}, {2, -3, 20001, 0, 3, 868},  {2, -3, -20062, 0, 3, 869},
-      {2, -3, 20001, 0, 10, 1386}, {2, -3, -20062, 0, 10, 1387}};
+  const struct {
+    int call;
+    int32_t info;
+    int32_t want;
+    int persistent, m, n;
+  } cases[] = {{0, 3, -20062, 0, 0, 0},     {0, -2, -20062, 0, 0, 0},    {1, 1, -20062, 0, 0, 0},
+               {1, -4, -20999, 0, 0, 0},    {3, -1, -20999, 0, 0, 0},    {4, 5, -20062, 0, 0, 0},
+               {0, 1, -20062, 1, 0, 0},     {2, 2, -20062, 0, 3, 4},     {2, -3, 20001, 0, 3, 4},
+               {2, -3, 20001, 0, 1, 739},   {2, -3, -20062, 0, 1, 740},  {2, -3, 20001, 0, 2, 802},
+               {2, -3, -20062, 0, 2, 803},  {2, -3, 20001, 0, 3, 868},   {2, -3, -20062, 0, 3, 869},
+               {2, -3, 20001, 0, 10, 1386}, {2, -3, -20062, 0, 10, 1387}};
   for (const auto& c : cases) {
     SCOPED_TRACE(::testing::Message() << c.call << " INFO " << c.info << " " << c.m << "x" << c.n);
     u.assign(u.size(), 7.0), x.assign(x.size(), 7.0);
@@ -389,18 +447,22 @@ TYPED_TEST(Dense, BadInputIsRefusedWithNothingWritten) {
   const auto a = Random<double>(4, 3, 61), b = Random<double>(4, 2, 62);
   // bad_a, bad_b: index of a non-finite entry, or -1; complex: the complex
   // pseudo-inverse solve, which leaves nrhs to the factorization.
-  const struct { int32_t m, n, nrhs, bad_a, bad_b; int32_t real, complex; } cases[] = {
-      {0, 3, 2, -1, -1, -20003, -20003},  {4, 0, 2, -1, -1, -20003, -20003},
-      {-2, 3, 2, -1, -1, -20003, -20003}, {4, 3, 0, -1, -1, -20003, 0},
-      {4, 3, -1, -1, -1, -20003, -20004}, {4, 3, 2, 5, -1, -20068, -20068},
-      {4, 3, 2, -1, 7, -20068, -20068}};
+  const struct {
+    int32_t m, n, nrhs, bad_a, bad_b;
+    int32_t real, complex;
+  } cases[] = {{0, 3, 2, -1, -1, -20003, -20003},  {4, 0, 2, -1, -1, -20003, -20003},
+               {-2, 3, 2, -1, -1, -20003, -20003}, {4, 3, 0, -1, -1, -20003, 0},
+               {4, 3, -1, -1, -1, -20003, -20004}, {4, 3, 2, 5, -1, -20068, -20068},
+               {4, 3, 2, -1, 7, -20068, -20068}};
   for (const auto& c : cases) {
     for (double bad : {DBL_MAX, std::nan(""), -HUGE_VAL, -1.7976931348623e308}) {
       SCOPED_TRACE(::testing::Message() << c.m << "x" << c.n << " nrhs " << c.nrhs << " " << bad);
       std::vector<T> at(a.begin(), a.end()), bt(b.begin(), b.end());
       if (c.bad_a >= 0) {
-        if constexpr (kIsCx<T>) at[c.bad_a] = T(0.5, bad);  // the imaginary part alone
-        else at[c.bad_a] = bad;
+        if constexpr (kIsCx<T>)
+          at[c.bad_a] = T(0.5, bad);  // the imaginary part alone
+        else
+          at[c.bad_a] = bad;
       }
       if (c.bad_b >= 0) bt[c.bad_b] = T(bad);
       for (int solver = kFirstSolver<T>; solver <= kTruncated; ++solver) {
@@ -441,8 +503,12 @@ TYPED_TEST(Dense, ProductsAndTransposesMatchLoops) {
   std::vector<T> c(6, T(7.0));
   ASSERT_EQ(MatMul(&one, &one, 2, 0, 3, c.data()), 0);
   for (T v : c) EXPECT_TRUE(std::isnan(std::real(v)) && std::isnan(std::imag(v)) == kIsCx<T>);
-  for (auto [m, k, n, want] : {std::tuple{0, 3, 2, 0}, {2, 3, 0, 0}, {2, 3, -1, -20004},
-                               {-1, 3, 2, -20004}, {2, -1, 2, -20004}, {0, -2, 0, -20004}}) {
+  for (auto [m, k, n, want] : {std::tuple{0, 3, 2, 0},
+                               {2, 3, 0, 0},
+                               {2, 3, -1, -20004},
+                               {-1, 3, 2, -20004},
+                               {2, -1, 2, -20004},
+                               {0, -2, 0, -20004}}) {
     T out(42.0);
     EXPECT_EQ(MatMul(&one, &one, m, k, n, &out), want) << m << "x" << k << "x" << n;
     EXPECT_EQ(out, T(42.0));
@@ -460,7 +526,10 @@ double EigResidual(const std::vector<Cx>& A, const std::vector<Cx>& V, const std
   for (int i = 0; i < n * n; ++i) av[i] -= V[i] * w[i % n];
   return Norm(av) / (Norm(A) * n * kEps);
 }
-template <typename R> std::vector<Cx> ToCx(const std::vector<R>& x) { return {x.begin(), x.end()}; }
+template <typename R>
+std::vector<Cx> ToCx(const std::vector<R>& x) {
+  return {x.begin(), x.end()};
+}
 
 TEST(Eigen, ResidualsOrderWhereVectorsGoAndRefusals) {
   for (int n : {1, 2, 3, 5, 8, 13, 24}) {
@@ -600,7 +669,8 @@ TEST(PolyRoots, CompanionEigenvaluesSmallResidualsClosedFormsAndRefusals) {
     ExpectSameMultiset(roots, poles, 1e-6);
   }
   // Multiple roots, to the accuracy their multiplicity allows.
-  for (auto [roots_in, tol] : {std::pair{std::vector<Cx>{1, 1, 1, -2}, 1e-4}, {{1, 1, 2, 2}, 1e-6},
+  for (auto [roots_in, tol] : {std::pair{std::vector<Cx>{1, 1, 1, -2}, 1e-4},
+                               {{1, 1, 2, 2}, 1e-6},
                                {{Cx(0, 1), Cx(0, 1), Cx(0, 1), Cx(0, 1)}, 1e-3},
                                {{-.5, -.5, -.5, -.5, -.5}, 1e-2}}) {
     std::vector<Cx> roots;
@@ -610,12 +680,23 @@ TEST(PolyRoots, CompanionEigenvaluesSmallResidualsClosedFormsAndRefusals) {
   // Roots exact and in their order; unwritten entries stay -99 - 99i.
   // A zero leading coefficient (roots at infinity) and NaN are refused before any root.
   const int32_t bad = status::kBadPolynomial;
-  const struct { std::vector<Cx> c; int32_t status; std::vector<Cx> roots; } cases[] = {
-      {{0, 0, 1}, 0, {0, 0}}, {{-2, 1}, 0, {2}}, {{2, -3, 1}, 0, {2, 1}}, {{1, 0, 0}, bad, {}},
-      {{0, 0, 0, -2, 1, 0}, 0, {0, 0, 0, 2}}, {{0, 6, -5, 1}, 0, {0, 3, 2}}, {{5}, bad, {}},
-      {{Cx(0, 2), Cx(0, -2)}, 0, {1}}, {{0, 0}, bad, {}}, {{0, 3}, 0, {0}},
-      {{4, 0, 1}, 0, {Cx(0, -2), Cx(0, 2)}}, {{0, 0, kNaN, 2, 3}, bad, {}},
-      {{0, 0, 1, Cx(0, kNaN), 3}, bad, {}}};
+  const struct {
+    std::vector<Cx> c;
+    int32_t status;
+    std::vector<Cx> roots;
+  } cases[] = {{{0, 0, 1}, 0, {0, 0}},
+               {{-2, 1}, 0, {2}},
+               {{2, -3, 1}, 0, {2, 1}},
+               {{1, 0, 0}, bad, {}},
+               {{0, 0, 0, -2, 1, 0}, 0, {0, 0, 0, 2}},
+               {{0, 6, -5, 1}, 0, {0, 3, 2}},
+               {{5}, bad, {}},
+               {{Cx(0, 2), Cx(0, -2)}, 0, {1}},
+               {{0, 0}, bad, {}},
+               {{0, 3}, 0, {0}},
+               {{4, 0, 1}, 0, {Cx(0, -2), Cx(0, 2)}},
+               {{0, 0, kNaN, 2, 3}, bad, {}},
+               {{0, 0, 1, Cx(0, kNaN), 3}, bad, {}}};
   for (auto [c, status, want] : cases) {
     std::vector<Cx> roots;
     ASSERT_EQ(Roots(c, &roots), status) << c.size();
@@ -648,8 +729,11 @@ void ExpectSameValues(const std::vector<double>& got, const std::vector<double>&
 TEST(SortAndExtremes, NaNFirstTiesAndInPlaceIntoOutAndOverItself) {
   // Any non-zero desc sorts descending.
   const std::tuple<std::vector<double>, int32_t, std::vector<double>> cases[] = {
-      {{3, kNaN, 1, 2}, 0, {kNaN, 1, 2, 3}}, {{kNaN, kNaN}, 0, {kNaN, kNaN}}, {{kNaN}, 0, {kNaN}},
-      {{1, 2, kNaN, 0, kNaN, -5}, 7, {kNaN, kNaN, 2, 1, 0, -5}}, {{2, 2, 1, 2}, 1, {2, 2, 2, 1}},
+      {{3, kNaN, 1, 2}, 0, {kNaN, 1, 2, 3}},
+      {{kNaN, kNaN}, 0, {kNaN, kNaN}},
+      {{kNaN}, 0, {kNaN}},
+      {{1, 2, kNaN, 0, kNaN, -5}, 7, {kNaN, kNaN, 2, 1, 0, -5}},
+      {{2, 2, 1, 2}, 1, {2, 2, 2, 1}},
       {{INFINITY, -INFINITY, 0, -0.0, 4}, 0, {-INFINITY, 0, 0, 4, INFINITY}},
       {{5, kNaN, -1, 5, kNaN, 0, -1, 3}, 1, {kNaN, kNaN, 5, 5, 3, 0, -1, -1}}};
   for (const auto& [in, desc, want] : cases) {
@@ -667,8 +751,11 @@ TEST(SortAndExtremes, NaNFirstTiesAndInPlaceIntoOutAndOverItself) {
   EXPECT_TRUE(std::isnan(out[0]) && out[1] == 6.0);
   // MinMaxReal skips NaN, ties keep the first index: in, then max, its index, min, its index.
   const std::pair<std::vector<double>, std::vector<double>> extremes[] = {
-      {{kNaN, 2, 5, 5, -1, -1}, {5, 2, -1, 4}}, {{kNaN, kNaN}, {kNaN, -1, kNaN, -1}},
-      {{4}, {4, 0, 4, 0}}, {{1, kNaN, 3, kNaN, 0}, {3, 2, 0, 4}}, {{-2, -2, -2}, {-2, 0, -2, 0}},
+      {{kNaN, 2, 5, 5, -1, -1}, {5, 2, -1, 4}},
+      {{kNaN, kNaN}, {kNaN, -1, kNaN, -1}},
+      {{4}, {4, 0, 4, 0}},
+      {{1, kNaN, 3, kNaN, 0}, {3, 2, 0, 4}},
+      {{-2, -2, -2}, {-2, 0, -2, 0}},
       {{kNaN, 7, kNaN}, {7, 1, 7, 1}}};
   for (const auto& [in, want] : extremes) {
     double mx = 123.0, mn = 456.0;
@@ -685,24 +772,42 @@ TEST(SortAndExtremes, NaNFirstTiesAndInPlaceIntoOutAndOverItself) {
 TEST(Scalars, SqrtDividePolarAndTheFinitenessScreen) {
   // op 0: sqrt(a + ib); 1: (a + ib) / (c + id); 2: |a + ib| and arg(a + ib).
   // 1e300 in a division: no overflowing squares.
-  const double pi = std::numbers::pi, cases[][7] = {
-      {0, -4, 0, 0, 0, 0, 2}, {0, 0, 0, 0, 0, 0, 0}, {0, 4, 0, 0, 0, 2, 0}, {0, 0, 2, 0, 0, 1, 1},
-      {0, 0, -2, 0, 0, 1, -1}, {0, -4, -0.0, 0, 0, 0, -2}, {0, 3, 4, 0, 0, 2, 1},
-      {0, -3, 4, 0, 0, 1, 2}, {1, 1, 0, 0, 1, 0, -1}, {1, 1, 1, 1, 1, 1, 0}, {1, 2, 4, 2, 0, 1, 2},
-      {1, 1, 2, 3, 4, 0.44, 0.08}, {1, 1e300, 1e300, 1e300, 1e300, 1, 0}, {2, 0, 0, 0, 0, 0, 0},
-      {2, -1, 0, 0, 0, 1, pi}, {2, 0, 2, 0, 0, 2, pi / 2},
-      {2, 3, -4, 0, 0, 5, -0.9272952180016122}};
+  const double pi = std::numbers::pi, cases[][7] = {{0, -4, 0, 0, 0, 0, 2},
+                                                    {0, 0, 0, 0, 0, 0, 0},
+                                                    {0, 4, 0, 0, 0, 2, 0},
+                                                    {0, 0, 2, 0, 0, 1, 1},
+                                                    {0, 0, -2, 0, 0, 1, -1},
+                                                    {0, -4, -0.0, 0, 0, 0, -2},
+                                                    {0, 3, 4, 0, 0, 2, 1},
+                                                    {0, -3, 4, 0, 0, 1, 2},
+                                                    {1, 1, 0, 0, 1, 0, -1},
+                                                    {1, 1, 1, 1, 1, 1, 0},
+                                                    {1, 2, 4, 2, 0, 1, 2},
+                                                    {1, 1, 2, 3, 4, 0.44, 0.08},
+                                                    {1, 1e300, 1e300, 1e300, 1e300, 1, 0},
+                                                    {2, 0, 0, 0, 0, 0, 0},
+                                                    {2, -1, 0, 0, 0, 1, pi},
+                                                    {2, 0, 2, 0, 0, 2, pi / 2},
+                                                    {2, 3, -4, 0, 0, 5, -0.9272952180016122}};
   for (const auto& c : cases) {
     double re = 9, im = 9;
     EXPECT_EQ(c[0] == 0   ? ComplexSqrt(c[1], c[2], &re, &im)
               : c[0] == 1 ? ComplexDivide(c[1], c[2], c[3], c[4], &re, &im)
-                          : ComplexToPolar(c[1], c[2], &re, &im), 0);
+                          : ComplexToPolar(c[1], c[2], &re, &im),
+              0);
     EXPECT_NEAR(std::abs(Cx(re, im) - Cx(c[5], c[6])), 0.0, 3e-15) << c[0] << " " << c[1];
   }
   // Rejected: NaN, infinities, DBL_MAX and everything at or below -1.7976931348623e308.
-  for (auto [v, rejected] : {std::pair{1.0, 0}, {DBL_MAX, 1}, {std::nextafter(DBL_MAX, 0.0), 0},
-           {-DBL_MAX, 1}, {-1.7976931348623e308, 1}, {std::nextafter(-1.7976931348623e308, 0.0), 0},
-           {INFINITY, 1}, {-INFINITY, 1}, {NAN, 1}, {DBL_TRUE_MIN, 0}}) {
+  for (auto [v, rejected] : {std::pair{1.0, 0},
+                             {DBL_MAX, 1},
+                             {std::nextafter(DBL_MAX, 0.0), 0},
+                             {-DBL_MAX, 1},
+                             {-1.7976931348623e308, 1},
+                             {std::nextafter(-1.7976931348623e308, 0.0), 0},
+                             {INFINITY, 1},
+                             {-INFINITY, 1},
+                             {NAN, 1},
+                             {DBL_TRUE_MIN, 0}}) {
     const double pair[2] = {1.0, v};
     const Cx both[2] = {Cx(v, 0.5), Cx(0.5, v)};
     EXPECT_EQ(HasNonFiniteReal(pair, 2) + HasNonFiniteReal(pair, 1), rejected) << v;

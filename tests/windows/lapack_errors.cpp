@@ -39,8 +39,8 @@ void IllegalSvdArguments() {
     std::vector<std::complex<double>> z(16, {1.0, 0.5}), zu(16), zvt(16), zwork(64);
     std::vector<double> rwork(128);
     info = 0;
-    LAPACK_zgesdd(&jobz, &c.m, &c.n, z.data(), &c.lda, s.data(), zu.data(), &ldu, zvt.data(),
-                  &ldvt, zwork.data(), &lwork, rwork.data(), iwork.data(), &info);
+    LAPACK_zgesdd(&jobz, &c.m, &c.n, z.data(), &c.lda, s.data(), zu.data(), &ldu, zvt.data(), &ldvt,
+                  zwork.data(), &lwork, rwork.data(), iwork.data(), &info);
     if (info != c.expected) std::exit(2);
   }
   std::exit(kReachedTheEnd);

@@ -67,17 +67,17 @@ void RunConcurrently(const QdmApi& qdm) {
     threads.push_back(h);
   }
   SetEvent(start);
-  EXPECT_EQ(WaitForMultipleObjects(static_cast<DWORD>(threads.size()), threads.data(), TRUE,
-                                   INFINITE),
-            WAIT_OBJECT_0);
+  EXPECT_EQ(
+      WaitForMultipleObjects(static_cast<DWORD>(threads.size()), threads.data(), TRUE, INFINITE),
+      WAIT_OBJECT_0);
   for (HANDLE h : threads) CloseHandle(h);
   CloseHandle(start);
   for (const Worker& w : workers) {
     ASSERT_EQ(w.outcomes.size(), mix.size());
     for (size_t i = 0; i < mix.size(); ++i) {
       const MixedCall& m = mix[(i + w.index) % mix.size()];
-      EXPECT_EQ(w.outcomes[i], CallOnce(qdm, m)) << m.x->name << " n=" << m.s.n << " thread "
-                                                 << w.index;
+      EXPECT_EQ(w.outcomes[i], CallOnce(qdm, m))
+          << m.x->name << " n=" << m.s.n << " thread " << w.index;
     }
   }
 }
