@@ -151,7 +151,7 @@ TEST(Fft, MatchesDirectDftLeafFirstLengths) {
 // stride layouts. Bound as for the forward transforms.
 void CheckInverse(int32_t n) {
   const size_t un = static_cast<size_t>(n);
-  const std::vector<double> spec = Random(un, 0x51ed + un);
+  const std::vector<double> packed = Random(un, 0x51ed + un);
   std::vector<int64_t> points;
   std::mt19937_64 pick(n + 1);
   for (int64_t i = 0; i < (n <= 4096 ? n : 64); ++i)
@@ -163,23 +163,23 @@ void CheckInverse(int32_t n) {
   }
   LD norm = 0.0L;
   for (int64_t j : points) {
-    LD sum = spec[0];
+    LD sum = packed[0];
     for (int64_t k = 1, e = j % n; 2 * k < n; ++k, e = (e + j) % n)
-      sum += 2.0L * (spec[k] * c[e] - spec[n - k] * sn[e]);
-    if (n % 2 == 0) sum += (j % 2 == 0 ? 1 : -1) * static_cast<LD>(spec[n / 2]);
+      sum += 2.0L * (packed[k] * c[e] - packed[n - k] * sn[e]);
+    if (n % 2 == 0) sum += (j % 2 == 0 ? 1 : -1) * static_cast<LD>(packed[n / 2]);
     expect.push_back(sum);
     norm += sum * sum;
   }
   FftPlan* plan = FftPlanAcquire(n);
   ASSERT_NE(plan, nullptr);
   const double bound = 20.0 * DBL_EPSILON * std::max(1.0, std::log2(n));
-  std::vector<double> spread(3 * un);  // spec at stride 3
-  for (size_t k = 0; k < un; ++k) spread[3 * k] = spec[k];
+  std::vector<double> spread(3 * un);  // packed at stride 3
+  for (size_t k = 0; k < un; ++k) spread[3 * k] = packed[k];
   struct Layout {
     const double* in;
     int32_t is, os;
   };
-  for (const Layout& l : {Layout{spec.data(), 1, 1}, Layout{spread.data(), 3, 2}}) {
+  for (const Layout& l : {Layout{packed.data(), 1, 1}, Layout{spread.data(), 3, 2}}) {
     std::vector<double> x(2 * un, 7.0), back(un);
     ASSERT_EQ(FftHalfComplexToReal(plan, l.in, x.data(), l.is, l.os, n), 0);
     LD err = 0.0L;
@@ -196,7 +196,7 @@ void CheckInverse(int32_t n) {
     ASSERT_EQ(FftReal(plan, x.data(), back.data(), l.os, 1, n), 0);
     LD rerr = 0.0L, rnorm = 0.0L;
     for (size_t k = 0; k < un; ++k) {
-      const LD want = static_cast<LD>(n) * spec[k];
+      const LD want = static_cast<LD>(n) * packed[k];
       rerr += (back[k] - want) * (back[k] - want);
       rnorm += want * want;
     }
