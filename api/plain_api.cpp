@@ -402,6 +402,47 @@ StatusCode SpectrumCheck(StatusCode shared, int32_t points, int32_t order) {
   return SpectrumLength(points) < int64_t{order} + 1 ? kSpectrumTooShort : status::kOk;
 }
 
+// The PCAR spectrum of either data type; real_signal is 0 for complex data,
+// which have no conjugate pairs to fold.
+template <typename T>
+int32_t PcarSpectrum(const T* x, int32_t n, int32_t order, int32_t points, int32_t components,
+                     double fs, int32_t real_signal, double* amplitude, double* phase,
+                     double* frequency, int32_t* modes, double* spectrum, double* f0, double* df,
+                     double* fit_error) {
+  constexpr bool cx = std::is_same_v<T, Complex>;
+  const StatusCode check =
+      SpectrumCheck(checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
+  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
+  const int32_t p = check == status::kOk ? order : 0;
+  const int32_t k = check == status::kOk ? components : 0;
+  SpectrumResult result{0.0, 0.0, spectrum};
+  return RunPlain(
+      {check,
+       {x, n, cx},
+       {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
+       LinearPredictionWork(n, p, cx ? kCx : kReal, 8) + ModeFitWork(n, k) + SpectrumWork(N),
+       &fs,
+       {{amplitude, Bytes(k, kReal), 1, true},
+        {phase, Bytes(k, kReal), 0, true},
+        {frequency, Bytes(k, kReal), 0, true},
+        {spectrum, Bytes(N, kReal)}},
+       {{f0}, {df}, {fit_error, 2}},
+       modes},
+      [&](const void* xs) {
+        StatusCode s;
+        if constexpr (cx) {
+          s = PcarPowerSpectrumComplex(As<T>(xs), n, p, k, N, fs, amplitude, phase, frequency,
+                                       fit_error, &result, modes);
+        } else {
+          s = PcarPowerSpectrumReal(As<T>(xs), n, p, k, N, fs, real_signal, amplitude, phase,
+                                    frequency, fit_error, &result, modes);
+        }
+        *f0 = result.f0;
+        *df = result.df;
+        return s;
+      });
+}
+
 }  // namespace
 
 // ================================ the API ================================
@@ -619,31 +660,8 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t orde
                                         double* amplitude, double* phase, double* frequency,
                                         int32_t* modes, double* spectrum, double* f0, double* df,
                                         double* fit_error) {
-  const StatusCode check =
-      SpectrumCheck(checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
-  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
-  const int32_t p = check == status::kOk ? order : 0;
-  const int32_t k = check == status::kOk ? components : 0;
-  SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain({check,
-                   {x, n, false},
-                   {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
-                   LinearPredictionWork(n, p, kReal, 8) + ModeFitWork(n, k) + SpectrumWork(N),
-                   &fs,
-                   {{amplitude, Bytes(k, kReal), 1, true},
-                    {phase, Bytes(k, kReal), 0, true},
-                    {frequency, Bytes(k, kReal), 0, true},
-                    {spectrum, Bytes(N, kReal)}},
-                   {{f0}, {df}, {fit_error, 2}},
-                   modes},
-                  [&](const void* xs) {
-                    const StatusCode s = PcarPowerSpectrumReal(
-                        As<double>(xs), n, p, k, N, fs, real_signal, amplitude, phase, frequency,
-                        fit_error, &result, modes);
-                    *f0 = result.f0;
-                    *df = result.df;
-                    return s;
-                  });
+  return PcarSpectrum(x, n, order, points, components, fs, real_signal, amplitude, phase, frequency,
+                      modes, spectrum, f0, df, fit_error);
 }
 
 QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int32_t order,
@@ -651,31 +669,8 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int3
                                            double* amplitude, double* phase, double* frequency,
                                            int32_t* modes, double* spectrum, double* f0, double* df,
                                            double* fit_error) {
-  const StatusCode check =
-      SpectrumCheck(checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
-  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
-  const int32_t p = check == status::kOk ? order : 0;
-  const int32_t k = check == status::kOk ? components : 0;
-  SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain({check,
-                   {x, n, true},
-                   {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
-                   LinearPredictionWork(n, p, kCx, 8) + ModeFitWork(n, k) + SpectrumWork(N),
-                   &fs,
-                   {{amplitude, Bytes(k, kReal), 1, true},
-                    {phase, Bytes(k, kReal), 0, true},
-                    {frequency, Bytes(k, kReal), 0, true},
-                    {spectrum, Bytes(N, kReal)}},
-                   {{f0}, {df}, {fit_error, 2}},
-                   modes},
-                  [&](const void* xs) {
-                    const StatusCode s =
-                        PcarPowerSpectrumComplex(As<Complex>(xs), n, p, k, N, fs, amplitude, phase,
-                                                 frequency, fit_error, &result, modes);
-                    *f0 = result.f0;
-                    *df = result.df;
-                    return s;
-                  });
+  return PcarSpectrum(AsComplex(x), n, order, points, components, fs, 0, amplitude, phase,
+                      frequency, modes, spectrum, f0, df, fit_error);
 }
 
 }  // extern "C"
