@@ -133,20 +133,20 @@ TEST(PlainKrylov, SameStatusesAsTheDenseRoute) {
   }
 }
 
-// Each allocation failed in turn (once, from then on) and each LAPACK driver
-// call made to report INFO 1 or -1: a call fails exactly when its fault was
-// reached, with its outputs zeroed, and otherwise gives the clean result.
-TEST(PlainKrylov, EveryFaultIsReported) {
-  int64_t faulted = 0;
+// Runs call(complex) on either data type under every fault in turn: each
+// allocation failed once and from then on, each LAPACK driver call made to
+// report INFO 1 or -1. A call that did not reach its fault must give the clean
+// result (same(f, clean, where)); one that did must fail with zeroed outputs.
+template <typename Call, typename SameFn, typename ZeroedFn>
+void FaultSweep(Call call, SameFn same, ZeroedFn zeroed, int64_t* faulted) {
   for (const bool complex : {false, true}) {
-    const std::vector<double> x = Record(kModes, 240, complex);
-    const Fit clean = Pencil(x, complex, 80, 4, QDM_SOLVER_KRYLOV);
+    const auto clean = call(complex);
     ASSERT_EQ(clean.status, 0);
     for (int fault = 0; fault < 4; ++fault) {  // allocation once, from; INFO 1, -1
       for (int64_t k = 1;; ++k) {
         if (fault < 2) NumAllocFailAt(k, fault == 1);
         if (fault >= 2) LapackFailAt(k, fault == 3 ? -1 : 1, false);
-        const Fit f = Pencil(x, complex, 80, 4, QDM_SOLVER_KRYLOV);
+        const auto f = call(complex);
         const bool reached = (fault < 2 ? NumAllocAttempts() : LapackCalls()) >= k;
         NumAllocFailAt(0, false);
         LapackFailAt(0, 0, false);
@@ -154,15 +154,30 @@ TEST(PlainKrylov, EveryFaultIsReported) {
                                   std::to_string(fault) + " k " + std::to_string(k);
         ASSERT_EQ(NumAllocOutstanding(), 0) << where;
         if (!reached) {
-          EXPECT_TRUE(Same(f, clean)) << where;
+          same(f, clean, where);
           break;
         }
         EXPECT_LT(f.status, 0) << where;
-        EXPECT_TRUE(Zeroed(f)) << where;
-        ++faulted;
+        EXPECT_TRUE(zeroed(f, complex)) << where;
+        ++*faulted;
       }
     }
   }
+}
+
+// Each allocation failed in turn (once, from then on) and each LAPACK driver
+// call made to report INFO 1 or -1: a call fails exactly when its fault was
+// reached, with its outputs zeroed, and otherwise gives the clean result.
+TEST(PlainKrylov, EveryFaultIsReported) {
+  int64_t faulted = 0;
+  FaultSweep(
+      [](bool complex) {
+        return Pencil(Record(kModes, 240, complex), complex, 80, 4, QDM_SOLVER_KRYLOV);
+      },
+      [](const Fit& f, const Fit& clean, const std::string& where) {
+        EXPECT_TRUE(Same(f, clean)) << where;
+      },
+      [](const Fit& f, bool) { return Zeroed(f); }, &faulted);
   std::printf("Krylov route: %lld faulted calls, none reported as success\n",
               static_cast<long long>(faulted));
 }
@@ -253,33 +268,16 @@ TEST(PlainKrylov, PcarSameStatusesAsTheDenseRoute) {
 // call made to report INFO 1 or -1.
 TEST(PlainKrylov, PcarEveryFaultIsReported) {
   int64_t faulted = 0;
-  for (const bool complex : {false, true}) {
-    const std::vector<double> x = Record(kModes, 240, complex);
-    const Ar clean = Pcar(x, complex, 80, 4, QDM_SOLVER_KRYLOV);
-    ASSERT_EQ(clean.status, 0);
-    for (int fault = 0; fault < 4; ++fault) {
-      for (int64_t k = 1;; ++k) {
-        if (fault < 2) NumAllocFailAt(k, fault == 1);
-        if (fault >= 2) LapackFailAt(k, fault == 3 ? -1 : 1, false);
-        const Ar f = Pcar(x, complex, 80, 4, QDM_SOLVER_KRYLOV);
-        const bool reached = (fault < 2 ? NumAllocAttempts() : LapackCalls()) >= k;
-        NumAllocFailAt(0, false);
-        LapackFailAt(0, 0, false);
-        const std::string where = std::string(complex ? "complex" : "real") + " fault " +
-                                  std::to_string(fault) + " k " + std::to_string(k);
-        ASSERT_EQ(NumAllocOutstanding(), 0) << where;
-        if (!reached) {
-          EXPECT_EQ(f.status, clean.status) << where;
-          EXPECT_EQ(f.a, clean.a) << where;
-          EXPECT_EQ(f.z, clean.z) << where;
-          break;
-        }
-        EXPECT_LT(f.status, 0) << where;
-        EXPECT_TRUE(Zeroed(f, 80, complex)) << where;
-        ++faulted;
-      }
-    }
-  }
+  FaultSweep(
+      [](bool complex) {
+        return Pcar(Record(kModes, 240, complex), complex, 80, 4, QDM_SOLVER_KRYLOV);
+      },
+      [](const Ar& f, const Ar& clean, const std::string& where) {
+        EXPECT_EQ(f.status, clean.status) << where;
+        EXPECT_EQ(f.a, clean.a) << where;
+        EXPECT_EQ(f.z, clean.z) << where;
+      },
+      [](const Ar& f, bool complex) { return Zeroed(f, 80, complex); }, &faulted);
   std::printf("PCAR's Krylov route: %lld faulted calls, none reported as success\n",
               static_cast<long long>(faulted));
 }
