@@ -26,7 +26,8 @@ write_basic_package_version_file(${CMAKE_BINARY_DIR}/qdmConfigVersion.cmake
 install(FILES ${CMAKE_BINARY_DIR}/qdmConfig.cmake ${CMAKE_BINARY_DIR}/qdmConfigVersion.cmake
         DESTINATION ${QDM_CMAKE_DIR})
 
-# pkg-config: `pkg-config --cflags --libs qdm` gives the plain C API. The
+# pkg-config: `pkg-config --cflags --libs qdm` gives the plain C API, with a run
+# path to the library so that a program built from it runs from any prefix. The
 # paths are written relative to the .pc file, so an installed tree can move.
 file(RELATIVE_PATH QDM_PC_TO_PREFIX /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
 string(REGEX REPLACE "/$" "" QDM_PC_TO_PREFIX "${QDM_PC_TO_PREFIX}")

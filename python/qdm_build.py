@@ -7,7 +7,9 @@ found at build time in this order:
 2. the repository's fresh build, ../build/release/libqdm_api.so.1: copied;
 3. an installed library, by pkg-config (`qdm`) or the loader's cache: its
    path is recorded and loaded from there.
-With none of them the package falls back to the loader's search at import.
+With none of them the build stops with a message that says how to get one:
+a wheel that cannot load its library would install cleanly and fail only at
+`import qdm`.
 """
 import base64
 import hashlib
@@ -89,8 +91,17 @@ def get_requires_for_build_wheel(config_settings=None):
     return []
 
 
+NO_LIBRARY = f"""qdm: no {SONAME} to build the wheel with. Either
+  build it in this repository first:
+    cmake -S . -B build/release -DCMAKE_BUILD_TYPE=Release && cmake --build build/release --target qdm_api
+  or install qdm (cmake --install build/release, or the Debian package) so that
+  `pkg-config qdm` finds it, or name the library: QDM_LIBRARY=/path/to/{SONAME}"""
+
+
 def build_wheel(wheel_directory, config_settings=None, metadata_directory=None):
     bundle, record = _find_library()
+    if bundle is None and record is None:
+        raise RuntimeError(NO_LIBRARY)
     files = {}
     pkg = os.path.join(HERE, "qdm")
     for name in sorted(os.listdir(pkg)):

@@ -78,3 +78,14 @@ def test_the_wheel_and_the_sdist_carry_the_typing_marker(tmp_path, monkeypatch):
     with tarfile.open(tmp_path / backend.build_sdist(str(tmp_path))) as t:
         names = set(t.getnames())
     assert f"qdm-{backend.VERSION}/qdm/py.typed" in names
+
+
+def test_a_wheel_without_a_library_is_refused_with_the_way_to_get_one(tmp_path, monkeypatch):
+    monkeypatch.delenv("QDM_LIBRARY", raising=False)
+    backend = _backend()
+    monkeypatch.setattr(backend, "HERE", str(tmp_path))  # no ../build/release beside it
+    monkeypatch.setattr(backend, "_installed_library", lambda: None)
+    with pytest.raises(RuntimeError) as refused:
+        backend.build_wheel(str(tmp_path))
+    assert "QDM_LIBRARY=" in str(refused.value) and "--target qdm_api" in str(refused.value)
+    assert not list(tmp_path.glob("*.whl"))

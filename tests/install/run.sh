@@ -24,12 +24,20 @@ cmake -S "$src/tests/install/consumer" -B "$tmp/consumer" -DCMAKE_PREFIX_PATH="$
 cmake --build "$tmp/consumer" > /dev/null
 export PKG_CONFIG_PATH=$(dirname "$(find "$tmp/prefix" -name qdm.pc)")
 libdir=$(pkg-config --variable=libdir qdm)
+# The README's cc line as it stands: the .pc file's run path lets it run.
 cc -std=c99 -Wall -Werror "$src/examples/plain_covariance.c" $(pkg-config --cflags --libs qdm) \
-  -Wl,-rpath,"$libdir" -o "$tmp/pkgconfig_covariance"
+  -o "$tmp/pkgconfig_covariance"
+readelf -d "$tmp/pkgconfig_covariance" | grep -q "R.*PATH.*$libdir"
 
-"$build/examples/qdm_example" covariance "$record" --order 15 --json > "$tmp/host.json"
+# The example reads records of any length: the test record and one of 10,000
+# samples (a fixed pseudo-random walk, past any buffer a C example might keep).
+long=$tmp/long.csv
+awk 'BEGIN { s = 1; for (i = 0; i < 10000; ++i) { s = (s * 69069 + 1) % 4294967296;
+  printf "%.6f,%.6f\n", s / 4294967296 - 0.5, (s % 1000) / 1000 - 0.5 } }' > "$long"
+for input in "$record" "$long"; do
+"$build/examples/qdm_example" covariance "$input" --order 15 --json > "$tmp/host.json"
 for program in "$tmp/consumer/plain_covariance" "$tmp/pkgconfig_covariance"; do
-  "$program" "$record" 15 > "$tmp/plain.txt"
+  "$program" "$input" 15 > "$tmp/plain.txt"
   /usr/bin/python3 - "$tmp/host.json" "$tmp/plain.txt" <<'PY'
 import json, sys
 host = json.load(open(sys.argv[1]))["results"]
@@ -39,6 +47,7 @@ coeffs = [(float(l[1]), float(l[2])) for l in lines[1:]]
 flat = host["coefficients"]  # interleaved real and imaginary parts
 assert coeffs == list(zip(flat[0::2], flat[1::2])), "coefficients differ"
 PY
+done
 done
 echo "installed tree: find_package and pkg-config consumers match the host face"
 
