@@ -512,9 +512,32 @@ std::string PlotText(const std::string& text) {
   return out;
 }
 
+// A mode's label: its frequency to a tenth of a per cent of the Nyquist
+// frequency ("120.0 Hz" at 1 kHz, "0.120 Hz" at 1 Hz), never more digits.
+std::string FrequencyLabel(double f, double rate) {
+  const int decimals = std::clamp(2 - int(std::floor(std::log10(rate / 2.0))), 1, 9);
+  char b[64];
+  std::snprintf(b, sizeof b, "%.*f Hz", decimals, f);
+  return b;
+}
+
+// The labelled modes, by frequency, each with a label row 0..2: a label closer
+// than `gap` to the one before goes one row down, so neighbours never overlap.
+struct ModeLabel {
+  double frequency, amplitude;
+  int row;
+};
+std::vector<ModeLabel> Stagger(std::vector<ModeLabel> modes, double gap) {
+  std::stable_sort(modes.begin(), modes.end(),
+                   [](const ModeLabel& a, const ModeLabel& b) { return a.frequency < b.frequency; });
+  for (size_t i = 1; i < modes.size(); ++i)
+    if (modes[i].frequency - modes[i - 1].frequency < gap) modes[i].row = (modes[i - 1].row + 1) % 3;
+  return modes;
+}
+
 // Draws the spectrum (modes marked), the modes, or the poles; false: no gnuplot.
-// The script is fixed text; the title (which names the input) and every number
-// are data files it reads.
+// The script is fixed text; the title (which names the input), every number
+// and every label are data files it reads.
 bool Plot(const std::string& png, const Record& r) {
   const Json& j = r.json;
   const Json& res = j["results"];
@@ -528,46 +551,75 @@ bool Plot(const std::string& png, const Record& r) {
       {"title.txt", [&](std::FILE* f) { Writer(f) << PlotText(title) << "\n"; }},
       {"data.csv", [&](std::FILE* f) { WriteCsvTable(f, r, key); }},
   };
+  // The legend sits below the frame, clear of the data.
   std::string script =
       "set datafile separator \"\\t\"\n"
       "set datafile commentschars \"\"\n"
       "stats 'title.txt' using (T = strcol(1), 0) nooutput\n"
       "set title T noenhanced\n"
-      "set grid\nset key bottom right opaque box\n"
+      "set grid\nset key below horizontal\n"
       "set datafile separator ','\nset datafile columnheaders\n";
   const std::string terminal =
       "set terminal pngcairo size 1100,650 font 'DejaVu Sans,11'\nset output\n";
-  const Json modes = res.value("modes", Json::array());
+  const double rate = j["parameters"].value("rate_hz", 1.0);
+  std::vector<ModeLabel> labels;
+  if (res.contains("modes")) {
+    const Json& m = res["modes"];
+    for (size_t i = 0; i < m["frequency_hz"].size(); ++i)
+      labels.push_back({m["frequency_hz"][i].get<double>(), m["amplitude"][i].get<double>(), 0});
+  }
+  const auto writeLabels = [&](std::vector<ModeLabel> shown) {
+    files.push_back({"modes.csv", [shown, rate](std::FILE* f) {
+                       Writer w(f);
+                       w << "frequency_hz,amplitude,row,label\n";
+                       for (const ModeLabel& l : shown)
+                         w << Exact(l.frequency) << "," << Exact(l.amplitude) << ","
+                           << std::to_string(l.row) << "," << FrequencyLabel(l.frequency, rate)
+                           << "\n";
+                     }});
+  };
   if (key == "spectrum") {
-    const bool mirror = j["parameters"].value("real_signal", 0) == 1;
-    // A first pass on no terminal finds the y range the mode lines span.
+    const bool oneSided = res["spectrum"]["one_sided"].get<bool>();
+    // One-sided, a mode at a negative frequency is its positive twin's mirror image.
+    if (oneSided)
+      labels.erase(std::remove_if(labels.begin(), labels.end(),
+                                  [](const ModeLabel& l) { return l.frequency < 0.0; }),
+                   labels.end());
+    // A first pass on no terminal finds the y range; the labels get the band above it.
     script +=
         "set xlabel 'Frequency (Hz)'\nset ylabel 'Power (dB, peak = 0 dB)'\n"
-        "set yrange [-160<*:3]\nset terminal unknown\nplot 'data.csv' using 1:2 notitle\n"
-        "lo = GPVAL_Y_MIN\nhi = GPVAL_Y_MAX\nset yrange [lo:hi]\n" +
+        "set yrange [-160<*:*]\nset terminal unknown\nplot 'data.csv' using 1:2 notitle\n"
+        "lo = GPVAL_Y_MIN\nhi = GPVAL_Y_MAX\nband = (hi - lo) * 0.08\n"
+        "set yrange [lo:hi + 3.4 * band]\nset xrange [GPVAL_X_MIN:GPVAL_X_MAX]\n" +
         terminal + "plot 'data.csv' using 1:2 with lines lw 2 lc rgb '#1f5fa8' title 'AR spectrum'";
-    if (!modes.empty()) {
-      files.push_back({"modes.csv", [&](std::FILE* f) {
-                         Writer w(f);
-                         w << "frequency_hz\n";
-                         for (const Json& mode : modes) w << Exact(mode["frequency_hz"]) << "\n";
-                       }});
-      const std::string line = ":(lo):(0):(hi-lo) with vectors nohead dt 2 lw 1.5 lc rgb '#c0392b'";
-      script += ", 'modes.csv' using 1" + line + " title 'modes'";
-      if (mirror) script += ", 'modes.csv' using (-$1)" + line + " notitle";
+    if (!labels.empty()) {
+      writeLabels(Stagger(labels, (oneSided ? 0.5 : 1.0) * rate * 0.09));
       script +=
-          ", 'modes.csv' using 1:(hi):(sprintf('%.5g Hz', $1)) with labels left "
-          "offset 0.5,-0.8 tc rgb '#c0392b' notitle";
+          ", 'modes.csv' using 1:(lo):(0):(hi - lo) with vectors nohead dt 2 lw 1.5 "
+          "lc rgb '#c0392b' title 'fitted modes', 'modes.csv' using 1:(hi + band * (0.7 + $3)):4 "
+          "with labels center tc rgb '#c0392b' notitle";
     }
   } else if (key == "modes") {
-    script += "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n" + terminal +
+    double lo = 0.0, hi = 0.0, top = 0.0;
+    for (size_t i = 0; i < labels.size(); ++i) {
+      lo = i ? std::min(lo, labels[i].frequency) : labels[i].frequency;
+      hi = i ? std::max(hi, labels[i].frequency) : labels[i].frequency;
+      top = std::max(top, labels[i].amplitude);
+    }
+    writeLabels(Stagger(labels, std::max(hi - lo, 1e-300) * 0.1));
+    // Margins keep the outermost stems off the frame and leave rows for the labels.
+    script += "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n"
+              "set offsets graph 0.06, graph 0.06, graph 0.3, 0\n"
+              "stats 'modes.csv' using 2 nooutput\ntop = STATS_max\n" +
+              terminal +
               "plot 'data.csv' using 'frequency_hz':'amplitude' with impulses lw 3 lc rgb "
-              "'#1f5fa8' title 'modes', '' using 'frequency_hz':'amplitude':(sprintf('%.4g Hz', "
-              "column('frequency_hz'))) with labels offset 0,1 notitle";
+              "'#1f5fa8' title 'fitted modes', 'modes.csv' using 1:($2 + top * (0.05 + 0.08 * $3))"
+              ":4 with labels center notitle";
+    (void)top;
   } else {
     script +=
         "set parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
-        "set ylabel 'Imaginary'\n" +
+        "set ylabel 'Imaginary'\nset offsets graph 0.05, graph 0.05, graph 0.05, graph 0.05\n" +
         terminal +
         "plot cos(t), sin(t) with lines lc rgb 'gray' title 'unit circle', 'data.csv' "
         "using 1:2 with points pt 7 ps 1.5 lc rgb '#1f5fa8' title '" +
