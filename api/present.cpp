@@ -76,8 +76,7 @@ int32_t Layout(double* values, double* density, int32_t length, double fs, int32
 
 template <typename T>
 int32_t ArPsd(const T* a, int32_t order, double noise_variance, int32_t points, double fs,
-              int32_t onesided, double* frequency, double* spectrum, double* psd,
-              int32_t* count) {
+              int32_t onesided, double* frequency, double* spectrum, double* psd, int32_t* count) {
   if (count != nullptr) *count = 0;
   const int32_t N = qdm_spectrum_length(points);
   if (N == 0) return QDM_ERR_SPECTRUM_SIZE;
@@ -129,9 +128,8 @@ int32_t ArPsd(const T* a, int32_t order, double noise_variance, int32_t points, 
 
 }  // namespace
 
-QDM_PLAIN_API int32_t qdm_spectrum_layout(double* spectrum, double* psd, int32_t length,
-                                          double fs, int32_t onesided, double* frequency,
-                                          int32_t* count) {
+QDM_PLAIN_API int32_t qdm_spectrum_layout(double* spectrum, double* psd, int32_t length, double fs,
+                                          int32_t onesided, double* frequency, int32_t* count) {
   return Layout(spectrum, psd, length, fs, onesided, frequency, count);
 }
 
@@ -142,10 +140,10 @@ QDM_PLAIN_API int32_t qdm_ar_psd_real(const double* a, int32_t order, double noi
   return ArPsd(a, order, noise_variance, points, fs, onesided, frequency, spectrum, psd, count);
 }
 
-QDM_PLAIN_API int32_t qdm_ar_psd_complex(const qdm_complex* a, int32_t order,
-                                         double noise_variance, int32_t points, double fs,
-                                         int32_t onesided, double* frequency, double* spectrum,
-                                         double* psd, int32_t* count) {
+QDM_PLAIN_API int32_t qdm_ar_psd_complex(const qdm_complex* a, int32_t order, double noise_variance,
+                                         int32_t points, double fs, int32_t onesided,
+                                         double* frequency, double* spectrum, double* psd,
+                                         int32_t* count) {
   return ArPsd(reinterpret_cast<const Complex*>(a), order, noise_variance, points, fs, onesided,
                frequency, spectrum, psd, count);
 }

@@ -176,8 +176,8 @@ Json Column(const double* values, size_t n, size_t stride = 1) {
 
 // A table as an object of equal-length columns (pandas.DataFrame reads it as
 // it is); null columns are left out.
-Json Columns(std::initializer_list<const char*> names, std::vector<const double*> values,
-             size_t n, size_t stride = 1) {
+Json Columns(std::initializer_list<const char*> names, std::vector<const double*> values, size_t n,
+             size_t stride = 1) {
   Json t = Json::object();
   size_t c = 0;
   for (const char* name : names)
@@ -232,8 +232,10 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   if (o.realSignal && s.complex && (kModal & Bit(m)))
     throw Failure{kUsage, {}, "--real-signal applies to real data only, not to complex samples"};
   if (o.oneSided && s.complex)
-    throw Failure{kUsage, {}, "--one-sided applies to real data only: complex samples have a "
-                              "two-sided spectrum"};
+    throw Failure{kUsage,
+                  {},
+                  "--one-sided applies to real data only: complex samples have a "
+                  "two-sided spectrum"};
   const int32_t oneSided = !s.complex && !o.twoSided ? 1 : 0;
   Json par = Json::object(), res = Json::object();
   for (size_t i = 0; i < std::size(kIntOptions); ++i)
@@ -250,8 +252,8 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   const int32_t length = (kSpectra & Bit(m)) ? qdm_spectrum_length(points) : 0;
   if (m == kCovSpectrum) {
     // Null outputs: the library checks the sizes before room is made for them.
-    const int32_t sizes = s.complex ? qdm_ar_psd_complex(nullptr, p, 0.0, points, rate, 0,
-                                                         nullptr, nullptr, nullptr, nullptr)
+    const int32_t sizes = s.complex ? qdm_ar_psd_complex(nullptr, p, 0.0, points, rate, 0, nullptr,
+                                                         nullptr, nullptr, nullptr)
                                     : qdm_ar_psd_real(nullptr, p, 0.0, points, rate, oneSided,
                                                       nullptr, nullptr, nullptr, nullptr);
     if (sizes != QDM_ERR_NULL_POINTER) Check(sizes, "qdm_ar_psd", s.complex, r);
@@ -273,12 +275,12 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
       break;
     case kCovSpectrum:  // the model, then its density laid out
       QDM_TWIN(qdm_covariance, n, p, a, z, &variance);
-      CheckFailure(s.complex ? qdm_ar_psd_complex(reinterpret_cast<const qdm_complex*>(a.v.data()), p,
-                                           variance, points, rate, 0, axis.get(), db.get(),
-                                           psd.get(), &laid)
-                      : qdm_ar_psd_real(a.v.data(), p, variance, points, rate, oneSided,
-                                        axis.get(), db.get(), psd.get(), &laid),
-            "qdm_ar_psd", s.complex, r);
+      CheckFailure(s.complex ? qdm_ar_psd_complex(reinterpret_cast<const qdm_complex*>(a.v.data()),
+                                                  p, variance, points, rate, 0, axis.get(),
+                                                  db.get(), psd.get(), &laid)
+                             : qdm_ar_psd_real(a.v.data(), p, variance, points, rate, oneSided,
+                                               axis.get(), db.get(), psd.get(), &laid),
+                   "qdm_ar_psd", s.complex, r);
       break;
     case kProny:  // the real twins of these three take the real-signal flag
       Check(s.complex ? qdm_prony_complex(cx, n, p, rate, amp, phase, damping, freq, &count)
@@ -303,8 +305,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
           "qdm_spectrum_layout", s.complex, r);
       break;
   }
-  if ((kModal & Bit(m)) && !o.noSort)
-    SortModes(count, {amp, phase, damping, freq}, freq);
+  if ((kModal & Bit(m)) && !o.noSort) SortModes(count, {amp, phase, damping, freq}, freq);
   std::vector<double> perSecond(size_t(std::max(count, 0)));
   for (size_t i = 0; i < perSecond.size(); ++i) perSecond[i] = damping.v[i] * rate;
   if (m == kCovariance || m == kCovSpectrum) res["noise_variance"] = variance;
@@ -320,11 +321,11 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   if (kModal & Bit(m)) {
     res["mode_count"] = count;
     const bool damped = m != kPcarSpectrum;
-    res["modes"] = Columns({"frequency_hz", "amplitude", "phase_rad", "damping_per_sample",
-                            "damping_per_s"},
-                           {freq, amp, phase, damped ? damping.v.data() : nullptr,
-                            damped ? perSecond.data() : nullptr},
-                           size_t(count));
+    res["modes"] =
+        Columns({"frequency_hz", "amplitude", "phase_rad", "damping_per_sample", "damping_per_s"},
+                {freq, amp, phase, damped ? damping.v.data() : nullptr,
+                 damped ? perSecond.data() : nullptr},
+                size_t(count));
   }
   if (kSpectra & Bit(m)) {
     // The columns are filled in from the record's arrays as it is written.
@@ -528,10 +529,12 @@ struct ModeLabel {
   int row;
 };
 std::vector<ModeLabel> Stagger(std::vector<ModeLabel> modes, double gap) {
-  std::stable_sort(modes.begin(), modes.end(),
-                   [](const ModeLabel& a, const ModeLabel& b) { return a.frequency < b.frequency; });
+  std::stable_sort(modes.begin(), modes.end(), [](const ModeLabel& a, const ModeLabel& b) {
+    return a.frequency < b.frequency;
+  });
   for (size_t i = 1; i < modes.size(); ++i)
-    if (modes[i].frequency - modes[i - 1].frequency < gap) modes[i].row = (modes[i - 1].row + 1) % 3;
+    if (modes[i].frequency - modes[i - 1].frequency < gap)
+      modes[i].row = (modes[i - 1].row + 1) % 3;
   return modes;
 }
 
@@ -608,13 +611,14 @@ bool Plot(const std::string& png, const Record& r) {
     }
     writeLabels(Stagger(labels, std::max(hi - lo, 1e-300) * 0.1));
     // Margins keep the outermost stems off the frame and leave rows for the labels.
-    script += "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n"
-              "set offsets graph 0.06, graph 0.06, graph 0.3, 0\n"
-              "stats 'modes.csv' using 2 nooutput\ntop = STATS_max\n" +
-              terminal +
-              "plot 'data.csv' using 'frequency_hz':'amplitude' with impulses lw 3 lc rgb "
-              "'#1f5fa8' title 'fitted modes', 'modes.csv' using 1:($2 + top * (0.05 + 0.08 * $3))"
-              ":4 with labels center notitle";
+    script +=
+        "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n"
+        "set offsets graph 0.06, graph 0.06, graph 0.3, 0\n"
+        "stats 'modes.csv' using 2 nooutput\ntop = STATS_max\n" +
+        terminal +
+        "plot 'data.csv' using 'frequency_hz':'amplitude' with impulses lw 3 lc rgb "
+        "'#1f5fa8' title 'fitted modes', 'modes.csv' using 1:($2 + top * (0.05 + 0.08 * $3))"
+        ":4 with labels center notitle";
     (void)top;
   } else {
     script +=

@@ -439,17 +439,16 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int3
  *   outputs checks the sizes alone (::QDM_ERR_NULL_POINTER when they pass)
  *   before room for N values is set aside.
  * @{ */
-QDM_PLAIN_API int32_t qdm_spectrum_layout(double* spectrum, double* psd, int32_t length,
-                                          double fs, int32_t onesided, double* frequency,
-                                          int32_t* count);
+QDM_PLAIN_API int32_t qdm_spectrum_layout(double* spectrum, double* psd, int32_t length, double fs,
+                                          int32_t onesided, double* frequency, int32_t* count);
 QDM_PLAIN_API int32_t qdm_ar_psd_real(const double* a, int32_t order, double noise_variance,
                                       int32_t points, double fs, int32_t onesided,
                                       double* frequency, double* spectrum, double* psd,
                                       int32_t* count);
-QDM_PLAIN_API int32_t qdm_ar_psd_complex(const qdm_complex* a, int32_t order,
-                                         double noise_variance, int32_t points, double fs,
-                                         int32_t onesided, double* frequency, double* spectrum,
-                                         double* psd, int32_t* count);
+QDM_PLAIN_API int32_t qdm_ar_psd_complex(const qdm_complex* a, int32_t order, double noise_variance,
+                                         int32_t points, double fs, int32_t onesided,
+                                         double* frequency, double* spectrum, double* psd,
+                                         int32_t* count);
 /** @} */
 
 #ifdef __cplusplus
