@@ -603,23 +603,27 @@ bool Plot(const std::string& png, const Record& r) {
           "with labels center tc rgb '#c0392b' notitle";
     }
   } else if (key == "modes") {
-    double lo = 0.0, hi = 0.0, top = 0.0;
+    double lo = 0.0, hi = 0.0;
     for (size_t i = 0; i < labels.size(); ++i) {
       lo = i ? std::min(lo, labels[i].frequency) : labels[i].frequency;
       hi = i ? std::max(hi, labels[i].frequency) : labels[i].frequency;
-      top = std::max(top, labels[i].amplitude);
     }
-    writeLabels(Stagger(labels, std::max(hi - lo, 1e-300) * 0.1));
-    // Margins keep the outermost stems off the frame and leave rows for the labels.
+    // Margins keep the outermost stems off the frame; the labels stand in rows
+    // above the tallest stem, clear of every stem.
     script +=
         "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n"
-        "set offsets graph 0.06, graph 0.06, graph 0.3, 0\n"
-        "stats 'modes.csv' using 2 nooutput\ntop = STATS_max\n" +
-        terminal +
-        "plot 'data.csv' using 'frequency_hz':'amplitude' with impulses lw 3 lc rgb "
-        "'#1f5fa8' title 'fitted modes', 'modes.csv' using 1:($2 + top * (0.05 + 0.08 * $3))"
-        ":4 with labels center notitle";
-    (void)top;
+        "set offsets graph 0.06, graph 0.06, 0, 0\n";
+    std::string plot =
+        "plot 'data.csv' using 'frequency_hz':'amplitude' with impulses lw 3 "
+        "lc rgb '#1f5fa8' title 'fitted modes'";
+    if (!labels.empty()) {
+      writeLabels(Stagger(labels, std::max(hi - lo, 1e-300) * 0.1));
+      script +=
+          "stats 'modes.csv' using 2 nooutput\ntop = STATS_max > 0 ? STATS_max : 1\n"
+          "set yrange [0:top * 1.4]\n";
+      plot += ", 'modes.csv' using 1:(top * (1.1 + 0.09 * $3)):4 with labels center notitle";
+    }
+    script += terminal + plot;
   } else {
     script +=
         "set parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
