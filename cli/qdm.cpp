@@ -52,9 +52,10 @@ constexpr const char* kMethods[][2] = {
 
 // Everything the command line sets; unset parameters take the method's default.
 struct Options {
-  std::optional<int32_t> order, components, pencil, modes, upper, minOrder, points;
+  std::optional<int32_t> order, components, pencil, modes, upper, minOrder, nfft;
   std::optional<double> rate;
   bool realSignal = false, json = false, csv = false;
+  bool noSort = false, oneSided = false, twoSided = false, ignoreUnknown = false;
   std::string example, plot, columns, delimiter = ",", solver = "auto";
   uint64_t maxInputBytes = uint64_t{1} << 30;
   std::vector<std::string> files;
@@ -80,8 +81,10 @@ const IntOption kIntOptions[] = {
     {"--modes", "modes", &Options::modes, 6, "number of modes M [6]", Bit(kPencil)},
     {"--upper", "upper", &Options::upper, 16, "upper order L [16]", Bit(kMdl)},
     {"--min-order", "min_order", &Options::minOrder, 1, "smallest order tried [1]", Bit(kMdl)},
-    {"--points", "points", &Options::points, 512,
-     "spectrum points, rounded up to a power of two [512]", kSpectra},
+    {"--nfft,--points", "nfft", &Options::nfft, 512,
+     "spectrum length over the full circle, rounded up to a power of two (--points: its old "
+     "name) [512]",
+     kSpectra},
 };
 
 Signal Load(const std::string& path, const Options& o) {
@@ -112,9 +115,15 @@ struct Record {
   Json json;
   int32_t status = QDM_OK;
   std::string warning;
-  std::unique_ptr<double[]> spectrum;
+  // The spectrum's columns, in the order of kSpectrumColumns; psd may be null.
+  std::unique_ptr<double[]> frequency, spectrum, psd;
   size_t spectrumLength = 0;
+  const double* Column(size_t c) const {
+    return c == 0 ? frequency.get() : c == 1 ? spectrum.get() : psd.get();
+  }
 };
+// The spectrum's columns: CSV header, JSON key (the arrays are written as streams).
+constexpr const char* kSpectrumColumns[] = {"frequency_hz", "power_db", "psd_per_hz"};
 
 // A value the library refuses (an argument error, -424xx) is bad input, exit 1;
 // any other error status is a failed fit, exit 2. The message carries the status.
@@ -126,6 +135,11 @@ void Check(int32_t status, const char* function, bool complex, Record& r) {
   throw Failure{refused ? kUsage : kFailed, status,
                 function + std::string(complex ? "_complex" : "_real") + " returned " +
                     std::to_string(status) + ": " + qdm_status_text(status)};
+}
+
+// A second call of the same fit: only a failure replaces the first call's status.
+void CheckFailure(int32_t status, const char* function, bool complex, Record& r) {
+  if (status != QDM_OK) Check(status, function, complex, r);
 }
 
 // A small caller-allocated output that passes as either twin's pointer type.
@@ -153,29 +167,48 @@ std::unique_ptr<double[]> SpectrumOutput(int32_t length) {
 #define QDM_TWIN(fn, ...) \
   Check(s.complex ? fn##_complex(cx, __VA_ARGS__) : fn##_real(re, __VA_ARGS__), #fn, s.complex, r)
 
-// Rows of named columns: row i of column c is values[c][i * stride]; null columns are left out.
-Json Rows(std::initializer_list<const char*> names, std::vector<const double*> values, size_t n,
-          size_t stride = 1) {
-  Json t = Json::array();
-  for (size_t i = 0; i < n; ++i) {
-    Json row = Json::object();
-    size_t c = 0;
-    for (const char* name : names)
-      if (const double* column = values[c++]) row[name] = column[i * stride];
-    t.push_back(row);
-  }
+// n values, value i at values[i * stride], as a plain JSON array.
+Json Column(const double* values, size_t n, size_t stride = 1) {
+  Json column = Json::array();
+  for (size_t i = 0; i < n; ++i) column.push_back(values[i * stride]);
+  return column;
+}
+
+// A table as an object of equal-length columns (pandas.DataFrame reads it as
+// it is); null columns are left out.
+Json Columns(std::initializer_list<const char*> names, std::vector<const double*> values, size_t n,
+             size_t stride = 1) {
+  Json t = Json::object();
+  size_t c = 0;
+  for (const char* name : names)
+    if (const double* column = values[c++]) t[name] = Column(column, n, stride);
   return t;
 }
 
 // Complex values (pairs) with their modulus and frequency.
 Json Poles(const double* z, size_t n, double rate) {
-  Json t = Json::array();
-  for (size_t i = 0; i < 2 * n; i += 2)
-    t.push_back({{"real", z[i]},
-                 {"imag", z[i + 1]},
-                 {"modulus", std::hypot(z[i], z[i + 1])},
-                 {"frequency_hz", std::atan2(z[i + 1], z[i]) * rate / (2.0 * kPi)}});
+  Json t = Columns({"re", "im"}, {z, z + 1}, n, 2);
+  std::vector<double> modulus(n), frequency(n);
+  for (size_t i = 0; i < n; ++i) {
+    modulus[i] = std::hypot(z[2 * i], z[2 * i + 1]);
+    frequency[i] = std::atan2(z[2 * i + 1], z[2 * i]) * rate / (2.0 * kPi);
+  }
+  t["modulus"] = Column(modulus.data(), n);
+  t["frequency_hz"] = Column(frequency.data(), n);
   return t;
+}
+
+// The modes ordered by frequency (stable), every column alike.
+void SortModes(int32_t count, std::initializer_list<double*> columns, const double* frequency) {
+  std::vector<int32_t> order(size_t(std::max(count, 0)));
+  for (int32_t i = 0; i < count; ++i) order[size_t(i)] = i;
+  std::stable_sort(order.begin(), order.end(),
+                   [&](int32_t a, int32_t b) { return frequency[a] < frequency[b]; });
+  std::vector<double> moved(order.size());
+  for (double* column : columns) {
+    for (size_t i = 0; i < order.size(); ++i) moved[i] = column[order[i]];
+    std::copy(moved.begin(), moved.end(), column);
+  }
 }
 
 int32_t SolverOf(const Options& o) {
@@ -196,20 +229,40 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   if (!o.order && m == kProny) resolved[0] = 6;
   if (!o.pencil) resolved[2] = qdm_default_pencil(n);
   const auto [p, k, L, M, upper, minOrder, points] = resolved;
+  if (o.realSignal && s.complex && (kModal & Bit(m)))
+    throw Failure{kUsage, {}, "--real-signal applies to real data only, not to complex samples"};
+  if (o.oneSided && s.complex)
+    throw Failure{kUsage,
+                  {},
+                  "--one-sided applies to real data only: complex samples have a "
+                  "two-sided spectrum"};
+  const int32_t oneSided = !s.complex && !o.twoSided ? 1 : 0;
   Json par = Json::object(), res = Json::object();
   for (size_t i = 0; i < std::size(kIntOptions); ++i)
     if (kIntOptions[i].methods & Bit(m)) par[kIntOptions[i].key] = resolved[i];
   if (m != kMdl) par["rate_hz"] = rate;
   if ((kModal & Bit(m)) && !s.complex) par["real_signal"] = flag;
+  if (kModal & Bit(m)) par["sorted"] = o.noSort ? 0 : 1;
+  if (kSpectra & Bit(m)) par["one_sided"] = oneSided;
   if (m == kPencil || m == kPcar) par["solver"] = o.solver;
   // Outputs are sized by the library's own room for the size arguments and,
   // for a spectrum, its own length for the points asked.
   const size_t room = size_t(qdm_output_room(n, std::max({p, k, M}))) + 1;
   Array a(2 * room), z(2 * room), amp(room), phase(room), damping(room), freq(room);
   const int32_t length = (kSpectra & Bit(m)) ? qdm_spectrum_length(points) : 0;
+  if (m == kCovSpectrum) {
+    // Null outputs: the library checks the sizes before room is made for them.
+    const int32_t sizes = s.complex ? qdm_ar_psd_complex(nullptr, p, 0.0, points, rate, 0, nullptr,
+                                                         nullptr, nullptr, nullptr)
+                                    : qdm_ar_psd_real(nullptr, p, 0.0, points, rate, oneSided,
+                                                      nullptr, nullptr, nullptr, nullptr);
+    if (sizes != QDM_ERR_NULL_POINTER) Check(sizes, "qdm_ar_psd", s.complex, r);
+  }
   std::unique_ptr<double[]> db = (kSpectra & Bit(m)) ? SpectrumOutput(length) : nullptr;
+  std::unique_ptr<double[]> axis = (kSpectra & Bit(m)) ? SpectrumOutput(length) : nullptr;
+  std::unique_ptr<double[]> psd = m == kCovSpectrum ? SpectrumOutput(length) : nullptr;
   double variance = 0.0, mse = 0.0, f0 = 0.0, df = 0.0, fitError = 0.0;
-  int32_t count = 0, order = 0;
+  int32_t count = 0, order = 0, laid = 0;
   switch (m) {
     case kCovariance:
       QDM_TWIN(qdm_covariance, n, p, a, z, &variance);
@@ -220,8 +273,14 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     case kMdl:
       QDM_TWIN(qdm_mdl_order, n, upper, minOrder, &order);
       break;
-    case kCovSpectrum:
-      QDM_TWIN(qdm_covariance_psd, n, p, points, rate, db.get(), &f0, &df, &variance);
+    case kCovSpectrum:  // the model, then its density laid out
+      QDM_TWIN(qdm_covariance, n, p, a, z, &variance);
+      CheckFailure(s.complex ? qdm_ar_psd_complex(reinterpret_cast<const qdm_complex*>(a.v.data()),
+                                                  p, variance, points, rate, 0, axis.get(),
+                                                  db.get(), psd.get(), &laid)
+                             : qdm_ar_psd_real(a.v.data(), p, variance, points, rate, oneSided,
+                                               axis.get(), db.get(), psd.get(), &laid),
+                   "qdm_ar_psd", s.complex, r);
       break;
     case kProny:  // the real twins of these three take the real-signal flag
       Check(s.complex ? qdm_prony_complex(cx, n, p, rate, amp, phase, damping, freq, &count)
@@ -241,13 +300,19 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
                       : qdm_pcar_psd_real(re, n, p, points, k, rate, flag, amp, phase, freq, &count,
                                           db.get(), &f0, &df, &fitError),
             "qdm_pcar_psd", s.complex, r);
+      CheckFailure(
+          qdm_spectrum_layout(db.get(), nullptr, length, rate, oneSided, axis.get(), &laid),
+          "qdm_spectrum_layout", s.complex, r);
       break;
   }
+  if ((kModal & Bit(m)) && !o.noSort) SortModes(count, {amp, phase, damping, freq}, freq);
+  std::vector<double> perSecond(size_t(std::max(count, 0)));
+  for (size_t i = 0; i < perSecond.size(); ++i) perSecond[i] = damping.v[i] * rate;
   if (m == kCovariance || m == kCovSpectrum) res["noise_variance"] = variance;
   if (m == kCovariance || m == kPcar) {
     const double* c = a;
     res["coefficients"] =
-        s.complex ? Rows({"real", "imag"}, {c, c + 1}, p + 1, 2) : Rows({"value"}, {c}, p + 1);
+        s.complex ? Columns({"re", "im"}, {c, c + 1}, p + 1, 2) : Column(c, p + 1);
     res[m == kPcar ? "roots" : "poles"] = Poles(z, p, rate);
   }
   if (m == kMdl) res["order"] = order;
@@ -255,15 +320,24 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   if (m == kPencil) res["mse"] = mse;
   if (kModal & Bit(m)) {
     res["mode_count"] = count;
-    res["modes"] = Rows({"amplitude", "phase_rad", "damping", "frequency_hz"},
-                        {amp, phase, m == kPcarSpectrum ? nullptr : damping.v.data(), freq}, count);
+    const bool damped = m != kPcarSpectrum;
+    res["modes"] =
+        Columns({"frequency_hz", "amplitude", "phase_rad", "damping_per_sample", "damping_per_s"},
+                {freq, amp, phase, damped ? damping.v.data() : nullptr,
+                 damped ? perSecond.data() : nullptr},
+                size_t(count));
   }
   if (kSpectra & Bit(m)) {
-    // "db" is filled in from r.spectrum as the record is written.
-    res["spectrum"] = {{"f0_hz", f0}, {"df_hz", df}, {"length", length}, {"db", Json::array()}};
+    // The columns are filled in from the record's arrays as it is written.
+    res["spectrum"] = {{"one_sided", oneSided == 1}, {"length", laid}};
+    for (const char* key : kSpectrumColumns)
+      if (key != kSpectrumColumns[2] || psd) res["spectrum"][key] = Json::array();
+    r.frequency = std::move(axis);
     r.spectrum = std::move(db);
-    r.spectrumLength = size_t(length);
+    r.psd = std::move(psd);
+    r.spectrumLength = size_t(laid);
   }
+  (void)f0, (void)df;
   r.json = {{"input", input},
             {"method", kMethods[m][0]},
             {"signal", {{"type", s.complex ? "complex" : "real"}, {"samples", n}}},
@@ -311,24 +385,30 @@ std::string JsonNumber(double v) {
   return text;
 }
 
-// The record as JSON (indent < 0: one line), with the spectrum spliced into "db".
+// The record as JSON (indent < 0: one line), with the spectrum's columns
+// spliced into their empty arrays (the last of each name: the spectrum is the
+// record's last member, and a name inside a JSON string has its quotes escaped).
 void WriteJson(std::FILE* out, const Record& r, int indent) {
   const std::string text = r.json.dump(indent, ' ', false, kReplace);
   Writer w(out);
-  const std::string empty = indent < 0 ? "\"db\":[]" : "\"db\": []";
-  const size_t at = r.spectrum ? text.rfind(empty) : std::string::npos;
-  if (at == std::string::npos) {
-    w << text << "\n";
-    return;
+  size_t done = 0;
+  for (size_t c = 0; c < std::size(kSpectrumColumns) && r.spectrum; ++c) {
+    const std::string key = std::string("\"") + kSpectrumColumns[c] + "\":";
+    const std::string empty = key + (indent < 0 ? "[]" : " []");
+    const size_t at = text.rfind(empty);
+    const double* values = r.Column(c);
+    if (at == std::string::npos || at < done || values == nullptr) continue;
+    const size_t open = at + empty.size() - 1;  // the ']' of "[]"
+    const size_t lineStart = text.rfind('\n', at) + 1;
+    const std::string pad = indent < 0 ? "" : "\n" + std::string(at - lineStart, ' ');
+    const std::string inner = indent < 0 ? "" : pad + std::string(size_t(indent), ' ');
+    w << std::string_view(text).substr(done, open - done);
+    for (size_t i = 0; i < r.spectrumLength; ++i)
+      w << (i == 0 ? "" : ",") << inner << JsonNumber(values[i]);
+    w << (r.spectrumLength ? pad : "");
+    done = open;
   }
-  const size_t open = at + empty.size() - 1;  // the ']' of "[]"
-  const size_t lineStart = text.rfind('\n', at) + 1;
-  const std::string pad = indent < 0 ? "" : "\n" + std::string(at - lineStart, ' ');
-  const std::string inner = indent < 0 ? "" : pad + std::string(size_t(indent), ' ');
-  w << std::string_view(text).substr(0, open);
-  for (size_t i = 0; i < r.spectrumLength; ++i)
-    w << (i == 0 ? "" : ",") << inner << JsonNumber(r.spectrum[i]);
-  w << (r.spectrumLength ? pad : "") << std::string_view(text).substr(open) << "\n";
+  w << std::string_view(text).substr(done) << "\n";
 }
 
 std::string Brief(const Json& v) {
@@ -340,6 +420,17 @@ std::string Brief(const Json& v) {
 
 std::string Padded(const std::string& text, size_t width) {
   return std::string(width > text.size() ? width - text.size() : 1, ' ') + text;
+}
+
+// A table's columns: an object of equal-length arrays, or one plain array (a
+// real coefficient vector) as the column "value".
+std::vector<std::pair<std::string, const Json*>> TableColumns(const Json& table) {
+  std::vector<std::pair<std::string, const Json*>> columns;
+  if (table.is_array()) columns.emplace_back("value", &table);
+  if (table.is_object())
+    for (const auto& [name, column] : table.items())
+      if (column.is_array()) columns.emplace_back(name, &column);
+  return columns;
 }
 
 std::string Table(const Json& j) {
@@ -354,41 +445,52 @@ std::string Table(const Json& j) {
     if (v.is_primitive()) out += key + Padded(Brief(v), 30 - key.size()) + "\n";
   for (const auto& [key, v] : j["results"].items()) {
     if (key == "spectrum") {
-      out += "\nspectrum: " + v["length"].dump() + " values in dB from " + Brief(v["f0_hz"]) +
-             " Hz in steps of " + Brief(v["df_hz"]) + " Hz (--csv lists them)\n";
-    } else if (v.is_array()) {
-      out += "\n" + key + (v.empty() ? ": none\n" : "\n   #");
-      if (!v.empty())
-        for (const auto& [column, _] : v[0].items()) out += Padded(column, 17);
-      for (size_t i = 0; i < v.size(); ++i) {
-        out += "\n" + Padded(std::to_string(i), 4);
-        for (const Json& cell : v[i]) out += Padded(Brief(cell), 17);
-      }
-      out += v.empty() ? "" : "\n";
+      out += "\nspectrum: " + v["length"].dump() + " values, " +
+             (v["one_sided"].get<bool>() ? "one-sided (0 to fs/2)" : "two-sided (-fs/2 up)") +
+             ", in dB" + (v.contains("psd_per_hz") ? " and per Hz" : "") +
+             " (--csv or --json lists them)\n";
+      continue;
     }
+    const auto columns = TableColumns(v);
+    if (v.is_primitive() || columns.empty()) continue;
+    const size_t rows = columns[0].second->size();
+    out += "\n" + key + (rows == 0 ? ": none\n" : "\n   #");
+    if (rows == 0) continue;
+    for (const auto& [name, _] : columns) out += Padded(name, 19);
+    for (size_t i = 0; i < rows; ++i) {
+      out += "\n" + Padded(std::to_string(i), 4);
+      for (const auto& [_, column] : columns) out += Padded(Brief((*column)[i]), 19);
+    }
+    out += "\n";
   }
   return out;
 }
 
 // One table of the results as CSV, numbers exact: the spectrum (frequency_hz,
-// power_db) or an array of records (modes, coefficients, poles).
+// power_db and, for the covariance model, psd_per_hz) or a table of columns
+// (modes, coefficients, poles).
 void WriteCsvTable(std::FILE* out, const Record& r, const std::string& key) {
   Writer w(out);
   const Json& res = r.json["results"];
   if (key == "spectrum") {
-    const double f0 = res[key]["f0_hz"], df = res[key]["df_hz"];
-    w << "frequency_hz,power_db\n";
-    for (size_t i = 0; i < r.spectrumLength; ++i)
-      w << Exact(f0 + static_cast<double>(i) * df) << "," << Exact(r.spectrum[i]) << "\n";
+    const size_t columns = r.psd ? 3 : 2;
+    for (size_t c = 0; c < columns; ++c) w << (c ? "," : "") << kSpectrumColumns[c];
+    w << "\n";
+    for (size_t i = 0; i < r.spectrumLength; ++i) {
+      for (size_t c = 0; c < columns; ++c) w << (c ? "," : "") << Exact(r.Column(c)[i]);
+      w << "\n";
+    }
     return;
   }
-  for (size_t i = 0; i < res[key].size(); ++i) {
-    std::string header, row;
-    for (const auto& [column, v] : res[key][i].items()) {
-      header.append(",").append(column);
-      row.append(",").append(Exact(v));
-    }
-    w << (i == 0 ? header.substr(1) + "\n" : "") << row.substr(1) << "\n";
+  const auto columns = TableColumns(res[key]);
+  std::string line;
+  for (const auto& [name, _] : columns) line.append(",").append(name);
+  w << line.substr(1) << "\n";
+  const size_t rows = columns.empty() ? 0 : columns[0].second->size();
+  for (size_t i = 0; i < rows; ++i) {
+    line.clear();
+    for (const auto& [_, column] : columns) line.append(",").append(Exact((*column)[i]));
+    w << line.substr(1) << "\n";
   }
 }
 
@@ -411,9 +513,34 @@ std::string PlotText(const std::string& text) {
   return out;
 }
 
+// A mode's label: its frequency to a tenth of a per cent of the Nyquist
+// frequency ("120.0 Hz" at 1 kHz, "0.120 Hz" at 1 Hz), never more digits.
+std::string FrequencyLabel(double f, double rate) {
+  const int decimals = std::clamp(2 - int(std::floor(std::log10(rate / 2.0))), 1, 9);
+  char b[64];
+  std::snprintf(b, sizeof b, "%.*f Hz", decimals, f);
+  return b;
+}
+
+// The labelled modes, by frequency, each with a label row 0..2: a label closer
+// than `gap` to the one before goes one row down, so neighbours never overlap.
+struct ModeLabel {
+  double frequency, amplitude;
+  int row;
+};
+std::vector<ModeLabel> Stagger(std::vector<ModeLabel> modes, double gap) {
+  std::stable_sort(modes.begin(), modes.end(), [](const ModeLabel& a, const ModeLabel& b) {
+    return a.frequency < b.frequency;
+  });
+  for (size_t i = 1; i < modes.size(); ++i)
+    if (modes[i].frequency - modes[i - 1].frequency < gap)
+      modes[i].row = (modes[i - 1].row + 1) % 3;
+  return modes;
+}
+
 // Draws the spectrum (modes marked), the modes, or the poles; false: no gnuplot.
-// The script is fixed text; the title (which names the input) and every number
-// are data files it reads.
+// The script is fixed text; the title (which names the input), every number
+// and every label are data files it reads.
 bool Plot(const std::string& png, const Record& r) {
   const Json& j = r.json;
   const Json& res = j["results"];
@@ -427,46 +554,80 @@ bool Plot(const std::string& png, const Record& r) {
       {"title.txt", [&](std::FILE* f) { Writer(f) << PlotText(title) << "\n"; }},
       {"data.csv", [&](std::FILE* f) { WriteCsvTable(f, r, key); }},
   };
+  // The legend sits below the frame, clear of the data.
   std::string script =
       "set datafile separator \"\\t\"\n"
       "set datafile commentschars \"\"\n"
       "stats 'title.txt' using (T = strcol(1), 0) nooutput\n"
       "set title T noenhanced\n"
-      "set grid\nset key bottom right opaque box\n"
+      "set grid\nset key below horizontal\n"
       "set datafile separator ','\nset datafile columnheaders\n";
   const std::string terminal =
       "set terminal pngcairo size 1100,650 font 'DejaVu Sans,11'\nset output\n";
-  const Json modes = res.value("modes", Json::array());
+  const double rate = j["parameters"].value("rate_hz", 1.0);
+  std::vector<ModeLabel> labels;
+  if (res.contains("modes")) {
+    const Json& m = res["modes"];
+    for (size_t i = 0; i < m["frequency_hz"].size(); ++i)
+      labels.push_back({m["frequency_hz"][i].get<double>(), m["amplitude"][i].get<double>(), 0});
+  }
+  const auto writeLabels = [&](std::vector<ModeLabel> shown) {
+    files.push_back({"modes.csv", [shown, rate](std::FILE* f) {
+                       Writer w(f);
+                       w << "frequency_hz,amplitude,row,label\n";
+                       for (const ModeLabel& l : shown)
+                         w << Exact(l.frequency) << "," << Exact(l.amplitude) << ","
+                           << std::to_string(l.row) << "," << FrequencyLabel(l.frequency, rate)
+                           << "\n";
+                     }});
+  };
   if (key == "spectrum") {
-    const bool mirror = j["parameters"].value("real_signal", 0) == 1;
-    // A first pass on no terminal finds the y range the mode lines span.
+    const bool oneSided = res["spectrum"]["one_sided"].get<bool>();
+    // One-sided, a mode at a negative frequency is its positive twin's mirror image.
+    if (oneSided)
+      labels.erase(std::remove_if(labels.begin(), labels.end(),
+                                  [](const ModeLabel& l) { return l.frequency < 0.0; }),
+                   labels.end());
+    // A first pass on no terminal finds the y range; the labels get the band above it.
     script +=
         "set xlabel 'Frequency (Hz)'\nset ylabel 'Power (dB, peak = 0 dB)'\n"
-        "set yrange [-160<*:3]\nset terminal unknown\nplot 'data.csv' using 1:2 notitle\n"
-        "lo = GPVAL_Y_MIN\nhi = GPVAL_Y_MAX\nset yrange [lo:hi]\n" +
+        "set yrange [-160<*:*]\nset terminal unknown\nplot 'data.csv' using 1:2 notitle\n"
+        "lo = GPVAL_Y_MIN\nhi = GPVAL_Y_MAX\nband = (hi - lo) * 0.08\n"
+        "set yrange [lo:hi + 3.4 * band]\nset xrange [GPVAL_X_MIN:GPVAL_X_MAX]\n" +
         terminal + "plot 'data.csv' using 1:2 with lines lw 2 lc rgb '#1f5fa8' title 'AR spectrum'";
-    if (!modes.empty()) {
-      files.push_back({"modes.csv", [&](std::FILE* f) {
-                         Writer w(f);
-                         w << "frequency_hz\n";
-                         for (const Json& mode : modes) w << Exact(mode["frequency_hz"]) << "\n";
-                       }});
-      const std::string line = ":(lo):(0):(hi-lo) with vectors nohead dt 2 lw 1.5 lc rgb '#c0392b'";
-      script += ", 'modes.csv' using 1" + line + " title 'modes'";
-      if (mirror) script += ", 'modes.csv' using (-$1)" + line + " notitle";
+    if (!labels.empty()) {
+      writeLabels(Stagger(labels, (oneSided ? 0.5 : 1.0) * rate * 0.09));
       script +=
-          ", 'modes.csv' using 1:(hi):(sprintf('%.5g Hz', $1)) with labels left "
-          "offset 0.5,-0.8 tc rgb '#c0392b' notitle";
+          ", 'modes.csv' using 1:(lo):(0):(hi - lo) with vectors nohead dt 2 lw 1.5 "
+          "lc rgb '#c0392b' title 'fitted modes', 'modes.csv' using 1:(hi + band * (0.7 + $3)):4 "
+          "with labels center tc rgb '#c0392b' notitle";
     }
   } else if (key == "modes") {
-    script += "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n" + terminal +
-              "plot 'data.csv' using 'frequency_hz':'amplitude' with impulses lw 3 lc rgb "
-              "'#1f5fa8' title 'modes', '' using 'frequency_hz':'amplitude':(sprintf('%.4g Hz', "
-              "column('frequency_hz'))) with labels offset 0,1 notitle";
+    double lo = 0.0, hi = 0.0;
+    for (size_t i = 0; i < labels.size(); ++i) {
+      lo = i ? std::min(lo, labels[i].frequency) : labels[i].frequency;
+      hi = i ? std::max(hi, labels[i].frequency) : labels[i].frequency;
+    }
+    // Margins keep the outermost stems off the frame; the labels stand in rows
+    // above the tallest stem, clear of every stem.
+    script +=
+        "set xlabel 'Frequency (Hz)'\nset ylabel 'Amplitude'\nset yrange [0:*]\n"
+        "set offsets graph 0.06, graph 0.06, 0, 0\n";
+    std::string plot =
+        "plot 'data.csv' using 'frequency_hz':'amplitude' with impulses lw 3 "
+        "lc rgb '#1f5fa8' title 'fitted modes'";
+    if (!labels.empty()) {
+      writeLabels(Stagger(labels, std::max(hi - lo, 1e-300) * 0.1));
+      script +=
+          "stats 'modes.csv' using 2 nooutput\ntop = STATS_max > 0 ? STATS_max : 1\n"
+          "set yrange [0:top * 1.4]\n";
+      plot += ", 'modes.csv' using 1:(top * (1.1 + 0.09 * $3)):4 with labels center notitle";
+    }
+    script += terminal + plot;
   } else {
     script +=
         "set parametric\nset trange [0:2*pi]\nset size ratio -1\nset xlabel 'Real'\n"
-        "set ylabel 'Imaginary'\n" +
+        "set ylabel 'Imaginary'\nset offsets graph 0.05, graph 0.05, graph 0.05, graph 0.05\n" +
         terminal +
         "plot cos(t), sin(t) with lines lc rgb 'gray' title 'unit circle', 'data.csv' "
         "using 1:2 with points pt 7 ps 1.5 lc rgb '#1f5fa8' title '" +
@@ -627,26 +788,45 @@ int Main(int argc, char** argv) {
       "files: any record failed), 3 an output that cannot be written.");
   Options o;
   std::vector<std::pair<CLI::App*, Method>> subs;
-  const char* const kIgnored = "Options of other methods (accepted and ignored)";
+  // The options each subcommand has that its method does not use.
+  std::vector<std::vector<CLI::Option*>> foreign(kPcarSpectrum + 1);
+  const char* const kIgnored = "Options of other methods (an error without --ignore-unknown)";
   for (int m = kCovariance; m <= kPcarSpectrum; ++m) {
     CLI::App* sub = app.add_subcommand(kMethods[m][0], kMethods[m][1]);
     subs.push_back({sub, Method(m)});
     const unsigned bit = Bit(Method(m));
+    const auto group = [&](CLI::Option* option, unsigned methods) {
+      option->group(methods & bit ? "Parameters" : kIgnored);
+      if (!(methods & bit)) foreign[size_t(m)].push_back(option);
+    };
     for (const IntOption& io : kIntOptions)
-      sub->add_option(io.flag, o.*io.field, io.help)
-          ->check(kNonEmpty)
-          ->group(io.methods & bit ? "Parameters" : kIgnored);
-    sub->add_option("--rate", o.rate, "sampling rate in Hz [1000 for the example, else 1]")
-        ->check(kNonEmpty)
-        ->group(m == kMdl ? kIgnored : "Parameters");
-    sub->add_option("--solver", o.solver,
-                    "how the pencil or pcar finds its singular triplets: auto, dense, or krylov "
-                    "(Lanczos over FFT products, for long records) [auto]")
-        ->check(CLI::IsMember({"auto", "dense", "krylov"}))
-        ->group(m == kPencil || m == kPcar ? "Parameters" : kIgnored);
-    sub->add_flag("--real-signal", o.realSignal,
-                  "real data: one mode per conjugate pair, at its non-negative frequency")
-        ->group(kModal & bit ? "Parameters" : kIgnored);
+      group(sub->add_option(io.flag, o.*io.field, io.help)->check(kNonEmpty), io.methods);
+    group(sub->add_option("--rate", o.rate, "sampling rate in Hz [1000 for the example, else 1]")
+              ->check(kNonEmpty),
+          ~Bit(kMdl));
+    group(sub->add_option("--solver", o.solver,
+                          "how the pencil or pcar finds its singular triplets: auto, dense, or "
+                          "krylov (Lanczos over FFT products, for long records) [auto]")
+              ->check(CLI::IsMember({"auto", "dense", "krylov"})),
+          Bit(kPencil) | Bit(kPcar));
+    group(sub->add_flag("--real-signal", o.realSignal,
+                        "real data: one mode per conjugate pair, at its non-negative frequency"),
+          kModal);
+    group(sub->add_flag("--no-sort", o.noSort,
+                        "modes in the library's order, not sorted by frequency"),
+          kModal);
+    CLI::Option* one =
+        sub->add_flag("--one-sided", o.oneSided,
+                      "spectrum from 0 to fs/2, the density doubled but at 0 and fs/2 (the "
+                      "default for real data; an error for complex)");
+    group(one, kSpectra);
+    group(sub->add_flag("--two-sided", o.twoSided,
+                        "spectrum from -fs/2 to fs/2 (always so for complex data)")
+              ->excludes(one),
+          kSpectra);
+    sub->add_flag("--ignore-unknown", o.ignoreUnknown,
+                  "accept and ignore options that do not apply to the method (for loops over "
+                  "methods)");
     sub->add_option("files", o.files, "CSV files; '-' or none: standard input");
     sub->add_option("--example", o.example, "fit the built-in example signal: real or complex")
         ->expected(0, 1)
@@ -674,7 +854,7 @@ int Main(int argc, char** argv) {
     sub->add_option("--jobs", o.jobs, "fit the files on N threads (0: one per core), JSON lines")
         ->check(kNonEmpty)
         ->check(CLI::Range(0, 1024));
-    sub->footer("Options of the other methods are accepted and ignored.");
+    sub->footer("An option of another method is an error, or ignored with --ignore-unknown.");
   }
   Method method = kCovariance;  // the first argument names it
   CLI::App* chosen = nullptr;
@@ -697,6 +877,11 @@ int Main(int argc, char** argv) {
   }
   const bool batch = o.files.size() > 1 || chosen->count("--jobs") > 0;
   std::string usage = MakeFormat(o);
+  for (const CLI::Option* option : foreign[method])
+    if (option->count() > 0 && !o.ignoreUnknown)
+      usage = option->get_name(false, true).substr(0, option->get_name(false, true).find(',')) +
+              " does not apply to " + kMethods[method][0] +
+              " (--ignore-unknown accepts it, for loops over methods)";
   if (!o.example.empty() && !o.files.empty()) usage = "--example takes no FILE";
   if (batch && (o.csv || !o.plot.empty())) usage = "--csv and --plot take one FILE, not --jobs";
   if (method == kMdl && !o.plot.empty()) usage = "--plot draws nothing for mdl";

@@ -54,8 +54,7 @@ def first_mode(fit):
 
 def strongest(fit, k):
     keep = np.argsort(-fit.amplitude)[:k]
-    return fit._replace(**{f: getattr(fit, f)[keep] for f in ("amplitude", "phase", "damping",
-                                                               "frequency")})
+    return fit._replace(**{f: getattr(fit, f)[keep] for f in fit._fields if f != "mse"})
 
 
 METHODS = {
@@ -99,9 +98,11 @@ for j, (ax, what) in enumerate(zip(axes, ("frequency (cycles/sample)^2", "dampin
     ax.set(xlabel="SNR (dB)", ylabel=f"MSE, {what}", title=("frequency" if j == 0 else "damping")
            + f" of mode 1 (f = {FREQ[0]}, alpha = {DAMP[0]})")
     ax.grid(True, which="both", alpha=0.3)
-axes[0].legend(fontsize=8)
+# The legend goes below both panels, clear of the curves.
+fig.legend(*axes[0].get_legend_handles_labels(), loc="lower center", ncol=4, fontsize=8,
+           frameon=False)
 fig.suptitle(f"qdm: two damped exponentials in white noise, n = {N}, {trials} trials per SNR",
              fontsize=10)
-fig.tight_layout()
+fig.tight_layout(rect=(0, 0.06, 1, 1))
 fig.savefig(out, dpi=100)
 print(f"wrote {out}")

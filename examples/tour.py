@@ -21,10 +21,11 @@ x = x + 0.05 * np.random.default_rng(2024).standard_normal(n)
 
 
 def pole_modes(poles):
-    """Frequency (Hz) and damping (per sample) of the poles in the upper half plane."""
+    """Frequency (Hz) and damping (1/s) of the three poles in the upper half plane
+    nearest the unit circle: the AR fits give poles, not modes."""
     z = poles[(poles.imag > 0)]
     z = z[np.argsort(-np.abs(z))][:3]
-    return np.angle(z) * fs / (2 * np.pi), np.log(np.abs(z))
+    return np.angle(z) * fs / (2 * np.pi), np.log(np.abs(z)) * fs
 
 
 order = qdm.mdl_order(x, max_order=40)
@@ -32,37 +33,40 @@ cov = qdm.covariance(x, order=12)
 pc = qdm.pcar(x, order=12, components=6)
 pr = qdm.prony(x, order=6, fs=fs, real_signal=True)
 mp = qdm.matrix_pencil(x, modes=6, fs=fs, real_signal=True)
-cs = qdm.covariance_psd(x, order=12, points=1024, fs=fs)
-ps = qdm.pcar_psd(x, order=12, components=6, points=1024, fs=fs, real_signal=True)
+cs = qdm.covariance_psd(x, order=12, nfft=1024, fs=fs)   # one-sided: x is real
+ps = qdm.pcar_psd(x, order=12, components=6, nfft=1024, fs=fs, real_signal=True)
 
 print(f"{n} samples at {fs:g} Hz; MDL order (matrix pencil, L = 40): {order}")
 print(f"{'method':16} {'frequency Hz':>12} {'damping/s':>10} {'amplitude':>10} {'phase':>7}")
 for f, a, d in truth:
     print(f"{'truth':16} {f:12.2f} {-d:10.2f} {a / 2:10.4f} {0:7.3f}")
-rows = [("prony", pr.frequency, pr.damping * fs, pr.amplitude, pr.phase),
-        ("matrix_pencil", mp.frequency, mp.damping * fs, mp.amplitude, mp.phase),
+# The modal fits sort their modes by frequency and give damping in 1/s with fs.
+rows = [("prony", pr.frequency, pr.damping_per_s, pr.amplitude, pr.phase),
+        ("matrix_pencil", mp.frequency, mp.damping_per_s, mp.amplitude, mp.phase),
         ("pcar_psd", ps.frequency, [np.nan] * len(ps.frequency), ps.amplitude, ps.phase)]
 for name, poles in (("covariance", cov.poles), ("pcar", pc.roots)):
     f, d = pole_modes(poles)
-    rows.append((name, f, d * fs, [np.nan] * len(f), [np.nan] * len(f)))
+    i = np.argsort(f)
+    rows.append((name, f[i], d[i], [np.nan] * len(f), [np.nan] * len(f)))
 for name, f, d, a, p in rows:
-    for i in np.argsort(f):
+    for i in range(len(f)):
         print(f"{name:16} {f[i]:12.2f} {d[i]:10.2f} {a[i]:10.4f} {p[i]:7.3f}")
 print("(amplitudes are |A| of x[t] = sum A z^t: half a real sinusoid's; "
       "the AR fits give poles only)")
 
-fig, ax = plt.subplots(figsize=(8, 4.2))
+fig, ax = plt.subplots(figsize=(8, 4.8))
 for s, label in ((cs, "covariance AR, order 12"), (ps, "principal-component AR, order 12, 6 components")):
-    keep = s.frequencies >= 0
-    ax.plot(s.frequencies[keep], s.spectrum[keep], label=label)
+    ax.plot(s.frequencies, s.spectrum, label=label)
 for f, *_ in truth:
     ax.axvline(f, color="0.8", lw=3, zorder=0)
-ax.plot(mp.frequency, np.full(len(mp.frequency), 2.0), "v", color="C2", label="matrix pencil modes")
-ax.plot(pr.frequency, np.full(len(pr.frequency), 5.0), "v", color="C3", label="Prony modes")
-ax.plot(ps.frequency, np.full(len(ps.frequency), 8.0), "v", color="C1", label="PCAR modes")
-ax.set(xlabel="frequency (Hz)", ylabel="power (dB, peak 0)", xlim=(0, fs / 2), ylim=(-70, 12),
+    ax.annotate(f"{f:.1f} Hz", (f, 13.5), ha="center", fontsize=8, color="0.4")
+for fit, y, color, label in ((mp, 2.0, "C2", "matrix pencil modes"), (pr, 5.0, "C3", "Prony modes"),
+                             (ps, 8.0, "C1", "PCAR modes")):
+    ax.plot(fit.frequency, np.full(len(fit.frequency), y), "v", color=color, label=label)
+ax.set(xlabel="frequency (Hz)", ylabel="power (dB, peak 0)", xlim=(0, fs / 2), ylim=(-70, 17),
        title="qdm: three damped sinusoids (grey: true frequencies)")
-ax.legend(loc="lower left", fontsize=8)
+ax.margins(x=0.02)
+ax.legend(loc="upper center", bbox_to_anchor=(0.5, -0.16), ncol=3, fontsize=8, frameon=False)
 fig.tight_layout()
 out = sys.argv[1] if len(sys.argv) > 1 else "docs/images/tour.png"
 fig.savefig(out, dpi=100)

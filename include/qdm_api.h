@@ -393,6 +393,64 @@ QDM_PLAIN_API int32_t qdm_pcar_psd_complex(const qdm_complex* x, int32_t n, int3
                                            double* fit_error);
 /** @} */
 
+/* ---------------------------------------------------------------------------- */
+/** @name Spectra laid out for their readers
+ * The frequency axis written out, a one-sided layout for real data, and an AR
+ * model's power spectral density beside its normalised dB. A two-sided
+ * spectrum of N values (N a power of two) runs from -fs/2 in steps of fs/N, as
+ * the *_psd functions above give it; the one-sided layout keeps its N/2 + 1
+ * values from 0 to fs/2 (the spectrum of real data is even), with a density
+ * doubled at every bin but 0 and fs/2, so that it sums (times fs/N) to the
+ * same power. (The fits above return their modes unsorted, in the order of
+ * their poles, or for PCAR nearest the unit circle first; the Python package
+ * and the tool sort them by frequency.)
+ *
+ * qdm_spectrum_layout: lays out a two-sided spectrum in place.
+ * @param spectrum   in/out: `length` values; one-sided: the first N/2 + 1 are set
+ * @param psd        in/out: a density on the same grid, or null
+ * @param length     N, even and >= 2
+ * @param fs         sampling rate in Hz, > 0
+ * @param onesided   non-zero: 0 to fs/2; zero: -fs/2 to fs/2 - fs/N as given
+ * @param frequency  out: room for `length` values, the frequency of each value
+ * @param count      out: values laid out, N/2 + 1 or N
+ *
+ * qdm_ar_psd_real/_complex: the spectrum of the AR model with coefficients
+ * a[0..order] (a[0] = 1, as the covariance and PCAR fits give them) and
+ * prediction-error variance sigma^2: the density sigma^2 / fs / |A(e^{j 2 pi f / fs})|^2
+ * in units of x^2/Hz (two-sided), and 10 log10 of the same shape with its peak
+ * at 0 dB, bit for bit the values qdm_covariance_psd gives for that model.
+ * @param a          order + 1 coefficients
+ * @param order      p >= 0, with qdm_spectrum_length(points) >= p + 1
+ * @param noise_variance sigma^2 >= 0 (0 with a null psd: dB only)
+ * @param points     requested points, 2 <= points <= 2^30; N = qdm_spectrum_length(points)
+ * @param fs         sampling rate in Hz, > 0
+ * @param onesided   non-zero: the one-sided layout (real coefficients only:
+ *                   ::QDM_ERR_OPTION for the complex twin)
+ * @param frequency,spectrum  out: room for N values each
+ * @param psd        out: room for N values, or null for dB only
+ * @param count      out: values written, N/2 + 1 (one-sided) or N
+ * @return ::QDM_OK; ::QDM_ERR_NULL_POINTER, ::QDM_ERR_SPECTRUM_SIZE,
+ *   ::QDM_ERR_ORDER, ::QDM_ERR_SPECTRUM_TOO_SHORT, ::QDM_ERR_SAMPLE_RATE,
+ *   ::QDM_ERR_NON_FINITE (fs, sigma^2 or a coefficient), ::QDM_ERR_OPTION
+ *   (sigma^2 negative, one-sided complex), ::QDM_ERR_WORK_LIMIT,
+ *   ::QDM_ERR_NO_MEMORY, ::QDM_ERR_NON_FINITE_RESULT (a pole on the unit
+ *   circle); on an error the outputs are zeroed and count is 0. The
+ *   pointers are checked after every other argument, so a call with null
+ *   outputs checks the sizes alone (::QDM_ERR_NULL_POINTER when they pass)
+ *   before room for N values is set aside.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_spectrum_layout(double* spectrum, double* psd, int32_t length, double fs,
+                                          int32_t onesided, double* frequency, int32_t* count);
+QDM_PLAIN_API int32_t qdm_ar_psd_real(const double* a, int32_t order, double noise_variance,
+                                      int32_t points, double fs, int32_t onesided,
+                                      double* frequency, double* spectrum, double* psd,
+                                      int32_t* count);
+QDM_PLAIN_API int32_t qdm_ar_psd_complex(const qdm_complex* a, int32_t order, double noise_variance,
+                                         int32_t points, double fs, int32_t onesided,
+                                         double* frequency, double* spectrum, double* psd,
+                                         int32_t* count);
+/** @} */
+
 #ifdef __cplusplus
 }
 #endif

@@ -18,11 +18,17 @@ Contiguous float64 and complex128 arrays are passed to the library as they
 are, without a copy, and the GIL is released during the fit.
 
 Modes follow the model x[t] = sum_i A_i z_i**t: amplitude |A_i|, phase
-arg(A_i) in radians, damping ln|z_i| per sample (negative when decaying; it
-stays per sample whatever ``fs`` is), frequency arg(z_i) fs / (2 pi), in Hz
-when ``fs`` is given and in cycles per sample with the default fs = 1.
-Spectra are in dB with the peak at 0 dB, on the axis ``frequencies`` =
--fs/2 + arange(N) fs/N, N the power of two not below ``points``.
+arg(A_i) in radians, damping ln|z_i| per sample (negative when decaying) and
+``damping_per_s`` = damping * fs, frequency arg(z_i) fs / (2 pi), in Hz when
+``fs`` is given and in cycles per sample with the default fs = 1. Modes come
+sorted by frequency (``sort=False``: in the library's order).
+
+Spectra come as scipy.signal.welch gives them: ``frequencies`` and, for the
+covariance model, ``psd`` in units of x**2/Hz, beside ``spectrum`` in dB with
+its peak at 0 dB. Real data gives one-sided spectra (0 to fs/2, N/2 + 1
+values) and complex data two-sided ones (-fs/2 + arange(N) fs/N), N the power
+of two not below ``nfft``; ``return_onesided=False`` asks real data for the
+two-sided form.
 
 Errors are `Error` subclasses carrying the library's status code; a
 rank-deficient least-squares solve inside a fit is a `RankDeficientWarning`.
@@ -191,6 +197,7 @@ class RankDeficientWarning(UserWarning):
 _NO_MEMORY = -20001
 _RANK_DEFICIENT = 20001
 _NON_FINITE_RESULT = -30001
+_NULL_POINTER = -42421
 
 
 def _check(status, function):
@@ -322,8 +329,9 @@ class PcarFit(NamedTuple):
 class PronyFit(NamedTuple):
     """Damped exponentials x[t] = sum_i A_i z_i**t, as `prony` returns them.
 
-    Each field is a float64 array with one value per mode reported, in the
-    order of the poles (not sorted).
+    Each field is a float64 array with one value per mode reported, sorted
+    by frequency (with sort=False: in the order of the poles); the i-th value
+    of every field belongs to the same mode.
 
     Attributes
     ----------
@@ -332,24 +340,29 @@ class PronyFit(NamedTuple):
     phase : ndarray
         arg(A_i) in radians, in (-pi, pi].
     damping : ndarray
-        ln|z_i| per sample, negative for a decaying mode. It is per sample
-        whatever fs is, not per second: multiply by fs for a rate in 1/s.
+        ln|z_i| per sample, negative for a decaying mode.
     frequency : ndarray
         arg(z_i) fs / (2 pi): in Hz when fs is given, in cycles per sample
         with the default fs = 1; in (-fs/2, fs/2], or [0, fs/2) with
         real_signal.
+    damping_per_s : ndarray
+        damping * fs: the decay rate in 1/s when fs is given (-10.0 is a
+        mode whose envelope falls by e every 0.1 s); per sample with the
+        default fs = 1.
     """
     amplitude: NDArray[_np.float64]
     phase: NDArray[_np.float64]
     damping: NDArray[_np.float64]
     frequency: NDArray[_np.float64]
+    damping_per_s: NDArray[_np.float64]
 
 
 class PencilFit(NamedTuple):
     """Damped exponentials x[t] = sum_i A_i z_i**t, as `matrix_pencil` returns them.
 
-    The four mode fields are float64 arrays with one value per mode reported,
-    in the order of the poles (not sorted).
+    The mode fields are float64 arrays with one value per mode reported,
+    sorted by frequency (with sort=False: in the order of the poles); the
+    i-th value of every field belongs to the same mode.
 
     Attributes
     ----------
@@ -358,8 +371,7 @@ class PencilFit(NamedTuple):
     phase : ndarray
         arg(A_i) in radians, in (-pi, pi].
     damping : ndarray
-        ln|z_i| per sample, negative for a decaying mode. It is per sample
-        whatever fs is, not per second: multiply by fs for a rate in 1/s.
+        ln|z_i| per sample, negative for a decaying mode.
     frequency : ndarray
         arg(z_i) fs / (2 pi): in Hz when fs is given, in cycles per sample
         with the default fs = 1; in (-fs/2, fs/2], or [0, fs/2) with
@@ -367,30 +379,46 @@ class PencilFit(NamedTuple):
     mse : float
         Mean squared error of the fitted modes against the record, in the
         units of x squared.
+    damping_per_s : ndarray
+        damping * fs: the decay rate in 1/s when fs is given; per sample
+        with the default fs = 1.
     """
     amplitude: NDArray[_np.float64]
     phase: NDArray[_np.float64]
     damping: NDArray[_np.float64]
     frequency: NDArray[_np.float64]
     mse: float
+    damping_per_s: NDArray[_np.float64]
 
 
 class CovarianceSpectrum(NamedTuple):
     """The covariance AR model's power spectrum, as `covariance_psd` returns it.
 
+    Unpacks as ``f, Pxx, db, noise_variance``, the first two as
+    scipy.signal.welch(x, fs, scaling="density") returns them.
+
     Attributes
     ----------
-    frequencies : ndarray of float64, shape (N,)
-        The axis, -fs/2 + arange(N) fs/N: in Hz when fs is given, in cycles
-        per sample with the default fs = 1. N is the power of two not below
-        `points`.
-    spectrum : ndarray of float64, shape (N,)
-        10 log10(1/|A(f)|**2) in dB, shifted so that its peak is exactly 0 dB.
+    frequencies : ndarray of float64
+        The axis, in Hz when fs is given, in cycles per sample with the
+        default fs = 1: one-sided arange(N/2 + 1) fs/N (0 to fs/2), or
+        two-sided -fs/2 + arange(N) fs/N. N is the power of two not below
+        `nfft`.
+    psd : ndarray of float64, same shape
+        The power spectral density sigma**2 / fs / |A(f)|**2 in units of x
+        squared per Hz (per unit of fs), sigma**2 the noise variance;
+        one-sided it is doubled at every bin but 0 and fs/2, so that
+        ``psd.sum() * fs / N`` (or ``np.trapz(psd, frequencies)``) is the
+        model's power, near the record's variance.
+    spectrum : ndarray of float64, same shape
+        10 log10(1/|A(f)|**2) in dB, shifted so that its peak is exactly
+        0 dB (not doubled when one-sided).
     noise_variance : float
         The AR model's prediction-error variance (`CovarianceFit.noise_variance`),
-        in the units of x squared; it does not enter `spectrum`.
+        in the units of x squared.
     """
     frequencies: NDArray[_np.float64]
+    psd: NDArray[_np.float64]
     spectrum: NDArray[_np.float64]
     noise_variance: float
 
@@ -399,13 +427,16 @@ class PcarSpectrum(NamedTuple):
     """The principal-component AR spectrum and modes, as `pcar_psd` returns them.
 
     The mode fields are float64 arrays with one value per mode reported,
-    nearest the unit circle first. No damping is reported.
+    sorted by frequency (with sort=False: nearest the unit circle first).
+    No damping is reported, and no density: the principal-component model
+    has no prediction-error variance to scale it by.
 
     Attributes
     ----------
-    frequencies : ndarray of float64, shape (N,)
-        The axis, -fs/2 + arange(N) fs/N, as for `CovarianceSpectrum`.
-    spectrum : ndarray of float64, shape (N,)
+    frequencies : ndarray of float64
+        The axis, one-sided (0 to fs/2) or two-sided, as for
+        `CovarianceSpectrum`.
+    spectrum : ndarray of float64, same shape
         10 log10(1/|A(f)|**2) in dB, peak exactly 0 dB.
     amplitude : ndarray
         |A_i| by least squares, in the units of x.
@@ -432,8 +463,30 @@ def _modes(rows, k):
     return block, [base + i * stride for i in range(rows)]
 
 
-def _axis(f0, df, count):
-    return f0 + _np.arange(count) * df
+def _order(frequency, sort):
+    """The permutation that sorts modes by frequency (stable), or all as they are."""
+    return _np.argsort(frequency, kind="stable") if sort else slice(None)
+
+
+def _nfft(nfft, points, function):
+    """The spectrum length asked for: `nfft`, or its old name `points`."""
+    if points is None:
+        return 512 if nfft is None else _int(nfft)
+    if nfft is not None:
+        raise ArgumentError(None, "give nfft only (points is its old name)", function)
+    _warnings.warn(f"{function}: points= is now called nfft=, as in scipy.signal; the old "
+                   "name will be removed", DeprecationWarning, stacklevel=3)
+    return _int(points)
+
+
+def _onesided(return_onesided, is_complex, function):
+    """The layout flag: one-sided by default for real data, never for complex."""
+    if return_onesided is None:
+        return 0 if is_complex else 1
+    if return_onesided and is_complex:
+        raise ArgumentError(None, "return_onesided=True applies to real data only: the spectrum "
+                                  "of complex data is not symmetric", function)
+    return 1 if return_onesided else 0
 
 
 
@@ -622,7 +675,7 @@ def pcar(x: "ArrayLike", *, order: int, components: int,
 
 
 def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
-          real_signal: bool = False) -> PronyFit:
+          real_signal: bool = False, sort: bool = True) -> PronyFit:
     """Damped exponentials by Prony's method.
 
     Fits x[t] = sum_i A_i z_i**t with p = `order` poles z_i, the roots of a
@@ -637,22 +690,25 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
     order : int, 1 <= order <= floor(2n/3)
         The number of exponentials p (a real sinusoid takes two).
     fs : float, fs > 0, default 1.0
-        Sampling rate. It scales `frequency` only: Hz when given, cycles per
-        sample with the default. Damping stays per sample.
+        Sampling rate: `frequency` is in Hz and `damping_per_s` in 1/s when
+        given, both per sample with the default.
     real_signal : bool, default False
         Real data only: report one mode per conjugate pair, the poles with
         arg(z) in [0, pi), amplitude that of the one exponential (not
         doubled). False reports every pole, as for complex data.
+    sort : bool, default True
+        Sort the modes by frequency, every field alike. False keeps the
+        order of the poles, as the C API gives them.
 
     Returns
     -------
     PronyFit
-        Named tuple ``(amplitude, phase, damping, frequency)`` of float64
-        arrays, one value per mode, in the order of the poles (not sorted):
-        amplitude |A_i| (units of x), phase arg(A_i) in radians in
-        (-pi, pi], damping ln|z_i| per sample (negative when decaying; NOT
-        per second), frequency arg(z_i) fs / (2 pi) (Hz when fs is given,
-        else cycles per sample). p modes, or fewer with real_signal.
+        Named tuple ``(amplitude, phase, damping, frequency, damping_per_s)``
+        of float64 arrays, one value per mode, sorted by frequency: amplitude
+        |A_i| (units of x), phase arg(A_i) in radians in (-pi, pi], damping
+        ln|z_i| per sample (negative when decaying), frequency arg(z_i) fs /
+        (2 pi) (Hz when fs is given, else cycles per sample), damping_per_s
+        = damping * fs (1/s). p modes, or fewer with real_signal.
 
     Raises
     ------
@@ -696,12 +752,11 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
     >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
     ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
     >>> fit = qdm.prony(x, order=4, fs=1000.0, real_signal=True)
-    >>> i = np.argsort(fit.frequency)
-    >>> print(fit.frequency[i].round(6))    # Hz
+    >>> print(fit.frequency.round(6))        # Hz, sorted
     [100. 300.]
-    >>> print(fit.damping[i].round(6))      # per sample: -10 and -20 per second
-    [-0.01 -0.02]
-    >>> print(fit.amplitude[i].round(6), fit.phase[i].round(6))
+    >>> print(fit.damping_per_s.round(6))    # 1/s; fit.damping is per sample
+    [-10. -20.]
+    >>> print(fit.amplitude.round(6), fit.phase.round(6))
     [0.5  0.25] [ 0.5 -1. ]
     """
     a, c = _signal(x, "prony")
@@ -713,12 +768,15 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
     if not c:
         args += (flag,)
     _check(_fn["prony", _kind(c)](*args, *rows, _ct.byref(count)), "prony")
-    return PronyFit(*block[:, :count.value])
+    amplitude, phase, damping, frequency = block[:, :count.value]
+    i = _order(frequency, sort)
+    return PronyFit(amplitude[i], phase[i], damping[i], frequency[i], damping[i] * args[3])
 
 
 def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
                   fs: float = 1.0, real_signal: bool = False,
-                  solver: Literal["auto", "dense", "krylov"] = "auto") -> PencilFit:
+                  solver: Literal["auto", "dense", "krylov"] = "auto",
+                  sort: bool = True) -> PencilFit:
     """Damped exponentials by the matrix pencil method.
 
     Fits x[t] = sum_i A_i z_i**t: the poles z_i are the eigenvalues of the
@@ -739,8 +797,8 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
         The pencil parameter L, the data matrix's column count. None takes
         n // 3, the usual choice (n/3 to n/2 is the low-variance range).
     fs : float, fs > 0, default 1.0
-        Sampling rate. It scales `frequency` only: Hz when given, cycles per
-        sample with the default. Damping stays per sample.
+        Sampling rate: `frequency` is in Hz and `damping_per_s` in 1/s when
+        given, both per sample with the default.
     real_signal : bool, default False
         Real data only: report one mode per conjugate pair, the poles with
         arg(z) in [0, pi), amplitude that of the one exponential (not
@@ -753,17 +811,21 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
         "auto" takes the Krylov route for long records with M small beside
         L (at most L/4), the dense one otherwise. Both give the same modes
         to rounding wherever the M-th singular value stands clear of the next.
+    sort : bool, default True
+        Sort the modes by frequency, every field alike. False keeps the
+        order of the poles, as the C API gives them.
 
     Returns
     -------
     PencilFit
-        Named tuple ``(amplitude, phase, damping, frequency, mse)``. The four
-        mode arrays are float64, one value per mode, in the order of the
-        poles (not sorted): amplitude |A_i| (units of x), phase arg(A_i) in
+        Named tuple ``(amplitude, phase, damping, frequency, mse,
+        damping_per_s)``. The mode arrays are float64, one value per mode,
+        sorted by frequency: amplitude |A_i| (units of x), phase arg(A_i) in
         radians in (-pi, pi], damping ln|z_i| per sample (negative when
-        decaying; NOT per second), frequency arg(z_i) fs / (2 pi) (Hz when fs
-        is given, else cycles per sample). mse is the mean squared error of
-        the fitted modes against the record (units of x squared).
+        decaying), frequency arg(z_i) fs / (2 pi) (Hz when fs is given, else
+        cycles per sample), damping_per_s = damping * fs (1/s). mse is the
+        mean squared error of the fitted modes against the record (units of
+        x squared).
 
     Raises
     ------
@@ -811,12 +873,13 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
     >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
     ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
     >>> fit = qdm.matrix_pencil(x, modes=4, fs=1000.0, real_signal=True)
-    >>> i = np.argsort(fit.frequency)
-    >>> print(fit.frequency[i].round(6))    # Hz
+    >>> print(fit.frequency.round(6))        # Hz, sorted
     [100. 300.]
-    >>> print(fit.damping[i].round(6))      # per sample: -10 and -20 per second
+    >>> print(fit.damping_per_s.round(6))    # 1/s
+    [-10. -20.]
+    >>> print(fit.damping.round(6))          # per sample
     [-0.01 -0.02]
-    >>> print(fit.amplitude[i].round(6), fit.phase[i].round(6))
+    >>> print(fit.amplitude.round(6), fit.phase.round(6))
     [0.5  0.25] [ 0.5 -1. ]
     >>> fit.mse < 1e-20
     True
@@ -845,7 +908,9 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
     _check(_fn["matrix_pencil_solver", _kind(c)](*args, *rows, _ct.byref(count),
                                                   _ct.byref(mse)), "matrix_pencil")
     amplitude, phase, damping, frequency = block[:, :count.value]
-    return PencilFit(amplitude, phase, damping, frequency, mse.value)
+    i = _order(frequency, sort)
+    return PencilFit(amplitude[i], phase[i], damping[i], frequency[i], mse.value,
+                     damping[i] * args[4])
 
 
 def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int = 1) -> int:
@@ -927,13 +992,16 @@ def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int
     return order.value
 
 
-def covariance_psd(x: "ArrayLike", *, order: int, points: int = 512,
-                   fs: float = 1.0) -> CovarianceSpectrum:
-    """Power spectrum of the covariance-method AR model, in dB.
+def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
+                   fs: float = 1.0, return_onesided: Optional[bool] = None,
+                   points: Optional[int] = None) -> CovarianceSpectrum:
+    """Power spectral density of the covariance-method AR model.
 
-    Evaluates 1/|A(f)|**2 of the order-p model `covariance` fits, at N
-    frequencies from -fs/2 in steps of fs/N, N the power of two not below
-    `points`, and returns it in dB with its peak at exactly 0 dB.
+    Fits the order-p model of `covariance` (coefficients A, noise variance
+    sigma**2) and evaluates its density sigma**2 / fs / |A(f)|**2 at N
+    frequencies, N the power of two not below `nfft`, and its shape in dB
+    with the peak at exactly 0 dB. Real data gives the one-sided spectrum
+    from 0 to fs/2, as scipy.signal.welch does.
 
     Parameters
     ----------
@@ -942,34 +1010,41 @@ def covariance_psd(x: "ArrayLike", *, order: int, points: int = 512,
         other dtypes numpy casts safely to one of them are converted.
     order : int, 1 <= order <= floor(2n/3), order + 1 <= N
         The model order p.
-    points : int, 2 <= points <= 2**30, default 512
-        Frequencies asked for; N is the power of two not below it, and must
-        be at least order + 1.
+    nfft : int or None, 2 <= nfft <= 2**30, default None (512)
+        Frequencies asked for over the full circle; N is the power of two
+        not below it, and must be at least order + 1.
     fs : float, fs > 0, default 1.0
-        Sampling rate: the axis is in Hz when given, in cycles per sample
-        with the default.
+        Sampling rate: the axis is in Hz and the density per Hz when given,
+        in cycles per sample with the default.
+    return_onesided : bool or None, default None
+        True: the N/2 + 1 frequencies 0 to fs/2, the density doubled at all
+        but 0 and fs/2 (real data only); False: the N frequencies -fs/2 to
+        fs/2 - fs/N. None: one-sided for real data, two-sided for complex.
+    points : int or None, default None
+        The old name of `nfft`: still accepted, with a DeprecationWarning.
 
     Returns
     -------
     CovarianceSpectrum
-        Named tuple ``(frequencies, spectrum, noise_variance)``: the axis
-        -fs/2 + arange(N) fs/N (Hz when fs is given, else cycles per
-        sample), the spectrum in dB (peak 0 dB), both float64 of length N,
-        and the model's prediction-error variance (units of x squared),
-        which does not enter the spectrum.
+        Named tuple ``(frequencies, psd, spectrum, noise_variance)``: the
+        axis (Hz when fs is given, else cycles per sample), the density in
+        units of x squared per Hz, the shape in dB (peak 0 dB), float64
+        arrays of one length; and the model's prediction-error variance
+        sigma**2 (units of x squared).
 
     Raises
     ------
     DTypeError
         x has a dtype with no lossless conversion to float64 or complex128.
     ArgumentError
-        x is not 1-D (code None); x is empty (-42401); order out of range
-        (-42412); points below 2 or above 2**30 (-42417); fs not positive
+        x is not 1-D, return_onesided=True with complex data, or both nfft
+        and points given (code None); x is empty (-42401); order out of
+        range (-42412); nfft below 2 or above 2**30 (-42417); fs not positive
         (-42418); a NaN or infinite sample or fs (-42419); the fit would
         exceed the library's work-memory bound (-42420); N below order + 1
         (-42422).
     TypeError
-        order or points is not an integer.
+        order or nfft is not an integer.
     NonFiniteResultError
         A result would be NaN or infinite (-30001), e.g. a pole on the unit
         circle (a ramp) putting an infinity into the spectrum.
@@ -982,6 +1057,8 @@ def covariance_psd(x: "ArrayLike", *, order: int, points: int = 512,
     -----
     RankDeficientWarning
         The least-squares system was rank deficient; the results are complete.
+    DeprecationWarning
+        `points` was given.
 
     See Also
     --------
@@ -994,32 +1071,48 @@ def covariance_psd(x: "ArrayLike", *, order: int, points: int = 512,
     >>> t = np.arange(64)
     >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
     ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
-    >>> f, db, noise = qdm.covariance_psd(x, order=4, points=1000, fs=1000.0)
-    >>> print(len(f), f[0], f[1] - f[0])    # N = 1024, from -fs/2 in steps of fs/N
-    1024 -500.0 0.9765625
-    >>> print(db.max(), abs(f[np.argmax(db)]).round(1))    # the peak, in Hz
+    >>> f, Pxx, db, noise = qdm.covariance_psd(x, order=4, nfft=1000, fs=1000.0)
+    >>> print(len(f), f[0], f[1] - f[0], f[-1])    # N = 1024: 0 to fs/2 in steps of fs/N
+    513 0.0 0.9765625 500.0
+    >>> print(db.max(), f[np.argmax(Pxx)].round(1))    # the peak, in Hz
     0.0 99.6
+    >>> s = qdm.covariance_psd(x, order=4, nfft=1000, fs=1000.0, return_onesided=False)
+    >>> print(len(s.frequencies), s.frequencies[0])
+    1024 -500.0
     """
     a, c = _signal(x, "covariance_psd")
-    n, p, pts = a.shape[0], _int(order), _int(points)
-    N = _clib.qdm_spectrum_length(pts)
-    db = _np.empty(max(N, 1))
-    f0, df, nv = _ct.c_double(), _ct.c_double(), _ct.c_double()
-    _check(_fn["covariance_psd", _kind(c)](_addr(a), n, p, pts, _fs(fs), _addr(db),
-                                           _ct.byref(f0), _ct.byref(df), _ct.byref(nv)),
-           "covariance_psd")
-    return CovarianceSpectrum(_axis(f0.value, df.value, N), db, nv.value)
+    n, p = a.shape[0], _int(order)
+    pts = _nfft(nfft, points, "covariance_psd")
+    flag = _onesided(return_onesided, c, "covariance_psd")
+    m = _room(p, n)
+    coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
+    poles = _np.empty(max(m, 1), _C128)
+    nv = _ct.c_double()
+    _check(_fn["covariance", _kind(c)](_addr(a), n, p, _addr(coef), _addr(poles),
+                                       _ct.byref(nv)), "covariance_psd")
+    psd = _fn["ar_psd", _kind(c)]
+    # Null outputs: the sizes are checked before room for them is made.
+    probe = psd(None, p, nv.value, pts, _fs(fs), flag, None, None, None, None)
+    if probe != _NULL_POINTER:
+        _check(probe, "covariance_psd")
+    out = _np.empty((3, max(_clib.qdm_spectrum_length(pts), 1)))
+    count = _ct.c_int32()
+    _check(psd(_addr(coef), p, nv.value, pts, _fs(fs), flag, *(_addr(row) for row in out),
+               _ct.byref(count)), "covariance_psd")
+    f, db, psd = out[:, :count.value]
+    return CovarianceSpectrum(f, psd, db, nv.value)
 
 
-def pcar_psd(x: "ArrayLike", *, order: int, components: int, points: int = 512,
-             fs: float = 1.0, real_signal: bool = False) -> PcarSpectrum:
+def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int] = None,
+             fs: float = 1.0, real_signal: bool = False, return_onesided: Optional[bool] = None,
+             sort: bool = True, points: Optional[int] = None) -> PcarSpectrum:
     """Power spectrum of the principal-component AR model, and its strongest modes.
 
-    Evaluates 1/|A(f)|**2 of the model `pcar` fits at N
-    frequencies from -fs/2 in steps of fs/N, N the power of two not below
-    `points`, in dB with its peak at exactly 0 dB; and takes the
-    `components` roots nearest the unit circle as modes, their amplitudes
-    fitted to the record by least squares.
+    Evaluates 1/|A(f)|**2 of the model `pcar` fits at N frequencies, N the
+    power of two not below `nfft`, in dB with its peak at exactly 0 dB
+    (one-sided, 0 to fs/2, for real data); and takes the `components` roots
+    nearest the unit circle as modes, their amplitudes fitted to the record
+    by least squares.
 
     Parameters
     ----------
@@ -1031,39 +1124,49 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, points: int = 512,
         value is then valid).
     components : int, 1 <= components <= order
         Singular components kept, and the number of modes k reported.
-    points : int, 2 <= points <= 2**30, default 512
-        Frequencies asked for; N is the power of two not below it, and must
-        be at least order + 1.
+    nfft : int or None, 2 <= nfft <= 2**30, default None (512)
+        Frequencies asked for over the full circle; N is the power of two
+        not below it, and must be at least order + 1.
     fs : float, fs > 0, default 1.0
         Sampling rate: the axis and `frequency` are in Hz when given, in
         cycles per sample with the default.
     real_signal : bool, default False
         Real data only: of the k modes report those with arg(z) in [0, pi),
         one per conjugate pair. False reports all k, as for complex data.
+    return_onesided : bool or None, default None
+        True: the N/2 + 1 frequencies 0 to fs/2 (real data only); False: the
+        N frequencies -fs/2 to fs/2 - fs/N. None: one-sided for real data,
+        two-sided for complex.
+    sort : bool, default True
+        Sort the modes by frequency, every field alike. False keeps the
+        library's order, nearest the unit circle first.
+    points : int or None, default None
+        The old name of `nfft`: still accepted, with a DeprecationWarning.
 
     Returns
     -------
     PcarSpectrum
         Named tuple ``(frequencies, spectrum, amplitude, phase, frequency,
-        fit_error)``: the axis -fs/2 + arange(N) fs/N and the spectrum in dB
-        (peak 0 dB), float64 of length N; the modes nearest the unit circle
-        first, amplitude |A_i| (units of x), phase in radians in (-pi, pi],
-        frequency in Hz when fs is given, else cycles per sample; and the
-        amplitude fit's mean squared error (units of x squared). No damping.
+        fit_error)``: the axis and the spectrum in dB (peak 0 dB), float64
+        of one length; the modes sorted by frequency, amplitude |A_i| (units
+        of x), phase in radians in (-pi, pi], frequency in Hz when fs is
+        given, else cycles per sample; and the amplitude fit's mean squared
+        error (units of x squared). No damping, no density.
 
     Raises
     ------
     DTypeError
         x has a dtype with no lossless conversion to float64 or complex128.
     ArgumentError
-        x is not 1-D, or real_signal with complex data (code None); x is
-        empty (-42401); order negative or above floor(2n/3) (-42411);
-        components < 1 (-42412); components > order (-42413); points below
-        2 or above 2**30 (-42417); fs not positive (-42418); a NaN or
-        infinite sample or fs (-42419); the fit would exceed the library's
-        work-memory bound (-42420); N below order + 1 (-42422).
+        x is not 1-D, real_signal or return_onesided=True with complex data,
+        or both nfft and points given (code None); x is empty (-42401);
+        order negative or above floor(2n/3) (-42411); components < 1
+        (-42412); components > order (-42413); nfft below 2 or above 2**30
+        (-42417); fs not positive (-42418); a NaN or infinite sample or fs
+        (-42419); the fit would exceed the library's work-memory bound
+        (-42420); N below order + 1 (-42422).
     TypeError
-        order, components or points is not an integer.
+        order, components or nfft is not an integer.
     NonFiniteResultError
         A result would be NaN or infinite (-30001): a degenerate record.
     NumericError
@@ -1075,11 +1178,13 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, points: int = 512,
     -----
     RankDeficientWarning
         The amplitude fit was rank deficient; the results are complete.
+    DeprecationWarning
+        `points` was given.
 
     See Also
     --------
     pcar : the model itself.
-    covariance_psd : the covariance AR spectrum.
+    covariance_psd : the covariance AR spectrum, with a density.
 
     Examples
     --------
@@ -1090,14 +1195,15 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, points: int = 512,
     >>> t = np.arange(64) / 1000.0
     >>> x = np.cos(2 * np.pi * 100 * t + 0.5) + 0.5 * np.cos(2 * np.pi * 300 * t - 1.0)
     >>> s = qdm.pcar_psd(x, order=12, components=4, fs=1000.0, real_signal=True)
-    >>> print(len(s.frequencies), s.spectrum.max())
-    512 0.0
-    >>> i = np.argsort(s.frequency)
-    >>> print(s.frequency[i].round(3), s.amplitude[i].round(3), s.phase[i].round(3))
+    >>> print(len(s.frequencies), s.frequencies[-1], s.spectrum.max())
+    257 500.0 0.0
+    >>> print(s.frequency.round(3), s.amplitude.round(3), s.phase.round(3))
     [100. 300.] [0.5  0.25] [ 0.5 -1. ]
     """
     a, c = _signal(x, "pcar_psd")
-    n, p, k, pts = a.shape[0], _int(order), _int(components), _int(points)
+    n, p, k = a.shape[0], _int(order), _int(components)
+    pts = _nfft(nfft, points, "pcar_psd")
+    onesided = _onesided(return_onesided, c, "pcar_psd")
     N = _clib.qdm_spectrum_length(pts)
     db = _np.empty(max(N, 1))
     block, rows = _modes(3, _room(k, n))
@@ -1110,4 +1216,9 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, points: int = 512,
     _check(_fn["pcar_psd", _kind(c)](*args, *rows, _ct.byref(count), _addr(db),
                                      _ct.byref(f0), _ct.byref(df), _ct.byref(err)), "pcar_psd")
     amplitude, phase, frequency = block[:, :count.value]
-    return PcarSpectrum(_axis(f0.value, df.value, N), db, amplitude, phase, frequency, err.value)
+    axis, length = _np.empty(N), _ct.c_int32()
+    _check(_clib.qdm_spectrum_layout(_addr(db), None, N, args[5], onesided, _addr(axis),
+                                     _ct.byref(length)), "pcar_psd")
+    i = _order(frequency, sort)
+    return PcarSpectrum(axis[:length.value], db[:length.value], amplitude[i], phase[i],
+                        frequency[i], err.value)

@@ -59,6 +59,8 @@ _SIGNATURES: dict = {
     "mdl_order": [_I, _I, _P],
     "covariance_psd": [_I, _I, _D, _P, _P, _P, _P],
     "pcar_psd": [_I, _I, _I, _D, "R", _P, _P, _P, _P, _P, _P, _P, _P],
+    # (coefficients, order) in place of (x, n); both twins take the one-sided flag
+    "ar_psd": [_D, _I, _D, _I, _P, _P, _P, _P],
 }
 
 functions = {}
@@ -78,5 +80,7 @@ lib.qdm_output_room.restype = _I
 lib.qdm_output_room.argtypes = [_I, _I]
 lib.qdm_default_pencil.restype = _I
 lib.qdm_default_pencil.argtypes = [_I]
+lib.qdm_spectrum_layout.restype = _I
+lib.qdm_spectrum_layout.argtypes = [_P, _P, _I, _D, _I, _P, _P]
 lib.qdm_version.restype = ctypes.c_char_p
 lib.qdm_version.argtypes = []

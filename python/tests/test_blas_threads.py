@@ -69,7 +69,7 @@ def test_results_do_not_depend_on_numpy_threads():
         def fits():
             m = qdm.matrix_pencil(x, modes=4, pencil=130)
             c = qdm.covariance(x, order=12)
-            p = qdm.pcar_psd(x.real, order=20, components=6, points=256)
+            p = qdm.pcar_psd(x.real, order=20, components=6, nfft=256)
             return [np.asarray(v).tobytes() for r in (m, c, p) for v in r]
         put(1)
         one = fits()

@@ -41,21 +41,22 @@ stdin_stdout)
 import json, sys
 r = json.load(open(sys.argv[1]))
 assert r["status"] == 0 and r["signal"] == {"type": "complex", "samples": 64}, r
-assert len(r["results"]["coefficients"]) == 16 and "noise_variance" in r["results"], r
+assert len(r["results"]["coefficients"]["re"]) == 16 and "noise_variance" in r["results"], r
 PY
   expect 0 covariance --order 15 --csv - <"$data"
-  [ "$(head -1 out)" = "real,imag" ] && [ "$(wc -l <out)" = 17 ] || fail "CSV: $(head -3 out)"
+  [ "$(head -1 out)" = "re,im" ] && [ "$(wc -l <out)" = 17 ] || fail "CSV: $(head -3 out)"
   # The spectrum is written as a stream: its JSON and CSV forms hold the same doubles.
-  "$qdm" pcarspectrum "$data" --points 100 --json >spectrum.json || fail "spectrum JSON"
-  "$qdm" pcarspectrum "$data" --points 100 --csv >spectrum.csv || fail "spectrum CSV"
+  "$qdm" pcarspectrum "$data" --nfft 100 --json >spectrum.json || fail "spectrum JSON"
+  "$qdm" pcarspectrum "$data" --nfft 100 --csv >spectrum.csv || fail "spectrum CSV"
   $py - <<'PY' || fail "spectrum JSON and CSV differ"
 import csv, json
 s = json.load(open("spectrum.json"))["results"]["spectrum"]
 rows = list(csv.DictReader(open("spectrum.csv")))
-assert s["length"] == 128 == len(s["db"]) == len(rows), (s["length"], len(rows))
-assert all(isinstance(v, float) for v in s["db"]) and max(s["db"]) == 0.0, s["db"][:4]
-assert [float(r["power_db"]) for r in rows] == s["db"]
-assert float(rows[5]["frequency_hz"]) == s["f0_hz"] + 5 * s["df_hz"]
+assert s["length"] == 128 == len(s["power_db"]) == len(rows), (s["length"], len(rows))
+assert all(isinstance(v, float) for v in s["power_db"]) and max(s["power_db"]) == 0.0
+assert [float(r["power_db"]) for r in rows] == s["power_db"]
+assert [float(r["frequency_hz"]) for r in rows] == s["frequency_hz"]
+assert s["frequency_hz"][0] == -0.5 and s["frequency_hz"][5] == -0.5 + 5 / 128  # complex: two-sided
 PY
   # The installed tree moves as a whole: the tool finds its library beside it.
   rm -rf moved && cp -a "$prefix" moved && qdm=$PWD/moved/bin/qdm
@@ -68,7 +69,7 @@ jobs)
   # One bad file among good ones: its own error line, the others fitted, input order kept.
   cp "$data" a.csv && head -40 "$data" >b.csv && printf '1\n2\nxyz\n' >bad.csv
   cp "$data" $'latin\xff.csv' && printf '1\n2\n\xe9t\xe9\n' >l1.csv
-  expect 2 pencil --jobs 2 a.csv bad.csv b.csv --order 0
+  expect 2 pencil --jobs 2 a.csv bad.csv b.csv
   $py - out <<'PY' || fail "JSON lines: $(cat out)"
 import json, sys
 lines = [json.loads(l) for l in open(sys.argv[1])]
@@ -140,13 +141,17 @@ PY
 - covariance ragged.csv
 -42412 covariance --order 0 $data
 -42418 pencil --rate 0 $data
+-42417 covspectrum --nfft 1 $data
 -42417 covspectrum --points 1 $data
 -42411 pencil --pencil 60 $data
 - pencil --solver lanczos $data
 - pcar --solver lanczos $data
 EOF
   expect 1
-  expect 0 pencil --points 8 --upper 3 "$data"  # options of other methods are ignored
+  # An option of another method is an error that names it, unless --ignore-unknown.
+  expect 1 pencil --nfft 8 --upper 3 "$data"
+  grep -q -- "--nfft does not apply to pencil" err || fail "option not named: $(cat err)"
+  expect 0 pencil --nfft 8 --upper 3 --ignore-unknown "$data"
   # Both routes of the pencil give the same modes (7 significant digits shown).
   expect 0 pencil --solver dense --modes 4 --pencil 20 "$data" && sed 1,2d out >dense.txt
   expect 0 pencil --solver krylov --modes 4 --pencil 20 "$data" && sed 1,2d out >krylov.txt
@@ -156,7 +161,7 @@ EOF
   expect 0 pcar --solver krylov --order 30 --components 4 "$data" && sed 1,2d out >krylov.txt
   diff dense.txt krylov.txt >/dev/null || fail "PCAR routes differ: $(diff dense.txt krylov.txt)"
   # A missing or empty value names its option, whether or not the method uses it.
-  for option in --order --rate --points --column --delimiter; do
+  for option in --order --rate --nfft --column --delimiter; do
     expect 1 pencil "$data" $option
     grep -q -- "$option" err || fail "$option not named: $(cat err)"
   done
@@ -302,10 +307,10 @@ limits)
       || fail "qdm $args under 2 GB: exit $rc, $(head -c 300 err)"
     echo "ok: 2 GB: qdm $args -> $rc $(cat err)"
   done <<EOF
-covspectrum $data --points 67108864 --csv
-covspectrum $data --points 67108864 --json
-pcarspectrum $data --points 536870912
-covspectrum $data --points 1073741824
+covspectrum $data --nfft 67108864 --csv
+covspectrum $data --nfft 67108864 --json
+pcarspectrum $data --nfft 536870912
+covspectrum $data --nfft 1073741824
 pencil /dev/zero
 pencil -
 pencil /dev/zero --max-input-bytes 4EiB
@@ -316,14 +321,97 @@ EOF
   # A refused spectrum size costs no memory: the library refuses before it is touched.
   kib=$($py - "$qdm" "$data" <<'PY'
 import resource, subprocess, sys
-r = subprocess.run([sys.argv[1], "covspectrum", sys.argv[2], "--points", "536870912"],
+r = subprocess.run([sys.argv[1], "covspectrum", sys.argv[2], "--nfft", "536870912"],
                    capture_output=True, text=True)
 assert r.returncode == 1 and "-42420" in r.stderr, (r.returncode, r.stderr)
 print(resource.getrusage(resource.RUSAGE_CHILDREN).ru_maxrss)
 PY
-) || fail "--points 536870912: $kib"
-  [ "$kib" -lt 200000 ] || fail "--points 536870912 used $kib KiB"
-  echo "ok: --points 536870912 refused with -42420, peak $kib KiB"
+) || fail "--nfft 536870912: $kib"
+  [ "$kib" -lt 200000 ] || fail "--nfft 536870912 used $kib KiB"
+  echo "ok: --nfft 536870912 refused with -42420, peak $kib KiB"
+  ;;
+present)
+  # What a reader of the outputs meets: units, sorted modes, one-sided spectra, plain arrays.
+  $py - <<'PY'
+import numpy as np
+rng = np.random.default_rng(11)
+e, x = rng.standard_normal(60500), np.zeros(60500)
+for t in range(2, len(e)):   # AR(2), poles 0.9 exp(+-0.6j)
+    x[t] = e[t] + 1.8 * np.cos(0.6) * x[t - 1] - 0.81 * x[t - 2]
+np.savetxt("ar2.csv", x[500:])
+print(np.var(x[500:]), file=open("ar2.var", "w"))
+PY
+  # The density integrates over 0..fs/2 to the record's variance (5%), at any rate.
+  for rate in 1 250; do
+    expect 0 covspectrum ar2.csv --order 2 --nfft 4096 --rate $rate --json
+    $py - "$rate" <<'PY' || fail "density at rate $rate: $(head -c 300 out)"
+import json, sys
+r = json.load(open("out"))
+s, fs = r["results"]["spectrum"], float(sys.argv[1])
+assert r["parameters"]["one_sided"] == 1 and s["one_sided"] is True
+assert s["length"] == 2049 == len(s["frequency_hz"]) == len(s["psd_per_hz"]) == len(s["power_db"])
+assert s["frequency_hz"][0] == 0.0 and s["frequency_hz"][-1] == fs / 2
+power = sum(s["psd_per_hz"]) * fs / 4096
+variance = float(open("ar2.var").read())
+assert abs(power / variance - 1) < 0.05, (power, variance)
+PY
+  done
+  expect 0 covspectrum ar2.csv --order 2 --nfft 64 --csv
+  [ "$(head -1 out)" = frequency_hz,power_db,psd_per_hz ] && [ "$(wc -l <out)" = 34 ] \
+    || fail "one-sided CSV: $(head -2 out)"
+  expect 0 covspectrum ar2.csv --order 2 --nfft 64 --csv --two-sided
+  [ "$(sed -n 2p out | cut -d, -f1)" = -0.5 ] && [ "$(wc -l <out)" = 65 ] || fail "two-sided CSV"
+  expect 0 pcarspectrum --example --real-signal --csv
+  [ "$(head -1 out)" = frequency_hz,power_db ] && [ "$(wc -l <out)" = 258 ] || fail "PCAR CSV"
+  # Modes: sorted by frequency, damping per sample and per second, plain arrays;
+  # --no-sort gives the same rows in the library's order.
+  for method in pencil prony pcarspectrum; do
+    expect 0 $method --example --json && cp out sorted.json
+    expect 0 $method --example --json --no-sort && cp out raw.json
+    $py - $method <<'PY' || fail "$method modes: $(head -c 400 sorted.json)"
+import json, sys
+s, r = (json.load(open(f))["results"]["modes"] for f in ("sorted.json", "raw.json"))
+names = ["frequency_hz", "amplitude", "phase_rad"]
+if sys.argv[1] != "pcarspectrum":
+    names += ["damping_per_sample", "damping_per_s"]
+    assert all(abs(b - a * 1000) <= 1e-9 * abs(b)
+               for a, b in zip(s["damping_per_sample"], s["damping_per_s"]))
+assert list(s) == names and all(isinstance(v, float) for v in s["frequency_hz"]), s
+assert s["frequency_hz"] == sorted(s["frequency_hz"]) != r["frequency_hz"], s
+rows = lambda m: sorted(zip(*(m[k] for k in names)))
+assert rows(s) == rows(r)
+PY
+  done
+  expect 0 pencil --example --real-signal
+  grep -q 'damping_per_s' out && grep -q 'frequency_hz' out || fail "table columns: $(cat out)"
+  expect 0 covariance --example --order 4 --json
+  $py -c 'import json; c = json.load(open("out"))["results"]["coefficients"]; assert c[0] == 1.0 and len(c) == 5, c' \
+    || fail "real coefficients: $(head -c 300 out)"
+  expect 0 pcar --example complex --order 4 --components 2 --json
+  $py -c 'import json; c = json.load(open("out"))["results"]["coefficients"]; assert list(c) == ["re", "im"] and len(c["im"]) == 5, c' \
+    || fail "complex coefficients: $(head -c 300 out)"
+  # Options that do not fit the data or the method: exit 1, one line naming them.
+  while read -r named args; do
+    # shellcheck disable=SC2086
+    expect 1 $args
+    grep -q -- "$named" err || fail "$named not named: $(cat err)"
+  done <<'CASES'
+--real-signal pencil --example complex --real-signal
+--real-signal prony --example complex --real-signal
+--one-sided covspectrum --example complex --one-sided
+--one-sided pcarspectrum --example complex --one-sided
+--two-sided covspectrum --example --one-sided --two-sided
+--modes covariance --example --modes 4
+--no-sort covariance --example --no-sort
+--rate mdl --example --rate 100
+--solver prony --example --solver dense
+--one-sided pencil --example --one-sided
+--components covspectrum --example --components 2
+--plot mdl --example --plot m.png
+CASES
+  expect 0 covariance --example --modes 4 --no-sort --rate 100 --ignore-unknown
+  expect 0 covspectrum --example complex --two-sided
+  [ ! -e m.png ] || fail "mdl drew a picture"
   ;;
 *) fail "unknown case $case" ;;
 esac
