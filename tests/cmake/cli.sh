@@ -102,6 +102,33 @@ PY
   expect 0 covariance - a.csv --jobs 2 <"$data"
   [ "$(wc -l <out)" = 2 ] || fail "two lines expected"
   ;;
+readme)
+  # The first screen's tool commands and Python example run as written, from a
+  # copy of the repository's test data, with the installed tool and library.
+  mkdir -p tests && ln -sfn "$(dirname "$data")" tests/data
+  $py - "$readme" >commands.sh <<'PY'
+import sys
+text = open(sys.argv[1], encoding="utf-8").read()
+section = text.split("\n## The command-line tool\n", 1)[1].split("\n## ", 1)[0]
+lines = [l[4:] for l in section.splitlines() if l.startswith("    ")]
+assert len(lines) >= 4, lines
+print("set -e\n" + "\n".join(lines))
+PY
+  PATH=$prefix/bin:$PATH bash commands.sh >commands.out 2>err || fail "README commands: $(cat err)"
+  [ ! -s err ] || fail "README commands wrote to stderr: $(cat err)"
+  [ -s modes.png ] && [ "$(ls records/*.csv | wc -l)" = 2 ] || fail "README commands: no picture or records"
+  [ "$(wc -l <fits.jsonl)" = 2 ] || fail "README: one JSON line per record expected"
+  echo "ok: README tool commands: $(wc -l <commands.sh) lines"
+  $py - "$readme" >example.py <<'PY'
+import sys
+text = open(sys.argv[1], encoding="utf-8").read()
+print(text.split("\n## Python\n", 1)[1].split("```python\n", 1)[1].split("```", 1)[0])
+PY
+  lib=$(find "$prefix" -name 'libqdm_api.so.1' | head -1)
+  QDM_LIBRARY=$lib PYTHONPATH=$(dirname "$readme")/python $py example.py 2>err \
+    || fail "README Python example: $(cat err)"
+  echo "ok: README Python example"
+  ;;
 exit_codes)
   # Every command in README's exit-status table gives the code of its row.
   root=$(dirname "$readme")
