@@ -9,8 +9,8 @@
 #include <cstring>
 
 #include "estimation/estimation.h"
-
-namespace {
+#include "estimation/estimators.h"
+#include "numeric/numeric.h"
 
 // Forward block: b[i] = x[i+p], A[i][j] = x[i+p-1-j], i < q, j < p.
 template <typename T>
@@ -57,34 +57,38 @@ StatusCode Reverse(const T* src, T* dst, int32_t count) {
   return status::kOk;
 }
 
-}  // namespace
+template StatusCode BuildForwardMatrix(const double*, int32_t, int32_t, double*, double*);
+template StatusCode BuildForwardMatrix(const Complex*, int32_t, int32_t, Complex*, Complex*);
+template StatusCode BuildBackwardMatrix(const double*, int32_t, int32_t, double*, double*);
+template StatusCode BuildBackwardMatrix(const Complex*, int32_t, int32_t, Complex*, Complex*);
+template StatusCode Reverse(const double*, double*, int32_t);
+template StatusCode Reverse(const Complex*, Complex*, int32_t);
 
 StatusCode BuildForwardMatrixReal(const double* x, int32_t n, int32_t p, double* b, double* A) {
-  return BuildForwardMatrix<double>(x, n, p, b, A);
+  return BuildForwardMatrix(x, n, p, b, A);
 }
 StatusCode BuildForwardMatrixComplex(const Complex* x, int32_t n, int32_t p, Complex* b,
                                      Complex* A) {
-  return BuildForwardMatrix<Complex>(x, n, p, b, A);
+  return BuildForwardMatrix(x, n, p, b, A);
 }
 StatusCode BuildBackwardMatrixReal(const double* x, int32_t n, int32_t p, double* b, double* A) {
-  return BuildBackwardMatrix<double>(x, n, p, b, A);
+  return BuildBackwardMatrix(x, n, p, b, A);
 }
 StatusCode BuildBackwardMatrixComplex(const Complex* x, int32_t n, int32_t p, Complex* b,
                                       Complex* A) {
-  return BuildBackwardMatrix<Complex>(x, n, p, b, A);
+  return BuildBackwardMatrix(x, n, p, b, A);
 }
 
 StatusCode ReverseReal(const double* src, double* dst, int32_t count) {
-  return Reverse<double>(src, dst, count);
+  return Reverse(src, dst, count);
 }
 StatusCode ReverseComplex(const Complex* src, Complex* dst, int32_t count) {
-  return Reverse<Complex>(src, dst, count);
+  return Reverse(src, dst, count);
 }
 
-// No check of count: a count below 1 simply writes nothing.
+// No check of count: a count below 1 simply writes nothing (where VecSub
+// refuses it).
 StatusCode VecSubComplex(const Complex* u, const Complex* v, int32_t count, Complex* out) {
-  for (ptrdiff_t i = 0; i < count; ++i) {
-    out[i] = Complex(u[i].real() - v[i].real(), u[i].imag() - v[i].imag());
-  }
-  return status::kOk;
+  if (count < 1) return status::kOk;
+  return VecSub(u, v, count, out);
 }
