@@ -184,7 +184,8 @@ StatusCode ScaleRowsByInverse(T* A, int32_t rows, int32_t cols, const double* s)
     T* row = A + static_cast<size_t>(i) * static_cast<size_t>(cols);
     if constexpr (kIsComplex<T>) {
       // Reciprocal of s_i + 0i by Smith's division, then a plain complex product
-      // (no special handling of infinite or NaN parts).
+      // (no special handling of infinite or NaN parts): spelled out on purpose,
+      // as std::complex's division and product would recover NaN parts.
       double fr = 0.0, fi = 0.0;
       (void)ComplexDivide(1.0, 0.0, s[i], 0.0, &fr, &fi);
       for (int32_t j = 0; j < cols; ++j) {
