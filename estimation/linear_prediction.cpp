@@ -12,34 +12,33 @@
 #include "estimation/estimators.h"
 #include "numeric/numeric.h"
 
-// Forward block: b[i] = x[i+p], A[i][j] = x[i+p-1-j], i < q, j < p.
+// One prediction block, q = n - p rows: b[i] = x[i + bAt], A[i][j] =
+// x[i + aAt + aStep * j]. Every element is written: no clearing pass first.
 template <typename T>
-StatusCode BuildForwardMatrix(const T* x, int32_t n, int32_t p, T* b, T* A) {
+StatusCode BuildBlock(const T* x, int32_t n, int32_t p, ptrdiff_t bAt, ptrdiff_t aAt,
+                      ptrdiff_t aStep, T* b, T* A) {
   const ptrdiff_t rows = static_cast<ptrdiff_t>(n) - p;
   const ptrdiff_t cols = p;
   if (rows <= 0 || cols <= 0) return status::kOk;
-  // Every element is written below: no clearing pass first.
   for (ptrdiff_t i = 0; i < rows; ++i) {
-    b[i] = x[i + cols];
+    b[i] = x[i + bAt];
     T* row = A + i * cols;
-    for (ptrdiff_t j = 0; j < cols; ++j) row[j] = x[i + cols - 1 - j];
+    const T* first = x + i + aAt;
+    for (ptrdiff_t j = 0; j < cols; ++j) row[j] = first[aStep * j];
   }
   return status::kOk;
+}
+
+// Forward block: b[i] = x[i+p], A[i][j] = x[i+p-1-j], i < q, j < p.
+template <typename T>
+StatusCode BuildForwardMatrix(const T* x, int32_t n, int32_t p, T* b, T* A) {
+  return BuildBlock(x, n, p, p, ptrdiff_t{p} - 1, -1, b, A);
 }
 
 // Backward block: b[i] = x[i], A[i][j] = x[i+1+j], i < q, j < p.
 template <typename T>
 StatusCode BuildBackwardMatrix(const T* x, int32_t n, int32_t p, T* b, T* A) {
-  const ptrdiff_t rows = static_cast<ptrdiff_t>(n) - p;
-  const ptrdiff_t cols = p;
-  if (rows <= 0 || cols <= 0) return status::kOk;
-  // Every element is written below: no clearing pass first.
-  for (ptrdiff_t i = 0; i < rows; ++i) {
-    b[i] = x[i];
-    T* row = A + i * cols;
-    for (ptrdiff_t j = 0; j < cols; ++j) row[j] = x[i + 1 + j];
-  }
-  return status::kOk;
+  return BuildBlock(x, n, p, 0, 1, 1, b, A);
 }
 
 // In place (src == dst) works too: the ends are swapped towards the middle.
