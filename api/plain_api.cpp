@@ -355,6 +355,34 @@ int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t
     frequency, Bytes(m, kReal), 0, true                                     \
   }
 
+// Prony of either data type; real_signal is 0 for complex data, which have no
+// conjugate pairs to fold.
+template <typename T>
+int32_t Prony(const T* x, int32_t n, int32_t order, double fs, int32_t real_signal,
+              double* amplitude, double* phase, double* damping, double* frequency,
+              int32_t* modes) {
+  constexpr bool cx = std::is_same_v<T, Complex>;
+  const StatusCode check = checks::Prony(n, order, fs, kWide);
+  const int32_t p = check == status::kOk ? order : 0;
+  return RunPlain({check,
+                   {x, n, cx},
+                   {amplitude, phase, damping, frequency, modes},
+                   LinearPredictionWork(n, p, cx ? kCx : kReal, 4) + ModeFitWork(n, p),
+                   &fs,
+                   {QDM_MODE_OUTPUTS(p)},
+                   {},
+                   modes},
+                  [&](const void* xs) {
+                    if constexpr (cx) {
+                      return PronyComplex(As<T>(xs), n, p, fs, amplitude, phase, damping, frequency,
+                                          modes);
+                    } else {
+                      return PronyReal(As<T>(xs), n, p, fs, real_signal, amplitude, phase, damping,
+                                       frequency, modes);
+                    }
+                  });
+}
+
 // The pencil on either route; the automatic choice also sets the work estimate.
 template <typename T>
 int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, int32_t real_signal,
@@ -386,11 +414,11 @@ int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, 
                   [&](const void* xs) {
                     if constexpr (cx) {
                       return MatrixPencilSolverComplex(As<T>(xs), n, L, M, fs, route, amplitude,
-                                                       phase, damping, frequency, mse, modes);
+                                                       phase, damping, frequency, modes, mse);
                     } else {
                       return MatrixPencilSolverReal(As<T>(xs), n, L, M, fs, real_signal, route,
-                                                    amplitude, phase, damping, frequency, mse,
-                                                    modes);
+                                                    amplitude, phase, damping, frequency, modes,
+                                                    mse);
                     }
                   });
 }
@@ -400,6 +428,37 @@ int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, 
 StatusCode SpectrumCheck(StatusCode shared, int32_t points, int32_t order) {
   if (shared != status::kOk) return shared;
   return SpectrumLength(points) < int64_t{order} + 1 ? kSpectrumTooShort : status::kOk;
+}
+
+// The covariance spectrum of either data type.
+template <typename T>
+int32_t CovSpectrum(const T* x, int32_t n, int32_t order, int32_t points, double fs,
+                    double* spectrum, double* f0, double* df, double* noise_variance) {
+  constexpr bool cx = std::is_same_v<T, Complex>;
+  const StatusCode check =
+      SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
+  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
+  const int32_t p = check == status::kOk ? order : 0;
+  SpectrumResult result{0.0, 0.0, spectrum};
+  return RunPlain({check,
+                   {x, n, cx},
+                   {spectrum, f0, df, noise_variance},
+                   LinearPredictionWork(n, p, cx ? kCx : kReal, 4) + SpectrumWork(N),
+                   &fs,
+                   {{spectrum, Bytes(N, kReal)}},
+                   {{f0}, {df}, {noise_variance, 2}},
+                   nullptr},
+                  [&](const void* xs) {
+                    StatusCode s;
+                    if constexpr (cx) {
+                      s = CovPowerSpectrumComplex(As<T>(xs), n, p, N, fs, &result, noise_variance);
+                    } else {
+                      s = CovPowerSpectrumReal(As<T>(xs), n, p, N, fs, &result, noise_variance);
+                    }
+                    *f0 = result.f0;
+                    *df = result.df;
+                    return s;
+                  });
 }
 
 // The PCAR spectrum of either data type; real_signal is 0 for complex data,
@@ -432,10 +491,10 @@ int32_t PcarSpectrum(const T* x, int32_t n, int32_t order, int32_t points, int32
         StatusCode s;
         if constexpr (cx) {
           s = PcarPowerSpectrumComplex(As<T>(xs), n, p, k, N, fs, amplitude, phase, frequency,
-                                       fit_error, &result, modes);
+                                       modes, &result, fit_error);
         } else {
           s = PcarPowerSpectrumReal(As<T>(xs), n, p, k, N, fs, real_signal, amplitude, phase,
-                                    frequency, fit_error, &result, modes);
+                                    frequency, modes, &result, fit_error);
         }
         *f0 = result.f0;
         *df = result.df;
@@ -518,39 +577,13 @@ QDM_PLAIN_API int32_t qdm_pcar_solver_complex(const qdm_complex* x, int32_t n, i
 QDM_PLAIN_API int32_t qdm_prony_real(const double* x, int32_t n, int32_t order, double fs,
                                      int32_t real_signal, double* amplitude, double* phase,
                                      double* damping, double* frequency, int32_t* modes) {
-  const StatusCode check = checks::Prony(n, order, fs, kWide);
-  const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check,
-                   {x, n, false},
-                   {amplitude, phase, damping, frequency, modes},
-                   LinearPredictionWork(n, p, kReal, 4) + ModeFitWork(n, p),
-                   &fs,
-                   {QDM_MODE_OUTPUTS(p)},
-                   {},
-                   modes},
-                  [&](const void* xs) {
-                    return PronyReal(As<double>(xs), n, p, fs, real_signal, amplitude, phase,
-                                     damping, frequency, modes);
-                  });
+  return Prony(x, n, order, fs, real_signal, amplitude, phase, damping, frequency, modes);
 }
 
 QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t order, double fs,
                                         double* amplitude, double* phase, double* damping,
                                         double* frequency, int32_t* modes) {
-  const StatusCode check = checks::Prony(n, order, fs, kWide);
-  const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check,
-                   {x, n, true},
-                   {amplitude, phase, damping, frequency, modes},
-                   LinearPredictionWork(n, p, kCx, 4) + ModeFitWork(n, p),
-                   &fs,
-                   {QDM_MODE_OUTPUTS(p)},
-                   {},
-                   modes},
-                  [&](const void* xs) {
-                    return PronyComplex(As<Complex>(xs), n, p, fs, amplitude, phase, damping,
-                                        frequency, modes);
-                  });
+  return Prony(AsComplex(x), n, order, fs, 0, amplitude, phase, damping, frequency, modes);
 }
 
 // ---- matrix pencil ----------------------------------------------------------------------
@@ -608,51 +641,13 @@ QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int
 QDM_PLAIN_API int32_t qdm_covariance_psd_real(const double* x, int32_t n, int32_t order,
                                               int32_t points, double fs, double* spectrum,
                                               double* f0, double* df, double* noise_variance) {
-  const StatusCode check =
-      SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
-  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
-  const int32_t p = check == status::kOk ? order : 0;
-  SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain({check,
-                   {x, n, false},
-                   {spectrum, f0, df, noise_variance},
-                   LinearPredictionWork(n, p, kReal, 4) + SpectrumWork(N),
-                   &fs,
-                   {{spectrum, Bytes(N, kReal)}},
-                   {{f0}, {df}, {noise_variance, 2}},
-                   nullptr},
-                  [&](const void* xs) {
-                    const StatusCode s =
-                        CovPowerSpectrumReal(As<double>(xs), n, p, N, fs, &result, noise_variance);
-                    *f0 = result.f0;
-                    *df = result.df;
-                    return s;
-                  });
+  return CovSpectrum(x, n, order, points, fs, spectrum, f0, df, noise_variance);
 }
 
 QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n, int32_t order,
                                                  int32_t points, double fs, double* spectrum,
                                                  double* f0, double* df, double* noise_variance) {
-  const StatusCode check =
-      SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
-  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
-  const int32_t p = check == status::kOk ? order : 0;
-  SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain({check,
-                   {x, n, true},
-                   {spectrum, f0, df, noise_variance},
-                   LinearPredictionWork(n, p, kCx, 4) + SpectrumWork(N),
-                   &fs,
-                   {{spectrum, Bytes(N, kReal)}},
-                   {{f0}, {df}, {noise_variance, 2}},
-                   nullptr},
-                  [&](const void* xs) {
-                    const StatusCode s = CovPowerSpectrumComplex(As<Complex>(xs), n, p, N, fs,
-                                                                 &result, noise_variance);
-                    *f0 = result.f0;
-                    *df = result.df;
-                    return s;
-                  });
+  return CovSpectrum(AsComplex(x), n, order, points, fs, spectrum, f0, df, noise_variance);
 }
 
 QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t order, int32_t points,
