@@ -290,15 +290,18 @@ int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles, d
                   });
 }
 
+// The shared checks, then this face's own: a solver route it knows.
+StatusCode SolverCheck(StatusCode shared, int32_t solver) {
+  if (shared != status::kOk) return shared;
+  return solver < QDM_SOLVER_AUTO || solver > QDM_SOLVER_KRYLOV ? kBadSolver : status::kOk;
+}
+
 // PCAR on either route; the automatic choice also sets the work estimate.
 template <typename T>
 int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t solver, T* a,
              qdm_complex* roots) {
   constexpr bool cx = std::is_same_v<T, Complex>;
-  StatusCode check = checks::Pcar(n, order, components, kWide);
-  if (check == status::kOk && (solver < QDM_SOLVER_AUTO || solver > QDM_SOLVER_KRYLOV)) {
-    check = kBadSolver;
-  }
+  const StatusCode check = SolverCheck(checks::Pcar(n, order, components, kWide), solver);
   const size_t e = cx ? kCx : kReal;
   const int32_t p = check == status::kOk ? order : 0;
   const int32_t k = check == status::kOk ? components : 0;
@@ -384,15 +387,13 @@ int32_t Prony(const T* x, int32_t n, int32_t order, double fs, int32_t real_sign
 }
 
 // The pencil on either route; the automatic choice also sets the work estimate.
+// real_signal is 0 for complex data, which have no conjugate pairs to fold.
 template <typename T>
 int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, int32_t real_signal,
                int32_t solver, double* amplitude, double* phase, double* damping, double* frequency,
                int32_t* modes, double* mse) {
   constexpr bool cx = std::is_same_v<T, Complex>;
-  StatusCode check = checks::Pencil(n, pencil, order, fs, kWide);
-  if (check == status::kOk && (solver < QDM_SOLVER_AUTO || solver > QDM_SOLVER_KRYLOV)) {
-    check = kBadSolver;
-  }
+  const StatusCode check = SolverCheck(checks::Pencil(n, pencil, order, fs, kWide), solver);
   const int32_t M = check == status::kOk ? order : 0;
   const int32_t L = check == status::kOk ? pencil : 0;
   PencilSolver route = static_cast<PencilSolver>(check == status::kOk ? solver : 0);

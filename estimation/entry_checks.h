@@ -22,7 +22,9 @@ StatusCode Pcar(int32_t n, int32_t p, int32_t components, Bound bound = Bound::k
 StatusCode Pencil(int32_t n, int32_t L, int32_t M, double rate, Bound bound = Bound::kHost);
 // The MDL codes 1, 14 and 15 reach the host as -42401, -42414 and -42415.
 StatusCode Mdl(int32_t n, int32_t L, int32_t minOrder, Bound bound = Bound::kHost);
-// m above 2^30 has no 32-bit power of two above it and fails like m < 2.
+// m above 2^30 has no 32-bit power of two above it and fails like m < 2. An
+// order of 0 passes; the covariance spectrum refuses it later (kBadCount),
+// once the outputs are sized, as its fit would.
 StatusCode CovSpectrum(int32_t n, int32_t p, int32_t m, double rate, Bound bound = Bound::kHost);
 StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate,
                         Bound bound = Bound::kHost);
