@@ -22,10 +22,9 @@
 #include <cmath>
 #include <cstring>
 #include <initializer_list>
-#include <type_traits>
 
 #include "core/call_record.h"
-#include "core/types.h"
+#include "core/scalar.h"
 #include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
 #include "numeric/work.h"
@@ -269,7 +268,7 @@ const T* As(const void* samples) {
 
 template <typename T>
 int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles, double* variance) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
+  constexpr bool cx = kIsComplex<T>;
   const StatusCode check = checks::Covariance(n, p, kWide);
   const size_t e = cx ? kCx : kReal;
   const int32_t q = check == status::kOk ? p : 0;
@@ -300,7 +299,7 @@ StatusCode SolverCheck(StatusCode shared, int32_t solver) {
 template <typename T>
 int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t solver, T* a,
              qdm_complex* roots) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
+  constexpr bool cx = kIsComplex<T>;
   const StatusCode check = SolverCheck(checks::Pcar(n, order, components, kWide), solver);
   const size_t e = cx ? kCx : kReal;
   const int32_t p = check == status::kOk ? order : 0;
@@ -331,7 +330,7 @@ int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t s
 // On an error after the checks the order is 0, as on the host face.
 template <typename T>
 int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t* order) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
+  constexpr bool cx = kIsComplex<T>;
   const StatusCode check = checks::Mdl(n, max_order, min_order, kWide);
   const int32_t L = check == status::kOk ? max_order : 0;
   return RunPlain({check,
@@ -364,7 +363,7 @@ template <typename T>
 int32_t Prony(const T* x, int32_t n, int32_t order, double fs, int32_t real_signal,
               double* amplitude, double* phase, double* damping, double* frequency,
               int32_t* modes) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
+  constexpr bool cx = kIsComplex<T>;
   const StatusCode check = checks::Prony(n, order, fs, kWide);
   const int32_t p = check == status::kOk ? order : 0;
   return RunPlain({check,
@@ -392,7 +391,7 @@ template <typename T>
 int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, int32_t real_signal,
                int32_t solver, double* amplitude, double* phase, double* damping, double* frequency,
                int32_t* modes, double* mse) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
+  constexpr bool cx = kIsComplex<T>;
   const StatusCode check = SolverCheck(checks::Pencil(n, pencil, order, fs, kWide), solver);
   const int32_t M = check == status::kOk ? order : 0;
   const int32_t L = check == status::kOk ? pencil : 0;
@@ -435,7 +434,7 @@ StatusCode SpectrumCheck(StatusCode shared, int32_t points, int32_t order) {
 template <typename T>
 int32_t CovSpectrum(const T* x, int32_t n, int32_t order, int32_t points, double fs,
                     double* spectrum, double* f0, double* df, double* noise_variance) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
+  constexpr bool cx = kIsComplex<T>;
   const StatusCode check =
       SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
@@ -469,7 +468,7 @@ int32_t PcarSpectrum(const T* x, int32_t n, int32_t order, int32_t points, int32
                      double fs, int32_t real_signal, double* amplitude, double* phase,
                      double* frequency, int32_t* modes, double* spectrum, double* f0, double* df,
                      double* fit_error) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
+  constexpr bool cx = kIsComplex<T>;
   const StatusCode check =
       SpectrumCheck(checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
