@@ -352,26 +352,45 @@ int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t s
 }
 
 // On an error after the checks the order is 0, as on the host face.
+// The order search on the record divided by its root mean square. The score's
+// fixed constants (the starting score 10000 and the error floor 2.2e-16) then
+// weigh the fitting error against the record's own power, so the order does
+// not depend on the record's units: x and c x give the same order for any
+// c != 0, up to the rounding of the division. An all-zero record is searched
+// as it is.
+template <typename T>
+StatusCode MdlOfUnitPower(const T* x, int32_t n, int32_t L, int32_t min_order, int32_t* order) {
+  double power = 0.0;
+  for (int32_t i = 0; i < n; ++i) power += AbsSquared(x[i]);
+  const double rms = std::sqrt(power / n);
+  WorkArray<T> unit = AllocWorkUninit<T>(rms > 0.0 ? static_cast<size_t>(n) : 0);
+  if (rms > 0.0 && !unit) return status::kNoMemory;
+  if (rms > 0.0) {
+    for (int32_t i = 0; i < n; ++i) unit[i] = x[i] / rms;
+  }
+  const T* searched = rms > 0.0 ? unit.get() : x;
+  if constexpr (kIsComplex<T>) {
+    return MdlOrderComplex(searched, n, L, min_order, order);
+  } else {
+    return MdlOrderReal(searched, n, L, min_order, order);
+  }
+}
+
 template <typename T>
 int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t* order) {
   constexpr bool cx = kIsComplex<T>;
   const StatusCode check = checks::Mdl(n, max_order, min_order, kWide, last_error::Begin());
   const int32_t L = check == status::kOk ? max_order : 0;
-  return RunPlain({check,
-                   {x, n, cx},
-                   {{order, "order"}},
-                   PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L),
-                   nullptr,
-                   {},
-                   {},
-                   order},
-                  [&](const void* xs) {
-                    if constexpr (cx) {
-                      return MdlOrderComplex(As<T>(xs), n, L, min_order, order);
-                    } else {
-                      return MdlOrderReal(As<T>(xs), n, L, min_order, order);
-                    }
-                  });
+  return RunPlain(
+      {check,
+       {x, n, cx},
+       {{order, "order"}},
+       PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L) + Bytes(n, cx ? kCx : kReal),
+       nullptr,
+       {},
+       {},
+       order},
+      [&](const void* xs) { return MdlOfUnitPower(As<T>(xs), n, L, min_order, order); });
 }
 
 // The mode arrays of Prony and the pencil: m values each, counted by *modes.

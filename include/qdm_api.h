@@ -329,6 +329,11 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int
  * Scores each order m from `min_order` to r = min(n - L', L') (L' = L - 1 when
  * L = n/2, else L) by n ln(E) + 10 m ln(n), E the matrix-pencil fitting error,
  * and keeps the lowest; a fit with E < 2.2e-16 ends the search at once.
+ * Unlike the host face, which scores the record as given, this face divides
+ * the record by its root mean square first, so that those fixed constants
+ * (the starting score 10000 and the floor 2.2e-16) weigh the error against the
+ * record's own power: the record and the record times any constant get the
+ * same order.
  * @param x             n samples
  * @param n             number of samples, >= 1
  * @param max_order     upper order L, min_order < L <= floor(2n/3)

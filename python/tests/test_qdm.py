@@ -312,3 +312,19 @@ def test_pcar_gives_the_same_model_on_every_route(dtype):
         qdm.pcar(x, order=500, components=k, solver="lanczos")
     with pytest.raises(qdm.ArgumentError, match="solver"):
         qdm.pcar(x, order=500, components=k, solver=["dense"])
+
+
+@pytest.mark.parametrize("kind", ["real", "complex"])
+def test_the_order_search_does_not_depend_on_the_record_units(kind):
+    # Two damped sinusoids (four exponentials) in noise; before the record was
+    # brought to unit power, 1e-8 of it scored one exponential (the error floor
+    # stopped the search) and 1e12 of it none.
+    rng = np.random.default_rng(5)
+    t = np.arange(200)
+    x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
+         + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0)
+         + 0.05 * rng.standard_normal(200))
+    if kind == "complex":
+        x = x * np.exp(0.3j)
+    orders = {k: qdm.mdl_order(x * 10.0**k, max_order=40) for k in range(-10, 13)}
+    assert set(orders.values()) == {4}, orders
