@@ -191,6 +191,12 @@ StatusCode ModeErrors(const T* x, int32_t n, bool pairs, const ModeSet& m,
     }
     const StatusCode s = lapack::Tpqrt(ld, P, R.get(), P, rows.get(), ld);
     if (s != status::kOk) return s;
+    // A mode growing past the double range over the record: its model, and
+    // so the residual, overflows.
+    if (!Finite(rss)) return status::kNonFinite;
+  }
+  for (size_t j = 0; j < p * p; ++j) {
+    if (!Finite(R[j])) return status::kNonFinite;
   }
 
   // Column norms of the Jacobian are those of R; scale them to 1.

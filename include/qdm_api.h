@@ -508,9 +508,11 @@ QDM_PLAIN_API int32_t qdm_ar_psd_complex(const qdm_complex* a, int32_t order, do
  *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE (a sample or fs),
  *   ::QDM_ERR_MODE_VALUES (a NaN or infinite mode value, or with
  *   real_signal zero a mode without its partner), ::QDM_ERR_TOO_FEW_SAMPLES,
- *   ::QDM_ERR_NO_MEMORY, ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_ILLEGAL_ARGUMENT,
- *   ::QDM_ERR_NON_FINITE_RESULT (the model overflows, as a growing mode over
- *   a long record can).
+ *   ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE (the model or its Jacobian
+ *   overflows, as a growing mode over a long record can),
+ *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_ILLEGAL_ARGUMENT,
+ *   ::QDM_ERR_NON_FINITE_RESULT (an error or the noise variance beyond the
+ *   double range).
  * @{ */
 QDM_PLAIN_API int32_t qdm_mode_errors_real(const double* x, int32_t n, double fs,
                                            int32_t real_signal, int32_t modes,

@@ -238,6 +238,7 @@ class SingularBoundWarning(UserWarning):
 _NO_MEMORY = -20001
 _RANK_DEFICIENT = 20001
 _BOUND_SINGULAR = 20002
+_NO_BOUND = (-30001, -20068)  # a fit's error bars beyond the double range
 _NON_FINITE_RESULT = -30001
 _NULL_POINTER = -42421
 
@@ -604,7 +605,7 @@ def _stderr(a, c, fs, flag, block, count, function):
     status = _fn["mode_errors", _kind(c)](*args, count, *rows, *se, _ct.byref(variance))
     if status == 0:
         return out
-    if status == _BOUND_SINGULAR or -42499 <= status <= -42400 or status == _NON_FINITE_RESULT:
+    if status == _BOUND_SINGULAR or -42499 <= status <= -42400 or status in _NO_BOUND:
         _warnings.warn(SingularBoundWarning(status, status_text(status), function),
                        stacklevel=4)
         if status != _BOUND_SINGULAR:
@@ -1425,10 +1426,10 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
         real_signal False) a mode without its conjugate partner (-42425);
         n not above the real parameters (real data) or 2M (complex data)
         (-42424).
-    NonFiniteResultError
-        The model overflows (a growing mode over a long record) (-30001).
     NumericError
-        A LAPACK failure.
+        The model overflows, as a growing mode over a long record can
+        (-20068); a LAPACK failure; `NonFiniteResultError` (-30001) for an
+        error beyond the float64 range.
     OutOfMemoryError
         The library could not allocate its work memory (-20001).
 
