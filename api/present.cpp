@@ -6,10 +6,10 @@
 #include <cfloat>
 #include <cmath>
 #include <cstring>
-#include <type_traits>
 
-#include "core/types.h"
+#include "core/scalar.h"
 #include "estimation/estimation.h"
+#include "estimation/estimators.h"
 #include "numeric/work.h"
 #include "qdm_api.h"
 
@@ -25,13 +25,6 @@ int32_t Public(StatusCode s) { return s > 0 ? -42400 - s : s; }
 
 bool Finite(double v) { return std::fabs(v) <= DBL_MAX; }
 bool Finite(const Complex& v) { return Finite(v.real()) && Finite(v.imag()); }
-
-StatusCode Evaluate(double* a, int32_t m, double fs, int32_t N, SpectrumResult* r) {
-  return ArSpectrumReal(a, m, kReciprocal, fs, N, kNoWindow, r);
-}
-StatusCode Evaluate(Complex* a, int32_t m, double fs, int32_t N, SpectrumResult* r) {
-  return ArSpectrumComplex(a, m, kReciprocal, fs, N, kNoWindow, r);
-}
 
 // 1/|A(e^{jw})|^2 at w = 2 pi f / fs, by Horner's rule in z^-1.
 template <typename T>
@@ -84,7 +77,7 @@ int32_t ArPsd(const T* a, int32_t order, double noise_variance, int32_t points, 
   if (N < int64_t{order} + 1) return QDM_ERR_SPECTRUM_TOO_SHORT;
   if (!Finite(fs)) return QDM_ERR_NON_FINITE;
   if (!(fs > 0.0)) return QDM_ERR_SAMPLE_RATE;
-  if (onesided != 0 && std::is_same_v<T, Complex>) return QDM_ERR_OPTION;
+  if (onesided != 0 && kIsComplex<T>) return QDM_ERR_OPTION;
   if (kWorkPerValue * N > static_cast<double>(QDM_MAX_WORK_BYTES)) return QDM_ERR_WORK_LIMIT;
   if (!Finite(noise_variance)) return QDM_ERR_NON_FINITE;
   if (noise_variance < 0.0) return QDM_ERR_OPTION;
@@ -101,7 +94,7 @@ int32_t ArPsd(const T* a, int32_t order, double noise_variance, int32_t points, 
   if (!copy) return QDM_ERR_NO_MEMORY;
   std::memcpy(static_cast<void*>(copy.get()), a, m * sizeof(T));
   SpectrumResult result{0.0, 0.0, spectrum};
-  StatusCode s = Evaluate(copy.get(), order + 1, fs, N, &result);
+  StatusCode s = ArSpectrum(copy.get(), order + 1, kReciprocal, fs, N, kNoWindow, &result);
   int32_t status = s < 0 || s > 0 ? Public(s) : QDM_OK;
   if (status == QDM_OK && psd != nullptr) {
     // The dB values are 10 log10(P / P_peak): the density is P sigma^2 / fs,

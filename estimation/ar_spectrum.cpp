@@ -9,6 +9,7 @@
 #include <cstring>
 
 #include "estimation/estimation.h"
+#include "estimation/estimators.h"
 #include "fft/fft.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
@@ -117,10 +118,9 @@ struct PlanHolder {
   ~PlanHolder() { FftPlanRelease(plan); }
 };
 
-}  // namespace
-
-StatusCode ArSpectrumComplex(Complex* a, int32_t m, int32_t recip, double fs, int32_t N,
-                             int32_t mode, SpectrumResult* result) {
+// Complex coefficients: windowed part by part, transformed by the complex FFT.
+StatusCode ComplexSpectrum(Complex* a, int32_t m, int32_t recip, double fs, int32_t N, int32_t mode,
+                           SpectrumResult* result) {
   if (m < 1) return status::kBadSize;
   const size_t mm = static_cast<size_t>(m);
   WorkArray<double> re = AllocWork<double>(mm), im = AllocWork<double>(mm);
@@ -164,8 +164,9 @@ StatusCode ArSpectrumComplex(Complex* a, int32_t m, int32_t recip, double fs, in
   return FinishSpectrum(P.get(), L, recip, fs, result);
 }
 
-StatusCode ArSpectrumReal(double* a, int32_t m, int32_t recip, double fs, int32_t N, int32_t mode,
-                          SpectrumResult* result) {
+// Real coefficients: the real power spectrum.
+StatusCode RealSpectrum(double* a, int32_t m, int32_t recip, double fs, int32_t N, int32_t mode,
+                        SpectrumResult* result) {
   if (m < 1) return status::kBadSize;
   if (WindowKindOfMode(mode) < 0) return status::kBadOption;
   WindowInPlace(a, m, mode);
@@ -186,4 +187,29 @@ StatusCode ArSpectrumReal(double* a, int32_t m, int32_t recip, double fs, int32_
   st = RotateReal(buffer.get(), L, L / 2);
   if (st != status::kOk) return st;
   return FinishSpectrum(buffer.get(), L, recip, fs, result);
+}
+
+}  // namespace
+
+template <typename T>
+StatusCode ArSpectrum(T* a, int32_t m, int32_t recip, double fs, int32_t N, int32_t mode,
+                      SpectrumResult* result) {
+  if constexpr (kIsComplex<T>) {
+    return ComplexSpectrum(a, m, recip, fs, N, mode, result);
+  } else {
+    return RealSpectrum(a, m, recip, fs, N, mode, result);
+  }
+}
+template StatusCode ArSpectrum(double*, int32_t, int32_t, double, int32_t, int32_t,
+                               SpectrumResult*);
+template StatusCode ArSpectrum(Complex*, int32_t, int32_t, double, int32_t, int32_t,
+                               SpectrumResult*);
+
+StatusCode ArSpectrumComplex(Complex* a, int32_t m, int32_t recip, double fs, int32_t N,
+                             int32_t mode, SpectrumResult* result) {
+  return ArSpectrum(a, m, recip, fs, N, mode, result);
+}
+StatusCode ArSpectrumReal(double* a, int32_t m, int32_t recip, double fs, int32_t N, int32_t mode,
+                          SpectrumResult* result) {
+  return ArSpectrum(a, m, recip, fs, N, mode, result);
 }

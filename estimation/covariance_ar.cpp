@@ -4,21 +4,21 @@
 // poles (roots of z^p + a[1] z^(p-1) + ... + a[p]) and the mean squared
 // prediction error over the M = n - p equations.
 #include <cstddef>
-#include <type_traits>
 
+#include "core/scalar.h"
 #include "estimation/estimation.h"
-#include "estimation/twins.h"
+#include "estimation/estimators.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
 namespace {
 
-using namespace twin;
-
 // Iteration limits per root handed to the root finder. The complex estimator
 // deliberately allows twenty times more than the real one.
 constexpr int32_t kRootIterationsReal = 1000;
 constexpr int32_t kRootIterationsComplex = 20000;
+
+}  // namespace
 
 template <typename T>
 StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, double* variance) {
@@ -59,7 +59,7 @@ StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, doub
 
   StatusCode st = HankelProduct(x, M, p, w.get(), 1, Aw.get());
   if (st != status::kOk) return st;
-  st = Difference(Aw.get(), x + p, M, e.get());
+  st = VecSub(Aw.get(), x + p, M, e.get());
   if (st != status::kOk) return st;
 
   double sum = 0.0;
@@ -90,23 +90,23 @@ StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, doub
   // c[k] = a[p-k]: the constant term first, as the root finder wants it.
   int32_t iteration_limit = 0;
   if constexpr (kIsComplex<T>) {
-    (void)ReverseComplex(a, c.get(), p + 1);
+    (void)Reverse(a, c.get(), p + 1);
     iteration_limit = kRootIterationsComplex;
   } else {
-    (void)ReverseReal(a, reversed.get(), p + 1);
+    (void)Reverse(a, reversed.get(), p + 1);
     for (size_t k = 0; k < terms; ++k) c[k] = Complex(reversed[k], 0.0);
     iteration_limit = kRootIterationsReal;
   }
   return PolyRootsComplex(c.get(), p + 1, iteration_limit, r);
 }
-
-}  // namespace
+template StatusCode CovarianceAr(const double*, int32_t, int32_t, double*, Complex*, double*);
+template StatusCode CovarianceAr(const Complex*, int32_t, int32_t, Complex*, Complex*, double*);
 
 StatusCode CovarianceArReal(const double* x, int32_t n, int32_t p, double* a, Complex* r,
                             double* variance) {
-  return CovarianceAr<double>(x, n, p, a, r, variance);
+  return CovarianceAr(x, n, p, a, r, variance);
 }
 StatusCode CovarianceArComplex(const Complex* x, int32_t n, int32_t p, Complex* a, Complex* r,
                                double* variance) {
-  return CovarianceAr<Complex>(x, n, p, a, r, variance);
+  return CovarianceAr(x, n, p, a, r, variance);
 }

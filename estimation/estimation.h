@@ -83,9 +83,6 @@ bool PcarPrefersKrylov(int32_t n, int32_t p, int32_t k, bool complex);
                                           double* K);
 [[nodiscard]] StatusCode PencilMatrixComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
                                              Complex* K);
-// Row i of the rows-by-cols matrix multiplied by 1 / s[i] (no threshold).
-StatusCode ScaleRowsByInverseReal(double* A, int32_t rows, int32_t cols, const double* s);
-StatusCode ScaleRowsByInverseComplex(Complex* A, int32_t rows, int32_t cols, const double* s);
 [[nodiscard]] StatusCode MatrixPencilReal(const double* x, int32_t n, int32_t L, int32_t M,
                                           double fs, int32_t realFlag, double* amp, double* phase,
                                           double* damp, double* freq, double* mse, int32_t* count);

@@ -11,17 +11,15 @@
 #include <complex>
 #include <cstddef>
 #include <cstring>
-#include <type_traits>
 
+#include "core/scalar.h"
 #include "estimation/estimation.h"
-#include "estimation/twins.h"
+#include "estimation/estimators.h"
 #include "numeric/krylov.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
 namespace {
-
-using namespace twin;
 
 // ---- reduced pencil ---------------------------------------------------------------------
 // Only the leading mr x mr block of K is ever used (mr = min(M, r)), and each of
@@ -64,15 +62,14 @@ StatusCode PencilMatrixKrylov(const T* x, int32_t q, int32_t L, int32_t mr, T* f
   const T* uq = U.get() + size_t(q - 1) * mr;
   for (int32_t a = 0; a < mr; ++a) {
     for (int32_t b = 0; b < mr; ++b) {
-      full[size_t(a) * mr + b] = full[size_t(a) * mr + b] * s[b] + Conjugate(uq[a]) * last[b];
+      full[size_t(a) * mr + b] = full[size_t(a) * mr + b] * s[b] + Conj(uq[a]) * last[b];
     }
   }
   return ScaleRowsByInverse(full, mr, mr, s.get());
 }
 
 template <typename T>
-StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K,
-                        Route route = Route::kDense) {
+StatusCode ReducedPencil(const T* x, int32_t n, int32_t L, int32_t M, T* K, Route route) {
   const int32_t q = n - L;
   const int32_t r = q < L ? q : L;
   const int32_t mr = M < r ? M : r;
@@ -113,7 +110,7 @@ StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K,
     if (st != status::kOk) return st;
     // Z[0:q]^H Z[1:q+1], then each row by 1/s_i twice, unguarded: a zero
     // singular value yields infinities.
-    st = AdjointInto(U.get(), q, mr, Uh.get());
+    st = Adjoint(U.get(), q, mr, Uh.get());
     if (st != status::kOk) return st;
     st = MatMul(Uh.get(), U.get() + mr, mr, q, mr, full.get());
     if (st != status::kOk) return st;
@@ -123,7 +120,7 @@ StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K,
     if (st != status::kOk) return st;
   } else {
     // Y1 is the forward prediction block; Y2 is Y1 advanced by one sample.
-    st = BuildForward(x, n, L, rhs.get(), y1.get());
+    st = BuildForwardMatrix(x, n, L, rhs.get(), y1.get());
     if (st != status::kOk) return st;
     for (int32_t i = 0; i < q; ++i) {
       T* row = y2.get() + static_cast<size_t>(i) * static_cast<size_t>(L);
@@ -131,7 +128,7 @@ StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K,
     }
     st = SvdLeading(y1.get(), q, L, mr, U.get(), s.get(), V.get());
     if (st != status::kOk) return st;
-    st = AdjointInto(U.get(), q, mr, Uh.get());
+    st = Adjoint(U.get(), q, mr, Uh.get());
     if (st != status::kOk) return st;
     // diag(1/s) U^H, unguarded: a zero singular value yields infinities.
     st = ScaleRowsByInverse(Uh.get(), mr, q, s.get());
@@ -146,28 +143,6 @@ StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K,
   // r x r matrix: mr x mr either way, row stride mr.
   std::memcpy(static_cast<void*>(K), full.get(),
               static_cast<size_t>(mr) * static_cast<size_t>(mr) * sizeof(T));
-  return status::kOk;
-}
-
-// Row i times 1/s[i], with no threshold.
-template <typename T>
-StatusCode ScaleRows(T* A, int32_t rows, int32_t cols, const double* s) {
-  for (int32_t i = 0; i < rows; ++i) {
-    T* row = A + static_cast<size_t>(i) * static_cast<size_t>(cols);
-    if constexpr (kIsComplex<T>) {
-      // Reciprocal of s_i + 0i by Smith's division, then a plain complex product
-      // (no special handling of infinite or NaN parts).
-      double fr = 0.0, fi = 0.0;
-      (void)ComplexDivide(1.0, 0.0, s[i], 0.0, &fr, &fi);
-      for (int32_t j = 0; j < cols; ++j) {
-        const double ar = row[j].real(), ai = row[j].imag();
-        row[j] = Complex(ar * fr - ai * fi, ar * fi + ai * fr);
-      }
-    } else {
-      const double f = 1.0 / s[i];
-      for (int32_t j = 0; j < cols; ++j) row[j] *= f;
-    }
-  }
   return status::kOk;
 }
 
@@ -190,9 +165,9 @@ StatusCode MatrixPencil(const T* x, int32_t n, int32_t L, int32_t M, double fs, 
   auto amplitudes = AllocWork<Complex>(static_cast<size_t>(order));
   if (!K || !poles || !amplitudes) return status::kNoMemory;
 
-  StatusCode st = PencilMatrix(x, n, L, M, K.get(), route);
+  StatusCode st = ReducedPencil(x, n, L, M, K.get(), route);
   if (st != status::kOk) return st;
-  st = EigenvaluesOf(K.get(), order, poles.get());
+  st = EigGeneral(K.get(), order, 0, poles.get(), static_cast<Complex*>(nullptr));
   if (st != status::kOk) return st;
   st = ModeAmplitudes(x, n, poles.get(), order, amplitudes.get(), mse);
   if (st != status::kOk) return st;
@@ -202,17 +177,44 @@ StatusCode MatrixPencil(const T* x, int32_t n, int32_t L, int32_t M, double fs, 
 
 }  // namespace
 
+// Row i times 1/s[i], with no threshold.
+template <typename T>
+StatusCode ScaleRowsByInverse(T* A, int32_t rows, int32_t cols, const double* s) {
+  for (int32_t i = 0; i < rows; ++i) {
+    T* row = A + static_cast<size_t>(i) * static_cast<size_t>(cols);
+    if constexpr (kIsComplex<T>) {
+      // Reciprocal of s_i + 0i by Smith's division, then a plain complex product
+      // (no special handling of infinite or NaN parts): spelled out on purpose,
+      // as std::complex's division and product would recover NaN parts.
+      double fr = 0.0, fi = 0.0;
+      (void)ComplexDivide(1.0, 0.0, s[i], 0.0, &fr, &fi);
+      for (int32_t j = 0; j < cols; ++j) {
+        const double ar = row[j].real(), ai = row[j].imag();
+        row[j] = Complex(ar * fr - ai * fi, ar * fi + ai * fr);
+      }
+    } else {
+      const double f = 1.0 / s[i];
+      for (int32_t j = 0; j < cols; ++j) row[j] *= f;
+    }
+  }
+  return status::kOk;
+}
+
+template StatusCode ScaleRowsByInverse(double*, int32_t, int32_t, const double*);
+template StatusCode ScaleRowsByInverse(Complex*, int32_t, int32_t, const double*);
+
+template <typename T>
+StatusCode PencilMatrix(const T* x, int32_t n, int32_t L, int32_t M, T* K) {
+  return ReducedPencil(x, n, L, M, K, Route::kDense);
+}
+template StatusCode PencilMatrix(const double*, int32_t, int32_t, int32_t, double*);
+template StatusCode PencilMatrix(const Complex*, int32_t, int32_t, int32_t, Complex*);
+
 StatusCode PencilMatrixReal(const double* x, int32_t n, int32_t L, int32_t M, double* K) {
-  return PencilMatrix<double>(x, n, L, M, K);
+  return PencilMatrix(x, n, L, M, K);
 }
 StatusCode PencilMatrixComplex(const Complex* x, int32_t n, int32_t L, int32_t M, Complex* K) {
-  return PencilMatrix<Complex>(x, n, L, M, K);
-}
-StatusCode ScaleRowsByInverseReal(double* A, int32_t rows, int32_t cols, const double* s) {
-  return ScaleRows<double>(A, rows, cols, s);
-}
-StatusCode ScaleRowsByInverseComplex(Complex* A, int32_t rows, int32_t cols, const double* s) {
-  return ScaleRows<Complex>(A, rows, cols, s);
+  return PencilMatrix(x, n, L, M, K);
 }
 StatusCode MatrixPencilReal(const double* x, int32_t n, int32_t L, int32_t M, double fs,
                             int32_t realFlag, double* amp, double* phase, double* damp,

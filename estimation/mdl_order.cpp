@@ -16,17 +16,15 @@
 #include <cmath>
 #include <cstddef>
 #include <cstring>
-#include <type_traits>
 
+#include "core/scalar.h"
 #include "estimation/estimation.h"
-#include "estimation/twins.h"
+#include "estimation/estimators.h"
 #include "numeric/lapack_boundary.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
 namespace {
-
-using namespace twin;
 
 constexpr double kPenalty = 10.0;        // weight of m ln n
 constexpr double kStartScore = 10000.0;  // a score must fall below this to be chosen
@@ -114,8 +112,6 @@ Complex PowerN(Complex z, int32_t n) {
   return result;
 }
 
-double Abs2(Complex v) { return v.real() * v.real() + v.imag() * v.imag(); }
-
 bool Finite(double v) { return std::isfinite(v); }
 
 // Decides whether candidate m, with poles z, may be passed over without its
@@ -147,7 +143,7 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
   const double nn = static_cast<double>(n);
   for (size_t i = 0; i < mm; ++i) {
     p[i] = PowerN(z[i], n);
-    absP[i] = std::sqrt(Abs2(p[i]));
+    absP[i] = std::sqrt(AbsSquared(p[i]));
     colSum[i] = 0.0;
   }
   // G, its entries' error bounds (squared, summed over both triangles) and
@@ -155,12 +151,12 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
   double errG2 = 0.0;
   double trace = 0.0;
   for (size_t i = 0; i < mm; ++i) {
-    const double w = Abs2(z[i]);
+    const double w = AbsSquared(z[i]);
     const double d = 1.0 - w;
     double g = 0.0;
     double e = 0.0;
     if (nn * std::fabs(d) >= 1.0) {
-      const double pp = Abs2(p[i]);
+      const double pp = AbsSquared(p[i]);
       g = (1.0 - pp) / d;
       e = ((2.0 * nn + 4.0) * pp + 3.0) / std::fabs(d) + 4.0 * g;
     } else {
@@ -226,13 +222,7 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
     accIm[i] = 0.0;
   }
   for (int32_t t = n - 1; t >= 0; --t) {
-    double xr = 0.0, xi = 0.0;
-    if constexpr (kIsComplex<T>) {
-      xr = x[t].real();
-      xi = x[t].imag();
-    } else {
-      xr = x[t];
-    }
+    const double xr = RealPart(x[t]), xi = ImagPart(x[t]);
     for (size_t i = 0; i < mm; ++i) {
       const double re = accRe[i] * wRe[i] - accIm[i] * wIm[i] + xr;
       const double im = accRe[i] * wIm[i] + accIm[i] * wRe[i] + xi;
@@ -260,8 +250,8 @@ StatusCode FastLook(const T* x, int32_t n, double xx, const Complex* z, int32_t 
   double q = 0.0;
   double amp2 = 0.0;
   for (size_t i = 0; i < mm; ++i) {
-    q += Abs2(y[i]);
-    amp2 += Abs2(A[i]);
+    q += AbsSquared(y[i]);
+    amp2 += AbsSquared(A[i]);
   }
   const double amp = std::sqrt(amp2);
   const double normV = std::sqrt(trace);  // ||V||_F
@@ -298,12 +288,7 @@ template <typename T>
 double SquaredNorm(const T* x, int32_t n) {
   double sum = 0.0, carry = 0.0;
   for (int32_t t = 0; t < n; ++t) {
-    double v = 0.0;
-    if constexpr (kIsComplex<T>) {
-      v = Abs2(x[t]);
-    } else {
-      v = x[t] * x[t];
-    }
+    const double v = AbsSquared(x[t]);
     const double next = sum + v;
     carry += std::fabs(sum) >= std::fabs(v) ? (sum - next) + v : (v - next) + sum;
     sum = next;
@@ -355,7 +340,7 @@ StatusCode MdlOrder(const T* x, int32_t n, int32_t L, int32_t minOrder, bool fas
       std::memcpy(block.get() + static_cast<size_t>(i) * static_cast<size_t>(m),
                   K.get() + static_cast<size_t>(i) * rr, static_cast<size_t>(m) * sizeof(T));
     }
-    st = EigenvaluesOf(block.get(), m, poles.get());
+    st = EigGeneral(block.get(), m, 0, poles.get(), static_cast<Complex*>(nullptr));
     if (st != status::kOk) return st;
     if (fast) {
       Look look;

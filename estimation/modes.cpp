@@ -3,9 +3,10 @@
 // into amplitude, phase, damping (per sample) and frequency (Hz).
 #include <cmath>
 #include <cstddef>
-#include <type_traits>
 
+#include "core/scalar.h"
 #include "estimation/estimation.h"
+#include "estimation/estimators.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
@@ -14,13 +15,15 @@ namespace {
 constexpr double kTwoPi = 6.283185307179586;
 constexpr double kPi = 3.141592653589793;
 
+}  // namespace
+
 // Fits the k amplitudes A of poles z to the n samples x and reports the mean
 // squared modulus of the residual in E. The solve, product and difference are
 // not checked: if one of them fails, A and E are whatever it left behind.
 template <typename T>
 StatusCode ModeAmplitudes(const T* x, int32_t n, const Complex* z, int32_t k, Complex* A,
                           double* E) {
-  if constexpr (std::is_same_v<T, Complex>) {
+  if constexpr (kIsComplex<T>) {
     // The real form trusts its callers (n >= 1, k >= 1); only the complex one
     // checks its arguments.
     if (n < 1) return status::kEmptyInput;
@@ -41,7 +44,8 @@ StatusCode ModeAmplitudes(const T* x, int32_t n, const Complex* z, int32_t k, Co
 
   // Vandermonde matrix V[t][i] = z_i^t by running products down each column:
   // no power function, so every entry is the exact product chain. The chains
-  // advance together, a row at a time, so V is written in order.
+  // advance together, a row at a time, so V is written in order. The product
+  // is spelled out: std::complex's operator adds a NaN-recovery call per entry.
   for (size_t i = 0; i < cols; ++i) V[i] = Complex(1.0, 0.0);
   for (size_t t = 1; t < rows; ++t) {
     const Complex* prev = V.get() + (t - 1) * cols;
@@ -53,36 +57,30 @@ StatusCode ModeAmplitudes(const T* x, int32_t n, const Complex* z, int32_t k, Co
     }
   }
 
-  if constexpr (std::is_same_v<T, Complex>) {
-    for (size_t t = 0; t < rows; ++t) data[t] = x[t];
-  } else {
-    // Real samples go into the real parts; the amplitudes stay complex.
-    for (size_t t = 0; t < rows; ++t) data[t] = Complex(x[t], 0.0);
-  }
+  // Real samples go into the real parts; the amplitudes stay complex.
+  for (size_t t = 0; t < rows; ++t) data[t] = Complex(RealPart(x[t]), ImagPart(x[t]));
 
-  (void)LeastSquaresComplex(V.get(), n, k, data.get(), 1, A, -1.0);
-  (void)MatMulComplex(V.get(), A, n, k, 1, model.get());
+  (void)LeastSquares(V.get(), n, k, data.get(), 1, A, -1.0);
+  (void)MatMul(V.get(), A, n, k, 1, model.get());
   (void)VecSubComplex(model.get(), data.get(), n, residual.get());
 
   double sum = 0.0;
-  for (size_t t = 0; t < rows; ++t) {
-    const double re = residual[t].real();
-    const double im = residual[t].imag();
-    sum += re * re + im * im;
-  }
+  for (size_t t = 0; t < rows; ++t) sum += AbsSquared(residual[t]);
   *E = sum / static_cast<double>(n);
   return status::kOk;
 }
-
-}  // namespace
+template StatusCode ModeAmplitudes(const double*, int32_t, const Complex*, int32_t, Complex*,
+                                   double*);
+template StatusCode ModeAmplitudes(const Complex*, int32_t, const Complex*, int32_t, Complex*,
+                                   double*);
 
 StatusCode ModeAmplitudesComplex(const Complex* x, int32_t n, const Complex* z, int32_t k,
                                  Complex* A, double* E) {
-  return ModeAmplitudes<Complex>(x, n, z, k, A, E);
+  return ModeAmplitudes(x, n, z, k, A, E);
 }
 StatusCode ModeAmplitudesReal(const double* x, int32_t n, const Complex* z, int32_t k, Complex* A,
                               double* E) {
-  return ModeAmplitudes<double>(x, n, z, k, A, E);
+  return ModeAmplitudes(x, n, z, k, A, E);
 }
 
 // Complex mode reports every pole in order. Real-signal mode reports one

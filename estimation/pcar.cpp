@@ -14,17 +14,15 @@
 #include <algorithm>
 #include <cmath>
 #include <cstddef>
-#include <type_traits>
 
+#include "core/scalar.h"
 #include "estimation/estimation.h"
-#include "estimation/twins.h"
+#include "estimation/estimators.h"
 #include "numeric/krylov.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
 namespace {
-
-using namespace twin;
 
 // ---- truncation threshold -----------------------------------------------------------------
 // tau lies halfway between the k-th and (k+1)-th singular values of A (half the
@@ -38,7 +36,7 @@ StatusCode PcarThreshold(const T* A, int32_t rows, int32_t cols, int32_t k, doub
   auto v = AllocWorkUninit<T>(static_cast<size_t>(cols) * static_cast<size_t>(mn));
   auto s = AllocWorkUninit<double>(static_cast<size_t>(mn));
   if (!u || !v || !s) return status::kNoMemory;
-  const StatusCode st = Svd(A, rows, cols, u.get(), s.get(), v.get());
+  const StatusCode st = Svd(A, rows, cols, u.get(), s.get(), v.get(), 0);
   if (st != status::kOk) return st;
   *tau = TruncationThreshold(s.get(), mn, k);
   return status::kOk;
@@ -58,9 +56,9 @@ StatusCode SolveDense(const T* x, int32_t n, int32_t p, int32_t k, T* w) {
   if (!A || !b) return status::kNoMemory;
 
   // The two blocks are built in place, forward rows first.
-  StatusCode st = BuildForward(x, n, p, b.get(), A.get());
+  StatusCode st = BuildForwardMatrix(x, n, p, b.get(), A.get());
   if (st != status::kOk) return st;
-  st = BuildBackward(x, n, p, b.get() + q, A.get() + block);
+  st = BuildBackwardMatrix(x, n, p, b.get() + q, A.get() + block);
   if (st != status::kOk) return st;
   if constexpr (kIsComplex<T>) {
     // Complex data: the backward equations predict conj(x[i]) from conj(x[i+1..]),
@@ -68,7 +66,7 @@ StatusCode SolveDense(const T* x, int32_t n, int32_t p, int32_t k, T* w) {
     for (size_t i = block; i < 2 * block; ++i) A[i] = std::conj(A[i]);
     for (int32_t i = q; i < rows; ++i) b[i] = std::conj(b[i]);
   }
-  return TruncatedSolve(A.get(), rows, p, b.get(), w, k);
+  return LeastSquaresTruncated(A.get(), rows, p, b.get(), 1, w, k);
 }
 
 // The same w from A's leading triplets, A never formed: w = V z with
@@ -95,9 +93,9 @@ StatusCode SolveKrylov(const T* x, int32_t n, int32_t p, int32_t k, T* w) {
   for (int32_t i = 0; i < count; ++i) z[i] = T(0.0);
   for (int32_t row = 0; row < rows; ++row) {
     // b: x[row + p] on the forward rows, conj(x[row - q]) on the backward ones.
-    const T bi = row < q ? x[row + p] : Conjugate(x[row - q]);
+    const T bi = row < q ? x[row + p] : Conj(x[row - q]);
     const T* u = U.get() + static_cast<size_t>(row) * static_cast<size_t>(count);
-    for (int32_t i = 0; i < count; ++i) z[i] += Conjugate(u[i]) * bi;
+    for (int32_t i = 0; i < count; ++i) z[i] += Conj(u[i]) * bi;
   }
   for (int32_t i = 0; i < count; ++i) z[i] = S[i] > tau ? z[i] * (1.0 / S[i]) : T(0.0);
   for (int32_t j = 0; j < p; ++j) {
@@ -111,8 +109,7 @@ StatusCode SolveKrylov(const T* x, int32_t n, int32_t p, int32_t k, T* w) {
 
 // ---- estimator ------------------------------------------------------------------------------
 template <typename T>
-StatusCode PcarEstimate(const T* x, int32_t n, int32_t p, int32_t k, T* a, Complex* roots,
-                        Route route = Route::kDense) {
+StatusCode Pcar(const T* x, int32_t n, int32_t p, int32_t k, T* a, Complex* roots, Route route) {
   if (n < 1) return status::kEmptyInput;
   if (p < 0 || p > MaxOrder(n)) return status::kBadOrder;
   if (k < 1) return status::kBadCount;
@@ -133,11 +130,10 @@ StatusCode PcarEstimate(const T* x, int32_t n, int32_t p, int32_t k, T* a, Compl
 
   // Roots of z^p + a[1] z^(p-1) + ... + a[p]: the root finder reads ascending powers.
   const Complex* coeffs = nullptr;
+  st = Reverse(a, poly.get(), p + 1);
   if constexpr (kIsComplex<T>) {
-    st = ReverseComplex(a, poly.get(), p + 1);
     coeffs = poly.get();
   } else {
-    st = ReverseReal(a, poly.get(), p + 1);
     for (int32_t i = 0; i <= p; ++i) polyC[i] = Complex(poly[i], 0.0);
     coeffs = polyC.get();
   }
@@ -147,20 +143,27 @@ StatusCode PcarEstimate(const T* x, int32_t n, int32_t p, int32_t k, T* a, Compl
 
 }  // namespace
 
+template <typename T>
+StatusCode PcarEstimate(const T* x, int32_t n, int32_t p, int32_t k, T* a, Complex* roots) {
+  return Pcar(x, n, p, k, a, roots, Route::kDense);
+}
+template StatusCode PcarEstimate(const double*, int32_t, int32_t, int32_t, double*, Complex*);
+template StatusCode PcarEstimate(const Complex*, int32_t, int32_t, int32_t, Complex*, Complex*);
+
 StatusCode PcarThresholdReal(const double* A, int32_t rows, int32_t cols, int32_t k, double* tau) {
-  return PcarThreshold<double>(A, rows, cols, k, tau);
+  return PcarThreshold(A, rows, cols, k, tau);
 }
 StatusCode PcarThresholdComplex(const Complex* A, int32_t rows, int32_t cols, int32_t k,
                                 double* tau) {
-  return PcarThreshold<Complex>(A, rows, cols, k, tau);
+  return PcarThreshold(A, rows, cols, k, tau);
 }
 StatusCode PcarEstimateReal(const double* x, int32_t n, int32_t p, int32_t k, double* a,
                             Complex* roots) {
-  return PcarEstimate<double>(x, n, p, k, a, roots);
+  return PcarEstimate(x, n, p, k, a, roots);
 }
 StatusCode PcarEstimateComplex(const Complex* x, int32_t n, int32_t p, int32_t k, Complex* a,
                                Complex* roots) {
-  return PcarEstimate<Complex>(x, n, p, k, a, roots);
+  return PcarEstimate(x, n, p, k, a, roots);
 }
 
 // Measured on one core with OpenBLAS (records of 8 modes at 20 dB, n = 256 ..
@@ -195,9 +198,9 @@ Route RouteOf(PcarSolver solver, int32_t n, int32_t p, int32_t k, bool complex) 
 
 StatusCode PcarSolverReal(const double* x, int32_t n, int32_t p, int32_t k, PcarSolver solver,
                           double* a, Complex* roots) {
-  return PcarEstimate<double>(x, n, p, k, a, roots, RouteOf(solver, n, p, k, false));
+  return Pcar(x, n, p, k, a, roots, RouteOf(solver, n, p, k, false));
 }
 StatusCode PcarSolverComplex(const Complex* x, int32_t n, int32_t p, int32_t k, PcarSolver solver,
                              Complex* a, Complex* roots) {
-  return PcarEstimate<Complex>(x, n, p, k, a, roots, RouteOf(solver, n, p, k, true));
+  return Pcar(x, n, p, k, a, roots, RouteOf(solver, n, p, k, true));
 }

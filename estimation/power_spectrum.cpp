@@ -4,23 +4,13 @@
 // nearest the unit circle. The drivers always ask for the reciprocal power
 // and no window.
 #include "estimation/estimation.h"
-#include "estimation/twins.h"
+#include "estimation/estimators.h"
 #include "numeric/work.h"
 
 namespace {
 
-using namespace twin;
-
 constexpr int32_t kReciprocal = 1;
 constexpr int32_t kNoWindow = 3;
-
-// The evaluator of the matching type, as the drivers call it.
-StatusCode ArSpectrum(double* a, int32_t m, double fs, int32_t N, SpectrumResult* result) {
-  return ArSpectrumReal(a, m, kReciprocal, fs, N, kNoWindow, result);
-}
-StatusCode ArSpectrum(Complex* a, int32_t m, double fs, int32_t N, SpectrumResult* result) {
-  return ArSpectrumComplex(a, m, kReciprocal, fs, N, kNoWindow, result);
-}
 
 template <typename T>
 StatusCode CovPowerSpectrum(const T* x, int32_t n, int32_t p, int32_t N, double fs,
@@ -39,7 +29,7 @@ StatusCode CovPowerSpectrum(const T* x, int32_t n, int32_t p, int32_t N, double 
   // means (it refuses it).
   const StatusCode st = CovarianceAr(x, n, p, a.get(), poles.get(), variance);
   if (st != status::kOk) return st;
-  return ArSpectrum(a.get(), p + 1, fs, N, result);
+  return ArSpectrum(a.get(), p + 1, kReciprocal, fs, N, kNoWindow, result);
 }
 
 template <typename T>
@@ -70,7 +60,7 @@ StatusCode PcarPowerSpectrum(const T* x, int32_t n, int32_t p, int32_t k, int32_
   st = ModeParameters(amplitudes.get(), k, selected.get(), k, fs, realFlag, amp, phase,
                       damping.get(), freq, count);
   if (st != status::kOk) return st;
-  return ArSpectrum(a.get(), p + 1, fs, N, result);
+  return ArSpectrum(a.get(), p + 1, kReciprocal, fs, N, kNoWindow, result);
 }
 
 }  // namespace

@@ -3,15 +3,12 @@
 // least-squares fit of those poles to the record; each mode is then reported
 // as amplitude, phase, damping and frequency.
 #include <cstddef>
-#include <type_traits>
 
 #include "estimation/estimation.h"
-#include "estimation/twins.h"
+#include "estimation/estimators.h"
 #include "numeric/work.h"
 
 namespace {
-
-using namespace twin;
 
 // realFlag selects real-signal reporting (one mode per conjugate pair); the
 // complex form always passes 0.

@@ -13,7 +13,6 @@
 
 #include <cstdint>
 #include <cstring>
-#include <type_traits>
 
 #include "numeric/lapack_boundary.h"
 #include "numeric/numeric.h"
@@ -30,15 +29,10 @@ void ConjugateInPlace(Complex* x, size_t count) {
 // vectors (null: not stored).
 template <typename T>
 StatusCode EigSymmetric(const T* A, int32_t n, int32_t wantVectors, double* eigenvalues, T* dest) {
-  constexpr bool kComplex = std::is_same_v<T, Complex>;
   if (n <= 0) return status::kBadSize;
   if (wantVectors > 1) return status::kBadOption;
   const size_t nn = static_cast<size_t>(n) * static_cast<size_t>(n);
-  if constexpr (kComplex) {
-    if (HasNonFiniteComplex(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
-  } else {
-    if (HasNonFiniteReal(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
-  }
+  if (HasNonFinite(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
 
   WorkArray<T> a = AllocWorkUninit<T>(nn);
   if (!a) return status::kNoMemory;
@@ -53,7 +47,7 @@ StatusCode EigSymmetric(const T* A, int32_t n, int32_t wantVectors, double* eige
       lapack::Copy(n, a.get() + static_cast<size_t>(j) * n, 1, dest + j, n);
     }
     // The Hermitian driver saw conj(A): its vectors are the conjugates of A's.
-    if constexpr (kComplex) ConjugateInPlace(dest, nn);
+    if constexpr (kIsComplex<T>) ConjugateInPlace(dest, nn);
   }
   return status::kOk;
 }
@@ -62,37 +56,61 @@ StatusCode EigSymmetric(const T* A, int32_t n, int32_t wantVectors, double* eige
 
 // ---- general matrices -------------------------------------------------------------
 
-StatusCode EigGeneralReal(const double* A, int32_t n, int32_t wantVectors, Complex* eigenvalues,
-                          Complex* vectors) {
+// The real driver returns WR and WI and packs a complex pair's left vectors
+// into two real columns; the complex driver returns both whole. Each twin
+// keeps its own work block (the real one leads with WORK, the complex one with
+// the copy of A), so the drivers see the same addresses as they always have.
+template <typename T>
+StatusCode EigGeneral(const T* A, int32_t n, int32_t wantVectors, Complex* eigenvalues,
+                      Complex* vectors) {
   if (n < 1) return status::kBadSize;
   if (wantVectors > 1) return status::kBadOption;
   const size_t nn = static_cast<size_t>(n) * static_cast<size_t>(n);
-  if (HasNonFiniteReal(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
+  if (HasNonFinite(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
 
-  // One block: WORK, the copy of A (n*n), WR (n), WI (n); VL on its own.
   const size_t nz = static_cast<size_t>(n);
-  const size_t lwork = static_cast<size_t>(lapack::GeevWorkSize(n, false));
-  WorkArray<double> block = AllocWorkUninit<double>(nn + lwork + 2 * nz);
-  if (!block) return status::kNoMemory;
-  WorkArray<double> vl;
-  if (wantVectors == 1) {
-    vl = AllocWorkUninit<double>(nn);
-    if (!vl) return status::kNoMemory;
-  }
-  double* work = block.get();
-  double* a = work + lwork;
-  double* wr = a + nn;
-  double* wi = wr + nz;
-  std::memcpy(a, A, nn * sizeof(double));
+  const size_t lwork = static_cast<size_t>(lapack::GeevWorkSize(n, kIsComplex<T>));
+  const char jobvl = wantVectors == 1 ? 'V' : 'N';
+  StatusCode st = status::kOk;
+  if constexpr (kIsComplex<T>) {
+    // One complex block: the copy of A (n*n), then WORK; RWORK (2n); VL.
+    WorkArray<Complex> block = AllocWorkUninit<Complex>(nn + lwork);
+    WorkArray<double> rwork = AllocWorkUninit<double>(2 * nz);
+    if (!block || !rwork) return status::kNoMemory;
+    WorkArray<Complex> vl;
+    if (wantVectors == 1) {
+      vl = AllocWorkUninit<Complex>(nn);
+      if (!vl) return status::kNoMemory;
+    }
+    Complex* a = block.get();
+    std::memcpy(a, A, nn * sizeof(Complex));
+    st = lapack::Geev(jobvl, n, a, eigenvalues, vl.get(), a + nn, rwork.get());
+    if (st != status::kOk || wantVectors != 1) return st;
+    for (int32_t j = 0; j < n; ++j) {
+      lapack::Copy(n, vl.get() + static_cast<size_t>(j) * nz, 1, vectors + j, n);
+    }
+    ConjugateInPlace(vectors, nn);  // left vectors of A^T -> right vectors of A
+  } else {
+    // One block: WORK, the copy of A (n*n), WR (n), WI (n); VL on its own.
+    WorkArray<double> block = AllocWorkUninit<double>(nn + lwork + 2 * nz);
+    if (!block) return status::kNoMemory;
+    WorkArray<double> vl;
+    if (wantVectors == 1) {
+      vl = AllocWorkUninit<double>(nn);
+      if (!vl) return status::kNoMemory;
+    }
+    double* work = block.get();
+    double* a = work + lwork;
+    double* wr = a + nn;
+    double* wi = wr + nz;
+    std::memcpy(a, A, nn * sizeof(double));
+    st = lapack::Geev(jobvl, n, a, wr, wi, vl.get(), work);
+    if (st != status::kOk) return st;
 
-  const StatusCode st = lapack::Geev(wantVectors == 1 ? 'V' : 'N', n, a, wr, wi, vl.get(), work);
-  if (st != status::kOk) return st;
-
-  double* values = reinterpret_cast<double*>(eigenvalues);
-  lapack::Copy(n, wr, 1, values, 2);
-  lapack::Copy(n, wi, 1, values + 1, 2);
-
-  if (wantVectors == 1) {
+    double* values = reinterpret_cast<double*>(eigenvalues);
+    lapack::Copy(n, wr, 1, values, 2);
+    lapack::Copy(n, wi, 1, values + 1, 2);
+    if (wantVectors != 1) return status::kOk;
     // A real eigenvalue has the real column VL(:, j). A complex pair stores its
     // left vectors as u = VL(:, j) +- i VL(:, j+1); the right vectors of A are
     // their conjugates.
@@ -113,40 +131,17 @@ StatusCode EigGeneralReal(const double* A, int32_t n, int32_t wantVectors, Compl
   }
   return status::kOk;
 }
+template StatusCode EigGeneral(const double*, int32_t, int32_t, Complex*, Complex*);
+template StatusCode EigGeneral(const Complex*, int32_t, int32_t, Complex*, Complex*);
+
+StatusCode EigGeneralReal(const double* A, int32_t n, int32_t wantVectors, Complex* eigenvalues,
+                          Complex* vectors) {
+  return EigGeneral(A, n, wantVectors, eigenvalues, vectors);
+}
 
 StatusCode EigGeneralComplex(Complex* A, int32_t n, int32_t wantVectors, Complex* eigenvalues,
                              Complex* vectors) {
-  if (n < 1) return status::kBadSize;
-  if (wantVectors > 1) return status::kBadOption;
-  const size_t nn = static_cast<size_t>(n) * static_cast<size_t>(n);
-  if (HasNonFiniteComplex(A, static_cast<int64_t>(nn)) != 0) return status::kNonFinite;
-
-  // One complex block: the copy of A (n*n), then WORK; RWORK (2n); VL.
-  const size_t nz = static_cast<size_t>(n);
-  WorkArray<Complex> block =
-      AllocWorkUninit<Complex>(nn + static_cast<size_t>(lapack::GeevWorkSize(n, true)));
-  WorkArray<double> rwork = AllocWorkUninit<double>(2 * nz);
-  if (!block || !rwork) return status::kNoMemory;
-  WorkArray<Complex> vl;
-  if (wantVectors == 1) {
-    vl = AllocWorkUninit<Complex>(nn);
-    if (!vl) return status::kNoMemory;
-  }
-  Complex* a = block.get();
-  Complex* work = a + nn;
-  std::memcpy(a, A, nn * sizeof(Complex));
-
-  const StatusCode st =
-      lapack::Geev(wantVectors == 1 ? 'V' : 'N', n, a, eigenvalues, vl.get(), work, rwork.get());
-  if (st != status::kOk) return st;
-
-  if (wantVectors == 1) {
-    Complex* dest = vectors != nullptr ? vectors : A;
-    for (int32_t j = 0; j < n; ++j)
-      lapack::Copy(n, vl.get() + static_cast<size_t>(j) * nz, 1, dest + j, n);
-    ConjugateInPlace(dest, nn);  // left vectors of A^T -> right vectors of A
-  }
-  return status::kOk;
+  return EigGeneral<Complex>(A, n, wantVectors, eigenvalues, vectors != nullptr ? vectors : A);
 }
 
 // ---- symmetric and Hermitian matrices -------------------------------------------------

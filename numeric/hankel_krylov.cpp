@@ -22,33 +22,14 @@
 #include <cmath>
 #include <complex>
 #include <cstring>
-#include <type_traits>
 
+#include "core/scalar.h"
 #include "fft/fft.h"
 #include "numeric/krylov.h"
 #include "numeric/lapack_boundary.h"
 #include "numeric/work.h"
 
 namespace {
-
-template <typename T>
-constexpr bool kIsComplex = std::is_same_v<T, Complex>;
-
-double Real(double v) { return v; }
-double Real(const Complex& v) { return v.real(); }
-double Imag(double) { return 0.0; }
-double Imag(const Complex& v) { return v.imag(); }
-double Conj(double v) { return v; }
-Complex Conj(const Complex& v) { return std::conj(v); }
-template <typename T>
-T Make(double re, double im) {
-  if constexpr (kIsComplex<T>) {
-    return T(re, im);
-  } else {
-    (void)im;
-    return re;
-  }
-}
 
 // The smallest 2^a 3^b 5^c not below n (the FFT engine's fastest lengths), or
 // 0 when none fits in int32.
@@ -112,7 +93,7 @@ StatusCode Setup(HankelFft& h, const T* x, int32_t rows, int32_t cols) {
     std::fill(a + span, a + h.N, 0.0);
     return FftReal(h.plan, a, reinterpret_cast<double*>(h.X.get()), 1, 1, h.N);
   }
-  for (int64_t t = 0; t < span; ++t) h.a[t] = Complex(Real(x[t]), Imag(x[t]));
+  for (int64_t t = 0; t < span; ++t) h.a[t] = Complex(RealPart(x[t]), ImagPart(x[t]));
   return Dft(h, h.a.get(), h.X.get());
 }
 
@@ -161,7 +142,7 @@ StatusCode Product(HankelFft& h, const T* in, int64_t is, T* out, int64_t os, bo
   Complex* a = h.a.get();
   Complex* b = h.b.get();
   const int32_t count = adjoint ? h.rows : h.cols;
-  for (int32_t j = 0; j < count; ++j) a[j] = Complex(Real(in[j * is]), Imag(in[j * is]));
+  for (int32_t j = 0; j < count; ++j) a[j] = Complex(RealPart(in[j * is]), ImagPart(in[j * is]));
   std::fill(a + count, a + h.N, Complex(0.0, 0.0));
   StatusCode st = Dft(h, a, b);
   if (st != status::kOk) return st;
@@ -182,7 +163,7 @@ StatusCode Product(HankelFft& h, const T* in, int64_t is, T* out, int64_t os, bo
   const int32_t outCount = adjoint ? h.cols : h.rows;
   for (int32_t i = 0; i < outCount; ++i) {
     const Complex& c = b[adjoint ? h.cols - 1 - i : i + h.cols - 1];
-    out[i * os] = Make<T>(c.real() * scale, c.imag() * imag);
+    out[i * os] = MakeScalar<T>(c.real() * scale, c.imag() * imag);
   }
   return status::kOk;
 }
@@ -287,7 +268,7 @@ void Scatter(T* v, int64_t stride, int32_t n, uint64_t seed) {
   };
   for (int32_t i = 0; i < n; ++i) {
     const double re = next();
-    v[i * stride] = Make<T>(re, kIsComplex<T> ? next() : 0.0);
+    v[i * stride] = MakeScalar<T>(re, kIsComplex<T> ? next() : 0.0);
   }
 }
 
@@ -299,10 +280,10 @@ double Norm(int32_t dim, const T* w) {
   int32_t i = 0;
   for (; i + 4 <= dim; i += 4) {
     for (int32_t l = 0; l < 4; ++l) {
-      part[l] += Real(w[i + l]) * Real(w[i + l]) + Imag(w[i + l]) * Imag(w[i + l]);
+      part[l] += RealPart(w[i + l]) * RealPart(w[i + l]) + ImagPart(w[i + l]) * ImagPart(w[i + l]);
     }
   }
-  for (; i < dim; ++i) part[0] += Real(w[i]) * Real(w[i]) + Imag(w[i]) * Imag(w[i]);
+  for (; i < dim; ++i) part[0] += RealPart(w[i]) * RealPart(w[i]) + ImagPart(w[i]) * ImagPart(w[i]);
   const double sum = (part[0] + part[1]) + (part[2] + part[3]);
   if (sum > 0x1p-900 && sum < 0x1p900) return std::sqrt(sum);
   return lapack::Nrm2(dim, w);
@@ -316,7 +297,8 @@ double Norm(int32_t dim, const T* w) {
 template <typename T>
 double Orthogonalize(const T* Q, int32_t dim, int32_t count, T* w, double norm, T* c, T* c2) {
   if (count == 0) return norm;
-  const T one = Make<T>(1.0, 0.0), zero = Make<T>(0.0, 0.0), minus = Make<T>(-1.0, 0.0);
+  const T one = MakeScalar<T>(1.0, 0.0), zero = MakeScalar<T>(0.0, 0.0),
+          minus = MakeScalar<T>(-1.0, 0.0);
   lapack::GemvCol(true, dim, count, one, Q, dim, w, zero, c);
   lapack::GemvCol(false, dim, count, minus, Q, dim, c, one, w);
   const double left = Norm(dim, w);
@@ -420,7 +402,7 @@ StatusCode SvdLeadingOf(Op& op, int32_t count, double* S, T* U, T* V) {
       scale = std::max(scale, au);
       const double alpha = Orthogonalize(Uq, un, j, wu.get(), au, c.get(), c2.get());
       for (int32_t i = 0; i < j; ++i) B[i + size_t(j) * k] = c[i];
-      B[j + size_t(j) * k] = Make<T>(
+      B[j + size_t(j) * k] = MakeScalar<T>(
           Extend(Uq, un, j, wu.get(), alpha, scale, c.get(), c2.get(), 3 + 2 * uint64_t(j)), 0.0);
       // v_{j+1} = A^H u_j minus its components along v_0 .. v_j.
       st = op.Apply(Uq + int64_t{j} * un, wv.get(), !flip);
@@ -458,7 +440,7 @@ StatusCode SvdLeadingOf(Op& op, int32_t count, double* S, T* U, T* V) {
     std::memcpy(static_cast<void*>(Vq + int64_t{keep} * vn), Vq + int64_t{m} * vn,
                 static_cast<size_t>(vn) * sizeof(T));
     std::fill(B.get(), B.get() + kk, T(0.0));
-    for (int32_t i = 0; i < keep; ++i) B[i + size_t(i) * k] = Make<T>(s[i], 0.0);
+    for (int32_t i = 0; i < keep; ++i) B[i + size_t(i) * k] = MakeScalar<T>(s[i], 0.0);
     kept = keep;
   }
 
@@ -481,9 +463,11 @@ StatusCode SvdLeadingOf(Op& op, int32_t count, double* S, T* U, T* V) {
   return status::kOk;
 }
 
+}  // namespace
+
 template <typename T>
-StatusCode HankelSvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t count, double* S,
-                               T* U, T* V) {
+StatusCode HankelSvdLeading(const T* x, int32_t rows, int32_t cols, int32_t count, double* S, T* U,
+                            T* V) {
   if (rows < 1 || cols < 1 || count < 1 || count > std::min(rows, cols)) {
     return status::kBadSize;
   }
@@ -494,8 +478,8 @@ StatusCode HankelSvdLeadingFft(const T* x, int32_t rows, int32_t cols, int32_t c
 }
 
 template <typename T>
-StatusCode ForwardBackwardSvdLeadingFft(const T* x, int32_t n, int32_t p, int32_t count, double* S,
-                                        T* U, T* V) {
+StatusCode ForwardBackwardSvdLeading(const T* x, int32_t n, int32_t p, int32_t count, double* S,
+                                     T* U, T* V) {
   if (p < 1 || p >= n || count < 1 || count > std::min(int64_t{2} * (n - p), int64_t{p})) {
     return status::kBadSize;
   }
@@ -505,37 +489,29 @@ StatusCode ForwardBackwardSvdLeadingFft(const T* x, int32_t n, int32_t p, int32_
   return SvdLeadingOf(op, count, S, U, V);
 }
 
-}  // namespace
+template StatusCode HankelSvdLeading(const double*, int32_t, int32_t, int32_t, double*, double*,
+                                     double*);
+template StatusCode HankelSvdLeading(const Complex*, int32_t, int32_t, int32_t, double*, Complex*,
+                                     Complex*);
+template StatusCode ForwardBackwardSvdLeading(const double*, int32_t, int32_t, int32_t, double*,
+                                              double*, double*);
+template StatusCode ForwardBackwardSvdLeading(const Complex*, int32_t, int32_t, int32_t, double*,
+                                              Complex*, Complex*);
 
-StatusCode HankelProductFftReal(const double* x, int32_t rows, int32_t cols, const double* V,
-                                int32_t k, double* Z) {
-  return ProductFft<double>(x, rows, cols, V, k, Z, false);
+template <typename T>
+StatusCode HankelProductFft(const T* x, int32_t rows, int32_t cols, const T* V, int32_t k, T* Z) {
+  return ProductFft(x, rows, cols, V, k, Z, false);
 }
-StatusCode HankelProductFftComplex(const Complex* x, int32_t rows, int32_t cols, const Complex* V,
-                                   int32_t k, Complex* Z) {
-  return ProductFft<Complex>(x, rows, cols, V, k, Z, false);
+template <typename T>
+StatusCode HankelAdjointProductFft(const T* x, int32_t rows, int32_t cols, const T* U, int32_t k,
+                                   T* W) {
+  return ProductFft(x, rows, cols, U, k, W, true);
 }
-StatusCode HankelAdjointProductFftReal(const double* x, int32_t rows, int32_t cols, const double* U,
-                                       int32_t k, double* W) {
-  return ProductFft<double>(x, rows, cols, U, k, W, true);
-}
-StatusCode HankelAdjointProductFftComplex(const Complex* x, int32_t rows, int32_t cols,
-                                          const Complex* U, int32_t k, Complex* W) {
-  return ProductFft<Complex>(x, rows, cols, U, k, W, true);
-}
-StatusCode HankelSvdLeadingReal(const double* x, int32_t rows, int32_t cols, int32_t count,
-                                double* S, double* U, double* V) {
-  return HankelSvdLeadingFft<double>(x, rows, cols, count, S, U, V);
-}
-StatusCode HankelSvdLeadingComplex(const Complex* x, int32_t rows, int32_t cols, int32_t count,
-                                   double* S, Complex* U, Complex* V) {
-  return HankelSvdLeadingFft<Complex>(x, rows, cols, count, S, U, V);
-}
-StatusCode ForwardBackwardSvdLeadingReal(const double* x, int32_t n, int32_t p, int32_t count,
-                                         double* S, double* U, double* V) {
-  return ForwardBackwardSvdLeadingFft<double>(x, n, p, count, S, U, V);
-}
-StatusCode ForwardBackwardSvdLeadingComplex(const Complex* x, int32_t n, int32_t p, int32_t count,
-                                            double* S, Complex* U, Complex* V) {
-  return ForwardBackwardSvdLeadingFft<Complex>(x, n, p, count, S, U, V);
-}
+template StatusCode HankelProductFft(const double*, int32_t, int32_t, const double*, int32_t,
+                                     double*);
+template StatusCode HankelProductFft(const Complex*, int32_t, int32_t, const Complex*, int32_t,
+                                     Complex*);
+template StatusCode HankelAdjointProductFft(const double*, int32_t, int32_t, const double*, int32_t,
+                                            double*);
+template StatusCode HankelAdjointProductFft(const Complex*, int32_t, int32_t, const Complex*,
+                                            int32_t, Complex*);

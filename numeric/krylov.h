@@ -20,17 +20,14 @@
 
 // Z (rows-by-k) = H V for V cols-by-k: one FFT convolution per column, in
 // O(k (rows + cols) log(rows + cols)). The same numbers as HankelProduct* to
-// rounding.
-[[nodiscard]] StatusCode HankelProductFftReal(const double* x, int32_t rows, int32_t cols,
-                                              const double* V, int32_t k, double* Z);
-[[nodiscard]] StatusCode HankelProductFftComplex(const Complex* x, int32_t rows, int32_t cols,
-                                                 const Complex* V, int32_t k, Complex* Z);
+// rounding. T is double or Complex throughout.
+template <typename T>
+[[nodiscard]] StatusCode HankelProductFft(const T* x, int32_t rows, int32_t cols, const T* V,
+                                          int32_t k, T* Z);
 // W (cols-by-k) = H^H U for U rows-by-k (the transpose for real data).
-[[nodiscard]] StatusCode HankelAdjointProductFftReal(const double* x, int32_t rows, int32_t cols,
-                                                     const double* U, int32_t k, double* W);
-[[nodiscard]] StatusCode HankelAdjointProductFftComplex(const Complex* x, int32_t rows,
-                                                        int32_t cols, const Complex* U, int32_t k,
-                                                        Complex* W);
+template <typename T>
+[[nodiscard]] StatusCode HankelAdjointProductFft(const T* x, int32_t rows, int32_t cols, const T* U,
+                                                 int32_t k, T* W);
 
 // The `count` largest singular values of H (non-increasing) and their right
 // singular vectors V (cols-by-count), and, when U is not null, their left ones
@@ -50,19 +47,15 @@
 // calls but the FFT plans, so it is thread-safe. x is not screened.
 constexpr double kKrylovTolerance = 1e-13;
 constexpr int32_t kKrylovMaxRestarts = 200;
-[[nodiscard]] StatusCode HankelSvdLeadingReal(const double* x, int32_t rows, int32_t cols,
-                                              int32_t count, double* S, double* U, double* V);
-[[nodiscard]] StatusCode HankelSvdLeadingComplex(const Complex* x, int32_t rows, int32_t cols,
-                                                 int32_t count, double* S, Complex* U, Complex* V);
+template <typename T>
+[[nodiscard]] StatusCode HankelSvdLeading(const T* x, int32_t rows, int32_t cols, int32_t count,
+                                          double* S, T* U, T* V);
 
 // The same for the forward-backward matrix [F; Bk] of x (n samples, order p,
 // 1 <= p < n, 1 <= count <= min(2(n - p), p)): its products are four Hankel
 // products over one DFT of x, and the triplets come from the same
 // bidiagonalization, with the same tolerance, restarts and statuses. U, when
 // not null, is 2(n - p)-by-count.
-[[nodiscard]] StatusCode ForwardBackwardSvdLeadingReal(const double* x, int32_t n, int32_t p,
-                                                       int32_t count, double* S, double* U,
-                                                       double* V);
-[[nodiscard]] StatusCode ForwardBackwardSvdLeadingComplex(const Complex* x, int32_t n, int32_t p,
-                                                          int32_t count, double* S, Complex* U,
-                                                          Complex* V);
+template <typename T>
+[[nodiscard]] StatusCode ForwardBackwardSvdLeading(const T* x, int32_t n, int32_t p, int32_t count,
+                                                   double* S, T* U, T* V);

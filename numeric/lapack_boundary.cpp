@@ -20,10 +20,12 @@
 
 #include <algorithm>
 #include <atomic>
+#include <cassert>
 #include <cmath>
 #include <limits>
 
 #include "core/call_record.h"
+#include "core/scalar.h"
 #include "numeric/work.h"
 
 namespace {
@@ -71,19 +73,34 @@ StatusCode Failed(Driver driver, lapack_int info) {
   return s;
 }
 
+// The INFO of a driver that ran. Every argument is ours and checked before
+// the call, so a negative INFO (an illegal argument) is a bug here, never the
+// caller's data; release builds map it all the same.
 StatusCode Done(Driver driver, lapack_int info) {
+  assert(info >= 0);
   return info == 0 ? status::kOk : Failed(driver, info);
 }
 
-// The size a workspace query left in WORK(1), truncated toward zero.
-int64_t Queried(double w) { return static_cast<int64_t>(w); }
-int64_t Queried(const Complex& w) { return static_cast<int64_t>(w.real()); }
-
+// The workspace a query left in WORK(1), its size rounded up: a size near
+// 2^53 or beyond may not be an integer once stored as a double.
 template <typename T>
 WorkArray<T> QueriedWork(const T& query, lapack_int* lwork) {
-  const int64_t size = std::max<int64_t>(Queried(query), 0);
+  const int64_t size = std::max<int64_t>(static_cast<int64_t>(std::ceil(RealPart(query))), 0);
   *lwork = static_cast<lapack_int>(std::min<int64_t>(size, std::numeric_limits<lapack_int>::max()));
   return AllocWorkUninit<T>(static_cast<size_t>(size));
+}
+
+// run(work, &lwork) once as a workspace query (LWORK = -1), then with the
+// workspace it asked for; -20001 when that cannot be had.
+template <typename T, typename Run>
+StatusCode RunQueried(Run run) {
+  T query{};
+  lapack_int lwork = -1;
+  run(&query, &lwork);
+  WorkArray<T> work = QueriedWork(query, &lwork);
+  if (!work) return status::kNoMemory;
+  run(work.get(), &lwork);
+  return status::kOk;
 }
 
 // n * trunc(2 (log2 n + 1) + c1 n + c0) + 1, with log2 n = ln n / ln 2; -1 when
@@ -113,44 +130,36 @@ namespace lapack {
 // IWORK: 8 min(m, n). ZGESDD's RWORK: (5k + 7)k, raised where needed to the
 // minimum LAPACK documents, max(5k^2 + 5k, 2 max(m,n) k + 2k^2 + k), which is
 // larger when one side exceeds the other by more than about half.
-StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, double* a, lapack_int lda, double* s,
-                 double* u, lapack_int ldu, double* vt, lapack_int ldvt) {
+template <typename T>
+StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, T* a, lapack_int lda, double* s, T* u,
+                 lapack_int ldu, T* vt, lapack_int ldvt) {
   lapack_int info = 0;
   if (Injected(&info)) return Failed(Driver::kGesdd, info);
   const int64_t k = std::min(m, n);
   WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(8 * k));
   if (!iwork) return status::kNoMemory;
-  double query = 0.0;
-  lapack_int lwork = -1;
-  LAPACK_dgesdd(&jobz, &m, &n, a, &lda, s, u, &ldu, vt, &ldvt, &query, &lwork, iwork.get(), &info);
-  WorkArray<double> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  LAPACK_dgesdd(&jobz, &m, &n, a, &lda, s, u, &ldu, vt, &ldvt, work.get(), &lwork, iwork.get(),
-                &info);
+  WorkArray<double> rwork;
+  if constexpr (kIsComplex<T>) {
+    const int64_t mx = std::max(m, n);
+    const int64_t lrwork = std::max((5 * k + 7) * k, 2 * mx * k + 2 * k * k + k);
+    rwork = AllocWorkUninit<double>(static_cast<size_t>(lrwork));
+    if (!rwork) return status::kNoMemory;
+  }
+  const StatusCode st = RunQueried<T>([&](T* work, lapack_int* lwork) {
+    if constexpr (kIsComplex<T>) {
+      LAPACK_zgesdd(&jobz, &m, &n, a, &lda, s, u, &ldu, vt, &ldvt, work, lwork, rwork.get(),
+                    iwork.get(), &info);
+    } else {
+      LAPACK_dgesdd(&jobz, &m, &n, a, &lda, s, u, &ldu, vt, &ldvt, work, lwork, iwork.get(), &info);
+    }
+  });
+  if (st != status::kOk) return st;
   return Done(Driver::kGesdd, info);
 }
-
-StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, Complex* a, lapack_int lda, double* s,
-                 Complex* u, lapack_int ldu, Complex* vt, lapack_int ldvt) {
-  lapack_int info = 0;
-  if (Injected(&info)) return Failed(Driver::kGesdd, info);
-  const int64_t k = std::min(m, n);
-  const int64_t mx = std::max(m, n);
-  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(8 * k));
-  if (!iwork) return status::kNoMemory;
-  const int64_t lrwork = std::max((5 * k + 7) * k, 2 * mx * k + 2 * k * k + k);
-  WorkArray<double> rwork = AllocWorkUninit<double>(static_cast<size_t>(lrwork));
-  if (!rwork) return status::kNoMemory;
-  Complex query;
-  lapack_int lwork = -1;
-  LAPACK_zgesdd(&jobz, &m, &n, a, &lda, s, u, &ldu, vt, &ldvt, &query, &lwork, rwork.get(),
-                iwork.get(), &info);
-  WorkArray<Complex> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  LAPACK_zgesdd(&jobz, &m, &n, a, &lda, s, u, &ldu, vt, &ldvt, work.get(), &lwork, rwork.get(),
-                iwork.get(), &info);
-  return Done(Driver::kGesdd, info);
-}
+template StatusCode Gesdd(char, lapack_int, lapack_int, double*, lapack_int, double*, double*,
+                          lapack_int, double*, lapack_int);
+template StatusCode Gesdd(char, lapack_int, lapack_int, Complex*, lapack_int, double*, Complex*,
+                          lapack_int, Complex*, lapack_int);
 
 // ---- leading singular triplets ---------------------------------------------------------
 // gesdd's own route for a matrix that is not much taller than wide, with only
@@ -159,49 +168,52 @@ StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, Complex* a, lapack_int l
 // real also for complex data), and apply Q to the first `count` left vectors
 // of B alone. Q applied to all of them, and P to any, is most of gesdd's cost.
 namespace {
-void Gebrd(lapack_int m, lapack_int n, double* a, lapack_int lda, double* d, double* e,
-           double* tauq, double* taup, double* work, lapack_int lwork, lapack_int* info) {
-  LAPACK_dgebrd(&m, &n, a, &lda, d, e, tauq, taup, work, &lwork, info);
-}
-void Gebrd(lapack_int m, lapack_int n, Complex* a, lapack_int lda, double* d, double* e,
-           Complex* tauq, Complex* taup, Complex* work, lapack_int lwork, lapack_int* info) {
-  LAPACK_zgebrd(&m, &n, a, &lda, d, e, tauq, taup, work, &lwork, info);
+// B = Q^H a P (gebrd) for the m-by-n a.
+template <typename T>
+void Gebrd(lapack_int m, lapack_int n, T* a, lapack_int lda, double* d, double* e, T* tauq, T* taup,
+           T* work, lapack_int* lwork, lapack_int* info) {
+  if constexpr (kIsComplex<T>) {
+    LAPACK_zgebrd(&m, &n, a, &lda, d, e, tauq, taup, work, lwork, info);
+  } else {
+    LAPACK_dgebrd(&m, &n, a, &lda, d, e, tauq, taup, work, lwork, info);
+  }
 }
 // C (m-by-ncol) replaced by Q C, Q from Gebrd of an m-by-k matrix.
-void ApplyQ(lapack_int m, lapack_int ncol, lapack_int k, const double* a, lapack_int lda,
-            const double* tau, double* c, lapack_int ldc, double* work, lapack_int lwork,
-            lapack_int* info) {
+template <typename T>
+void ApplyQ(lapack_int m, lapack_int ncol, lapack_int k, const T* a, lapack_int lda, const T* tau,
+            T* c, lapack_int ldc, T* work, lapack_int* lwork, lapack_int* info) {
   const char vect = 'Q', side = 'L', trans = 'N';
-  LAPACK_dormbr(&vect, &side, &trans, &m, &ncol, &k, a, &lda, tau, c, &ldc, work, &lwork, info);
+  if constexpr (kIsComplex<T>) {
+    LAPACK_zunmbr(&vect, &side, &trans, &m, &ncol, &k, a, &lda, tau, c, &ldc, work, lwork, info);
+  } else {
+    LAPACK_dormbr(&vect, &side, &trans, &m, &ncol, &k, a, &lda, tau, c, &ldc, work, lwork, info);
+  }
 }
-void ApplyQ(lapack_int m, lapack_int ncol, lapack_int k, const Complex* a, lapack_int lda,
-            const Complex* tau, Complex* c, lapack_int ldc, Complex* work, lapack_int lwork,
-            lapack_int* info) {
-  const char vect = 'Q', side = 'L', trans = 'N';
-  LAPACK_zunmbr(&vect, &side, &trans, &m, &ncol, &k, a, &lda, tau, c, &ldc, work, &lwork, info);
-}
-double MaxAbs(lapack_int m, lapack_int n, const double* a, lapack_int lda) {
+template <typename T>
+double MaxAbs(lapack_int m, lapack_int n, const T* a, lapack_int lda) {
   double unused = 0.0;
-  return LAPACK_dlange("M", &m, &n, a, &lda, &unused);
+  if constexpr (kIsComplex<T>) {
+    return LAPACK_zlange("M", &m, &n, a, &lda, &unused);
+  } else {
+    return LAPACK_dlange("M", &m, &n, a, &lda, &unused);
+  }
 }
-double MaxAbs(lapack_int m, lapack_int n, const Complex* a, lapack_int lda) {
-  double unused = 0.0;
-  return LAPACK_zlange("M", &m, &n, a, &lda, &unused);
-}
-void Rescale(double from, double to, lapack_int m, lapack_int n, double* a, lapack_int lda) {
+template <typename T>
+void Rescale(double from, double to, lapack_int m, lapack_int n, T* a, lapack_int lda) {
   const lapack_int zero = 0;
   lapack_int info = 0;
-  LAPACK_dlascl("G", &zero, &zero, &from, &to, &m, &n, a, &lda, &info);
-}
-void Rescale(double from, double to, lapack_int m, lapack_int n, Complex* a, lapack_int lda) {
-  const lapack_int zero = 0;
-  lapack_int info = 0;
-  LAPACK_zlascl("G", &zero, &zero, &from, &to, &m, &n, a, &lda, &info);
+  if constexpr (kIsComplex<T>) {
+    LAPACK_zlascl("G", &zero, &zero, &from, &to, &m, &n, a, &lda, &info);
+  } else {
+    LAPACK_dlascl("G", &zero, &zero, &from, &to, &m, &n, a, &lda, &info);
+  }
 }
 
+}  // namespace
+
 template <typename T>
-StatusCode LeadingLeft(lapack_int m, lapack_int n, T* a, lapack_int lda, lapack_int count,
-                       double* s, T* u, lapack_int ldu) {
+StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, T* a, lapack_int lda, lapack_int count,
+                          double* s, T* u, lapack_int ldu) {
   lapack_int info = 0;
   if (Injected(&info)) return Failed(Driver::kGesdd, info);
   const lapack_int k = std::min(m, n);
@@ -229,38 +241,34 @@ StatusCode LeadingLeft(lapack_int m, lapack_int n, T* a, lapack_int lda, lapack_
   if (anrm > 1.0 / small) scaled = 1.0 / small;
   if (scaled != 0.0) Rescale(anrm, scaled, m, n, a, lda);
 
-  T query{};
-  lapack_int lwork = -1;
-  Gebrd(m, n, a, lda, d, e, tauq, taup, &query, lwork, &info);
-  WorkArray<T> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  Gebrd(m, n, a, lda, d, e, tauq, taup, work.get(), lwork, &info);
-  if (info != 0) return Failed(Driver::kGesdd, info);
+  StatusCode st = RunQueried<T>([&](T* work, lapack_int* lwork) {
+    Gebrd(m, n, a, lda, d, e, tauq, taup, work, lwork, &info);
+  });
+  if (st != status::kOk) return st;
+  if (info != 0) return Done(Driver::kGesdd, info);
 
   const char uplo = m >= n ? 'U' : 'L';
   double q_unused = 0.0;
   lapack_int iq_unused = 0;
   LAPACK_dbdsdc(&uplo, "I", &k, d, e, ub, &k, vtb, &k, &q_unused, &iq_unused, bwork, iwork.get(),
                 &info);
-  if (info != 0) return Failed(Driver::kGesdd, info);
+  if (info != 0) return Done(Driver::kGesdd, info);
 
   for (lapack_int j = 0; j < count; ++j) {
     T* col = u + int64_t{j} * ldu;
     for (lapack_int i = 0; i < k; ++i) col[i] = ub[i + int64_t{j} * k];
     for (lapack_int i = k; i < m; ++i) col[i] = T{};
   }
-  lwork = -1;
-  ApplyQ(m, count, n, a, lda, tauq, u, ldu, &query, lwork, &info);
-  work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  ApplyQ(m, count, n, a, lda, tauq, u, ldu, work.get(), lwork, &info);
-  if (info != 0) return Failed(Driver::kGesdd, info);
+  st = RunQueried<T>([&](T* work, lapack_int* lwork) {
+    ApplyQ(m, count, n, a, lda, tauq, u, ldu, work, lwork, &info);
+  });
+  if (st != status::kOk) return st;
+  if (info != 0) return Done(Driver::kGesdd, info);
 
   if (scaled != 0.0) Rescale(scaled, anrm, k, 1, d, k);
   std::copy(d, d + count, s);
   return status::kOk;
 }
-}  // namespace
 
 // ---- gelsd ----------------------------------------------------------------------------
 // IWORK: (3 depth + 14) k with depth = floor(log2 k), k = min(m, n): enough for
@@ -274,41 +282,31 @@ StatusCode Gelsd(lapack_int m, lapack_int n, lapack_int nrhs, double* a, lapack_
   WorkArray<lapack_int> iwork =
       AllocWorkUninit<lapack_int>(static_cast<size_t>((3 * depth + 14) * k));
   if (!iwork) return status::kNoMemory;
-  double query = 0.0;
-  lapack_int lwork = -1;
-  LAPACK_dgelsd(&m, &n, &nrhs, a, &lda, b, &ldb, s, &rcond, rank, &query, &lwork, iwork.get(),
-                &info);
-  WorkArray<double> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  LAPACK_dgelsd(&m, &n, &nrhs, a, &lda, b, &ldb, s, &rcond, rank, work.get(), &lwork, iwork.get(),
-                &info);
+  const StatusCode st = RunQueried<double>([&](double* work, lapack_int* lwork) {
+    LAPACK_dgelsd(&m, &n, &nrhs, a, &lda, b, &ldb, s, &rcond, rank, work, lwork, iwork.get(),
+                  &info);
+  });
+  if (st != status::kOk) return st;
   return Done(Driver::kGelsd, info);
 }
 
 // ---- QR -------------------------------------------------------------------------------
-StatusCode Geqrf(lapack_int m, lapack_int n, double* a, lapack_int lda, double* tau) {
+template <typename T>
+StatusCode Geqrf(lapack_int m, lapack_int n, T* a, lapack_int lda, T* tau) {
   lapack_int info = 0;
   if (Injected(&info)) return Failed(Driver::kGeqrf, info);
-  double query = 0.0;
-  lapack_int lwork = -1;
-  LAPACK_dgeqrf(&m, &n, a, &lda, tau, &query, &lwork, &info);
-  WorkArray<double> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  LAPACK_dgeqrf(&m, &n, a, &lda, tau, work.get(), &lwork, &info);
+  const StatusCode st = RunQueried<T>([&](T* work, lapack_int* lwork) {
+    if constexpr (kIsComplex<T>) {
+      LAPACK_zgeqrf(&m, &n, a, &lda, tau, work, lwork, &info);
+    } else {
+      LAPACK_dgeqrf(&m, &n, a, &lda, tau, work, lwork, &info);
+    }
+  });
+  if (st != status::kOk) return st;
   return Done(Driver::kGeqrf, info);
 }
-
-StatusCode Geqrf(lapack_int m, lapack_int n, Complex* a, lapack_int lda, Complex* tau) {
-  lapack_int info = 0;
-  if (Injected(&info)) return Failed(Driver::kGeqrf, info);
-  Complex query;
-  lapack_int lwork = -1;
-  LAPACK_zgeqrf(&m, &n, a, &lda, tau, &query, &lwork, &info);
-  WorkArray<Complex> work = QueriedWork(query, &lwork);
-  if (!work) return status::kNoMemory;
-  LAPACK_zgeqrf(&m, &n, a, &lda, tau, work.get(), &lwork, &info);
-  return Done(Driver::kGeqrf, info);
-}
+template StatusCode Geqrf(lapack_int, lapack_int, double*, lapack_int, double*);
+template StatusCode Geqrf(lapack_int, lapack_int, Complex*, lapack_int, Complex*);
 
 // Compact-WY blocking: block reflectors of 8 columns (32 when there are more
 // than 64), their triangular factors T kept in the workspace and dropped; only
@@ -347,28 +345,34 @@ StatusCode Tpqrt(lapack_int m, lapack_int n, double* a, lapack_int lda, double* 
 // computed; no query.
 int64_t GeevWorkSize(int32_t n, bool complex) { return (complex ? 2 : 4) * int64_t{n}; }
 
-StatusCode Geev(char jobvl, lapack_int n, double* a, double* wr, double* wi, double* vl,
-                double* work) {
+namespace {
+// The real driver's eigenvalues come as WR and WI (`w` and `extra`), the
+// complex one's as W, with RWORK (2n) in `extra`.
+template <typename T>
+StatusCode GeevAny(char jobvl, lapack_int n, T* a, T* w, T* vl, T* work, double* extra) {
   lapack_int info = 0;
   if (Injected(&info)) return Failed(Driver::kGeev, info);
   const char jobvr = 'N';
-  const lapack_int lwork = static_cast<lapack_int>(GeevWorkSize(n, false));
-  double unused = 0.0;
-  LAPACK_dgeev(&jobvl, &jobvr, &n, a, &n, wr, wi, vl != nullptr ? vl : &unused, &n, &unused, &n,
-               work, &lwork, &info);
+  const lapack_int lwork = static_cast<lapack_int>(GeevWorkSize(n, kIsComplex<T>));
+  T unused{};
+  T* left = vl != nullptr ? vl : &unused;
+  if constexpr (kIsComplex<T>) {
+    LAPACK_zgeev(&jobvl, &jobvr, &n, a, &n, w, left, &n, &unused, &n, work, &lwork, extra, &info);
+  } else {
+    LAPACK_dgeev(&jobvl, &jobvr, &n, a, &n, w, extra, left, &n, &unused, &n, work, &lwork, &info);
+  }
   return Done(Driver::kGeev, info);
+}
+}  // namespace
+
+StatusCode Geev(char jobvl, lapack_int n, double* a, double* wr, double* wi, double* vl,
+                double* work) {
+  return GeevAny(jobvl, n, a, wr, vl, work, wi);
 }
 
 StatusCode Geev(char jobvl, lapack_int n, Complex* a, Complex* w, Complex* vl, Complex* work,
                 double* rwork) {
-  lapack_int info = 0;
-  if (Injected(&info)) return Failed(Driver::kGeev, info);
-  const char jobvr = 'N';
-  const lapack_int lwork = static_cast<lapack_int>(GeevWorkSize(n, true));
-  Complex unused;
-  LAPACK_zgeev(&jobvl, &jobvr, &n, a, &n, w, vl != nullptr ? vl : &unused, &n, &unused, &n, work,
-               &lwork, rwork, &info);
-  return Done(Driver::kGeev, info);
+  return GeevAny(jobvl, n, a, w, vl, work, rwork);
 }
 
 // Sized for JOBZ = 'V' whatever is asked. DSYEVD needs WORK >= 1 + 6n + 2n^2;
@@ -376,41 +380,35 @@ StatusCode Geev(char jobvl, lapack_int n, Complex* a, Complex* w, Complex* vl, C
 // IWORK >= 3 + 5n. Here: LIWORK = 5n + 3; LWORK = n trunc(2 (log2 n + 1) + 3n + 5)
 // + 1 for DSYEVD and the RWORK of ZHEEVD, n trunc(2 (log2 n + 1) + n) + 1 for
 // ZHEEVD's WORK.
-StatusCode Syevd(char jobz, lapack_int n, double* a, double* w) {
+template <typename T>
+StatusCode Syevd(char jobz, lapack_int n, T* a, double* w) {
   lapack_int info = 0;
   if (Injected(&info)) return Failed(Driver::kSyevd, info);
-  const int64_t lwork = LogWorkSize(n, 3.0, 5.0);
-  const int64_t liwork = 5 * int64_t{n} + 3;
-  if (lwork < 0 || liwork > std::numeric_limits<lapack_int>::max()) return status::kNoMemory;
-  WorkArray<double> work = AllocWorkUninit<double>(static_cast<size_t>(lwork));
-  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(liwork));
-  if (!work || !iwork) return status::kNoMemory;
-  const char uplo = 'U';
-  const lapack_int lw = static_cast<lapack_int>(lwork), liw = static_cast<lapack_int>(liwork);
-  LAPACK_dsyevd(&jobz, &uplo, &n, a, &n, w, work.get(), &lw, iwork.get(), &liw, &info);
-  return Done(Driver::kSyevd, info);
-}
-
-StatusCode Syevd(char jobz, lapack_int n, Complex* a, double* w) {
-  lapack_int info = 0;
-  if (Injected(&info)) return Failed(Driver::kSyevd, info);
-  const int64_t lwork = LogWorkSize(n, 1.0, 0.0);
-  const int64_t lrwork = LogWorkSize(n, 3.0, 5.0);
+  const int64_t lwork = kIsComplex<T> ? LogWorkSize(n, 1.0, 0.0) : LogWorkSize(n, 3.0, 5.0);
+  const int64_t lrwork = kIsComplex<T> ? LogWorkSize(n, 3.0, 5.0) : 0;
   const int64_t liwork = 5 * int64_t{n} + 3;
   if (lwork < 0 || lrwork < 0 || liwork > std::numeric_limits<lapack_int>::max()) {
     return status::kNoMemory;
   }
-  WorkArray<Complex> work = AllocWorkUninit<Complex>(static_cast<size_t>(lwork));
-  WorkArray<double> rwork = AllocWorkUninit<double>(static_cast<size_t>(lrwork));
+  WorkArray<T> work = AllocWorkUninit<T>(static_cast<size_t>(lwork));
+  WorkArray<double> rwork;
+  if constexpr (kIsComplex<T>) rwork = AllocWorkUninit<double>(static_cast<size_t>(lrwork));
   WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(liwork));
-  if (!work || !rwork || !iwork) return status::kNoMemory;
+  if (!work || (kIsComplex<T> && !rwork) || !iwork) return status::kNoMemory;
   const char uplo = 'U';
   const lapack_int lw = static_cast<lapack_int>(lwork), lrw = static_cast<lapack_int>(lrwork),
                    liw = static_cast<lapack_int>(liwork);
-  LAPACK_zheevd(&jobz, &uplo, &n, a, &n, w, work.get(), &lw, rwork.get(), &lrw, iwork.get(), &liw,
-                &info);
+  if constexpr (kIsComplex<T>) {
+    LAPACK_zheevd(&jobz, &uplo, &n, a, &n, w, work.get(), &lw, rwork.get(), &lrw, iwork.get(), &liw,
+                  &info);
+  } else {
+    (void)lrw;
+    LAPACK_dsyevd(&jobz, &uplo, &n, a, &n, w, work.get(), &lw, iwork.get(), &liw, &info);
+  }
   return Done(Driver::kSyevd, info);
 }
+template StatusCode Syevd(char, lapack_int, double*, double*);
+template StatusCode Syevd(char, lapack_int, Complex*, double*);
 
 // ---- Cholesky ---------------------------------------------------------------------------
 StatusCode Potrf(lapack_int n, Complex* a, lapack_int lda, lapack_int* notDefinite) {
@@ -437,13 +435,9 @@ StatusCode Pocon(lapack_int n, const Complex* a, lapack_int lda, double anorm, d
   return Done(Driver::kPotrf, info);
 }
 
-StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, double* a, lapack_int lda, lapack_int count,
-                          double* s, double* u, lapack_int ldu) {
-  return LeadingLeft<double>(m, n, a, lda, count, s, u, ldu);
-}
-StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, Complex* a, lapack_int lda, lapack_int count,
-                          double* s, Complex* u, lapack_int ldu) {
-  return LeadingLeft<Complex>(m, n, a, lda, count, s, u, ldu);
-}
+template StatusCode LeadingLeftSvd(lapack_int, lapack_int, double*, lapack_int, lapack_int, double*,
+                                   double*, lapack_int);
+template StatusCode LeadingLeftSvd(lapack_int, lapack_int, Complex*, lapack_int, lapack_int,
+                                   double*, Complex*, lapack_int);
 
 }  // namespace lapack

@@ -2,8 +2,10 @@
 // driver the library calls is reached through a routine here that takes its
 // workspace (a size query where the driver offers one, a fixed formula for the
 // eigenvalue drivers), allocates it through NumAlloc, runs the driver and turns
-// INFO into a StatusCode by the one mapping in lapack_boundary.cpp. Overloads
-// serve the real (d) and complex (z) twin from one template body. Integers are
+// INFO into a StatusCode by the one mapping in lapack_boundary.cpp. One
+// template serves the real (d) and complex (z) driver of a pair, instantiated
+// for double and Complex; where their argument lists differ (geev) two
+// overloads lead into it. Integers are
 // LAPACK's 32-bit lapack_int.
 //
 // Every driver call is counted, and a test can make the k-th call from now
@@ -92,18 +94,16 @@ inline double Nrm2(int32_t n, const Complex* x) { return cblas_dznrm2(n, x, 1); 
 // INFO maps to (see lapack_boundary.cpp for the mapping of each driver).
 
 // Divide-and-conquer SVD (jobz 'S' or 'A').
-[[nodiscard]] StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, double* a, lapack_int lda,
-                               double* s, double* u, lapack_int ldu, double* vt, lapack_int ldvt);
-[[nodiscard]] StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, Complex* a, lapack_int lda,
-                               double* s, Complex* u, lapack_int ldu, Complex* vt, lapack_int ldvt);
+template <typename T>
+[[nodiscard]] StatusCode Gesdd(char jobz, lapack_int m, lapack_int n, T* a, lapack_int lda,
+                               double* s, T* u, lapack_int ldu, T* vt, lapack_int ldvt);
 
 // The `count` largest singular values (decreasing) of the m-by-n a and their
 // left singular vectors, u (m-by-count, ldu), as gesdd finds them; a is
 // overwritten. One driver call, mapped as gesdd.
-[[nodiscard]] StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, double* a, lapack_int lda,
-                                        lapack_int count, double* s, double* u, lapack_int ldu);
-[[nodiscard]] StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
-                                        lapack_int count, double* s, Complex* u, lapack_int ldu);
+template <typename T>
+[[nodiscard]] StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, T* a, lapack_int lda,
+                                        lapack_int count, double* s, T* u, lapack_int ldu);
 
 // Minimum-norm least squares by divide and conquer (real only); *rank as
 // LAPACK leaves it.
@@ -113,9 +113,8 @@ inline double Nrm2(int32_t n, const Complex* x) { return cblas_dznrm2(n, x, 1); 
 
 // Householder QR, A = Q R: R in the upper triangle of a, Q as reflectors below
 // it and in tau (min(m, n) values).
-[[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, double* a, lapack_int lda, double* tau);
-[[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, Complex* a, lapack_int lda,
-                               Complex* tau);
+template <typename T>
+[[nodiscard]] StatusCode Geqrf(lapack_int m, lapack_int n, T* a, lapack_int lda, T* tau);
 
 // Householder QR of the m-by-n a in compact-WY blocks (real only): R in the
 // upper triangle of a, the reflectors below it.
@@ -136,8 +135,8 @@ int64_t GeevWorkSize(int32_t n, bool complex);
                               Complex* work, double* rwork);
 
 // Symmetric / Hermitian divide and conquer, UPLO 'U', eigenvalues ascending in w.
-[[nodiscard]] StatusCode Syevd(char jobz, lapack_int n, double* a, double* w);
-[[nodiscard]] StatusCode Syevd(char jobz, lapack_int n, Complex* a, double* w);
+template <typename T>
+[[nodiscard]] StatusCode Syevd(char jobz, lapack_int n, T* a, double* w);
 
 // Cholesky factorization of the Hermitian a (UPLO 'U', complex only): a = R^H R
 // with R in the upper triangle. A matrix that is not positive definite is an

@@ -7,11 +7,9 @@
 #include <algorithm>
 #include <cmath>
 #include <cstring>
-#include <type_traits>
 
 #include "core/call_record.h"
 #include "numeric/lapack_boundary.h"
-#include "numeric/mat_mul.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
@@ -26,28 +24,6 @@ bool UsesPinvPath(int32_t m, int32_t n) {
   if (m == 1) return n > 739;
   const int64_t mm = m;
   return n > m && n > 66 * mm + 670 + (mm - 3) * (mm - 2);
-}
-
-template <typename T>
-constexpr bool kIsComplex = !std::is_same_v<T, double>;
-
-template <typename T>
-StatusCode SvdOf(const T* A, int32_t m, int32_t n, T* U, double* S, T* V) {
-  if constexpr (kIsComplex<T>) {
-    return SvdComplex(A, m, n, U, S, V, 0);
-  } else {
-    return SvdReal(A, m, n, U, S, V, 0);
-  }
-}
-
-// U (m-by-k) replaced in place by U^T, or U^H for complex (k-by-m).
-template <typename T>
-StatusCode AdjointInPlace(T* U, int32_t m, int32_t k) {
-  if constexpr (kIsComplex<T>) {
-    return ConjTransposeComplex(U, m, k, nullptr);
-  } else {
-    return TransposeReal(U, m, k, nullptr);
-  }
 }
 
 // Column i of V (n-by-k) scaled by 1/S[i] when S[i] > threshold, else zeroed.
@@ -105,18 +81,9 @@ struct Factors {
 // overwritten by its adjoint on the way.
 template <typename T>
 StatusCode FormPinv(Factors<T>& f, int32_t m, int32_t n, int32_t k, T* P) {
-  const StatusCode st = AdjointInPlace(f.U, m, k);
+  const StatusCode st = Adjoint(f.U, m, k, static_cast<T*>(nullptr));
   if (st != status::kOk) return st;
-  return MatMul<T>(f.V, f.U, n, k, m, P);
-}
-
-template <typename T>
-int32_t HasNonFinite(const T* x, int64_t n) {
-  if constexpr (kIsComplex<T>) {
-    return HasNonFiniteComplex(x, n);
-  } else {
-    return HasNonFiniteReal(x, n);
-  }
+  return MatMul(f.V, f.U, n, k, m, P);
 }
 
 // A system with at least this many rows per column is solved through a QR
@@ -602,7 +569,7 @@ void Refine(const Rows& rows, int32_t m, int32_t n, int32_t k, const Complex* V,
   for (int32_t i = 0; i < k; ++i)
     t[i] = S[i] > threshold ? t[i] / (S[i] * S[i]) : Complex(0.0, 0.0);
   lapack::Gemm(n, 1, k, V, t, dw);
-  if (HasNonFiniteComplex(dw, n) != 0) return;
+  if (HasNonFinite(dw, n) != 0) return;
   for (int32_t j = 0; j < n; ++j) w[j] += dw[j];
 }
 
@@ -653,10 +620,10 @@ StatusCode SvdSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, T* X
     if (st != status::kOk) return st;
     TransposeTo(r_col, n, n, r, false);
     TransposeTo(y_col, nrhs, n, y.get(), false);
-    st = SvdOf(r, n, n, f.U, f.S, f.V);
+    st = Svd(r, n, n, f.U, f.S, f.V, 0);
     base = y.get();
   } else if constexpr (Rows::kDense) {
-    st = SvdOf(system.A, m, n, f.U, f.S, f.V);
+    st = Svd(system.A, m, n, f.U, f.S, f.V, 0);
     base = system.B;
   } else {
     return status::kBadSize;  // never reached: a Hankel system comes only tall
@@ -711,42 +678,6 @@ StatusCode PinvSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, T* 
       SvdSolve(system, m, n, nrhs, X, Cut{true, rcond > 0.0 ? rcond : kEpsilon, 0}, &kept);
   if (st != status::kOk) return st;
   return kept == std::min(m, n) ? status::kOk : status::kRankDeficient;
-}
-
-template <typename T>
-StatusCode TruncatedSolve(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X,
-                          int32_t keep) {
-  if (m < 1 || n < 1 || nrhs < 1) return status::kBadSize;
-  if (HasNonFinite(A, int64_t{m} * n) != 0 || HasNonFinite(B, int64_t{m} * nrhs) != 0) {
-    return status::kNonFinite;
-  }
-  int32_t kept = 0;
-  return SvdSolve(RowMajorRows<T>{A, B, n, nrhs}, m, n, nrhs, X, Cut{false, 0.0, keep}, &kept);
-}
-
-// pinv(A) into out, or over A when out is null. tol < 0 selects
-// max(m, n) S[0] eps; any other tol (NaN included) is used as given.
-template <typename T>
-StatusCode PseudoInverse(T* A, int32_t m, int32_t n, double tol, T* out) {
-  if (m < 1 || n < 1) return status::kBadSize;
-  const int32_t k = std::min(m, n);
-  const int64_t mn = int64_t{m} * n;
-
-  Factors<T> f;
-  if (!f.Allocate(m, n, k)) return status::kNoMemory;
-  WorkArray<T> result = AllocWork<T>(static_cast<size_t>(mn));
-  if (!result) return status::kNoMemory;
-
-  StatusCode st = SvdOf(A, m, n, f.U, f.S, f.V);
-  if (st != status::kOk) return st;
-  if (tol < 0.0) tol = std::max(m, n) * f.S[0] * kEpsilon;
-  (void)InvertKeptColumns(f.V, n, k, f.S, tol);
-  st = FormPinv(f, m, n, k, result.get());
-  if (st != status::kOk) return st;
-
-  T* dst = out != nullptr ? out : A;
-  std::memcpy(static_cast<void*>(dst), result.get(), static_cast<size_t>(mn) * sizeof(T));
-  return status::kOk;
 }
 
 }  // namespace
@@ -826,11 +757,72 @@ StatusCode GelsdSolve(const Rows& system, int32_t m, int32_t n, int32_t nrhs, do
 
 }  // namespace
 
-StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
-                            double* X, double rcond) {
-  const StatusCode st = GelsdSolve(RowMajorRows<double>{A, B, n, nrhs}, m, n, nrhs, X, rcond);
+template <typename T>
+StatusCode LeastSquaresTruncated(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X,
+                                 int32_t keep) {
+  if (m < 1 || n < 1 || nrhs < 1) return status::kBadSize;
+  if (HasNonFinite(A, int64_t{m} * n) != 0 || HasNonFinite(B, int64_t{m} * nrhs) != 0) {
+    return status::kNonFinite;
+  }
+  int32_t kept = 0;
+  return SvdSolve(RowMajorRows<T>{A, B, n, nrhs}, m, n, nrhs, X, Cut{false, 0.0, keep}, &kept);
+}
+
+// pinv(A) into out, or over A when out is null. tol < 0 selects
+// max(m, n) S[0] eps; any other tol (NaN included) is used as given.
+template <typename T>
+StatusCode PseudoInverse(T* A, int32_t m, int32_t n, double tol, T* out) {
+  if (m < 1 || n < 1) return status::kBadSize;
+  const int32_t k = std::min(m, n);
+  const int64_t mn = int64_t{m} * n;
+
+  Factors<T> f;
+  if (!f.Allocate(m, n, k)) return status::kNoMemory;
+  WorkArray<T> result = AllocWork<T>(static_cast<size_t>(mn));
+  if (!result) return status::kNoMemory;
+
+  StatusCode st = Svd(A, m, n, f.U, f.S, f.V, 0);
+  if (st != status::kOk) return st;
+  if (tol < 0.0) tol = std::max(m, n) * f.S[0] * kEpsilon;
+  (void)InvertKeptColumns(f.V, n, k, f.S, tol);
+  st = FormPinv(f, m, n, k, result.get());
+  if (st != status::kOk) return st;
+
+  T* dst = out != nullptr ? out : A;
+  std::memcpy(static_cast<void*>(dst), result.get(), static_cast<size_t>(mn) * sizeof(T));
+  return status::kOk;
+}
+
+template StatusCode LeastSquaresTruncated(const double*, int32_t, int32_t, const double*, int32_t,
+                                          double*, int32_t);
+template StatusCode LeastSquaresTruncated(const Complex*, int32_t, int32_t, const Complex*, int32_t,
+                                          Complex*, int32_t);
+template StatusCode PseudoInverse(double*, int32_t, int32_t, double, double*);
+template StatusCode PseudoInverse(Complex*, int32_t, int32_t, double, Complex*);
+
+// The real solve runs the minimum-norm driver, the complex one the
+// pseudo-inverse solve.
+template <typename T>
+StatusCode LeastSquares(const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X,
+                        double rcond) {
+  const RowMajorRows<T> system{A, B, n, nrhs};
+  StatusCode st = status::kOk;
+  if constexpr (kIsComplex<T>) {
+    st = PinvSolve(system, m, n, nrhs, X, rcond);
+  } else {
+    st = GelsdSolve(system, m, n, nrhs, X, rcond);
+  }
   call_record::Note(st);
   return st;
+}
+template StatusCode LeastSquares(const double*, int32_t, int32_t, const double*, int32_t, double*,
+                                 double);
+template StatusCode LeastSquares(const Complex*, int32_t, int32_t, const Complex*, int32_t,
+                                 Complex*, double);
+
+StatusCode LeastSquaresReal(const double* A, int32_t m, int32_t n, const double* B, int32_t nrhs,
+                            double* X, double rcond) {
+  return LeastSquares(A, m, n, B, nrhs, X, rcond);
 }
 
 // ---- pseudo-inverse solves and pseudo-inverses ------------------------------------------
@@ -844,17 +836,14 @@ StatusCode LeastSquaresPinvReal(const double* A, int32_t m, int32_t n, const dou
 
 StatusCode LeastSquaresComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
                                int32_t nrhs, Complex* X, double rcond) {
-  const StatusCode st = PinvSolve(RowMajorRows<Complex>{A, B, n, nrhs}, m, n, nrhs, X, rcond);
-  call_record::Note(st);
-  return st;
+  return LeastSquares(A, m, n, B, nrhs, X, rcond);
 }
 
-// The forward prediction problem of x, solved as LeastSquaresReal and
-// LeastSquaresComplex solve it formed (the same screens, in the same order, and
-// the same statuses). A tall one is folded straight from x.
-namespace {
+// The forward prediction problem of x, solved as LeastSquares solves it formed
+// (the same screens, in the same order, and the same statuses). A tall one is
+// folded straight from x.
 template <typename T>
-StatusCode ForwardSolve(const T* x, int32_t n, int32_t p, T* w, double rcond) {
+StatusCode ForwardLeastSquares(const T* x, int32_t n, int32_t p, T* w, double rcond) {
   const int32_t m = n - p;
   if (m < 1 || p < 1 || !IsTall(m, p)) {
     const int64_t mp = int64_t{std::max(m, 0)} * std::max(p, 0);
@@ -863,11 +852,7 @@ StatusCode ForwardSolve(const T* x, int32_t n, int32_t p, T* w, double rcond) {
     for (int32_t i = 0; i < m; ++i) {
       for (int32_t j = 0; j < p; ++j) A[int64_t{i} * p + j] = x[i + p - 1 - j];
     }
-    if constexpr (kIsComplex<T>) {
-      return LeastSquaresComplex(A.get(), m, p, x + p, 1, w, rcond);
-    } else {
-      return LeastSquaresReal(A.get(), m, p, x + p, 1, w, rcond);
-    }
+    return LeastSquares(A.get(), m, p, x + p, 1, w, rcond);
   }
   const HankelRows<T> system{x, p, true};
   StatusCode st = status::kOk;
@@ -879,26 +864,8 @@ StatusCode ForwardSolve(const T* x, int32_t n, int32_t p, T* w, double rcond) {
   call_record::Note(st);
   return st;
 }
-}  // namespace
-
-StatusCode ForwardLeastSquaresReal(const double* x, int32_t n, int32_t p, double* w, double rcond) {
-  return ForwardSolve<double>(x, n, p, w, rcond);
-}
-
-StatusCode ForwardLeastSquaresComplex(const Complex* x, int32_t n, int32_t p, Complex* w,
-                                      double rcond) {
-  return ForwardSolve<Complex>(x, n, p, w, rcond);
-}
-
-StatusCode LeastSquaresTruncatedReal(const double* A, int32_t m, int32_t n, const double* B,
-                                     int32_t nrhs, double* X, int32_t keep) {
-  return TruncatedSolve<double>(A, m, n, B, nrhs, X, keep);
-}
-
-StatusCode LeastSquaresTruncatedComplex(const Complex* A, int32_t m, int32_t n, const Complex* B,
-                                        int32_t nrhs, Complex* X, int32_t keep) {
-  return TruncatedSolve<Complex>(A, m, n, B, nrhs, X, keep);
-}
+template StatusCode ForwardLeastSquares(const double*, int32_t, int32_t, double*, double);
+template StatusCode ForwardLeastSquares(const Complex*, int32_t, int32_t, Complex*, double);
 
 double TruncationThreshold(const double* S, int32_t count, int32_t keep) {
   if (keep == count) return S[keep - 1] * 0.5;
@@ -917,19 +884,13 @@ StatusCode QrReduceHankel(const T* x, int32_t m, int32_t n, T* R) {
   TransposeTo(col.get(), n, n, R, false);
   return status::kOk;
 }
-
-StatusCode QrReduceHankelReal(const double* x, int32_t m, int32_t n, double* R) {
-  return QrReduceHankel<double>(x, m, n, R);
-}
-
-StatusCode QrReduceHankelComplex(const Complex* x, int32_t m, int32_t n, Complex* R) {
-  return QrReduceHankel<Complex>(x, m, n, R);
-}
+template StatusCode QrReduceHankel(const double*, int32_t, int32_t, double*);
+template StatusCode QrReduceHankel(const Complex*, int32_t, int32_t, Complex*);
 
 StatusCode PseudoInverseReal(double* A, int32_t m, int32_t n, double tol, double* out) {
-  return PseudoInverse<double>(A, m, n, tol, out);
+  return PseudoInverse(A, m, n, tol, out);
 }
 
 StatusCode PseudoInverseComplex(Complex* A, int32_t m, int32_t n, double tol, Complex* out) {
-  return PseudoInverse<Complex>(A, m, n, tol, out);
+  return PseudoInverse(A, m, n, tol, out);
 }

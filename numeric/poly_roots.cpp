@@ -4,14 +4,17 @@
 // root. The order in which roots are written is part of the estimators' output,
 // so every step below runs in a fixed order.
 //
-// Arithmetic is spelled out on (re, im) pairs rather than left to
-// std::complex operators, so that every product and quotient is formed the same
-// way on every compiler.
+// Sums, differences, negation and real scaling use std::complex's operators,
+// which work part by part. Products, quotients and moduli are spelled out on
+// (re, im) pairs, so that every one is formed the same way on every compiler:
+// the library's product adds a NaN-recovery call, its quotient and modulus
+// scale differently.
 
 #include <algorithm>
 #include <cmath>
 #include <cstring>
 
+#include "core/scalar.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
@@ -21,12 +24,6 @@ Complex Mul(Complex x, Complex y) {
   return {x.real() * y.real() - x.imag() * y.imag(), x.real() * y.imag() + x.imag() * y.real()};
 }
 
-Complex Add(Complex x, Complex y) { return {x.real() + y.real(), x.imag() + y.imag()}; }
-Complex Sub(Complex x, Complex y) { return {x.real() - y.real(), x.imag() - y.imag()}; }
-Complex Neg(Complex x) { return {-x.real(), -x.imag()}; }
-Complex Scale(double s, Complex x) { return {s * x.real(), s * x.imag()}; }
-
-double AbsSq(Complex x) { return x.real() * x.real() + x.imag() * x.imag(); }
 double Abs(Complex x) { return std::hypot(x.real(), x.imag()); }  // no overflow of the squares
 bool IsZero(Complex x) { return x.real() == 0.0 && x.imag() == 0.0; }
 
@@ -45,14 +42,14 @@ Complex ScaledDivide(Complex num, Complex den) {
 // p(z) = c[0] + c[1] z + ... + c[m] z^m by Horner's rule.
 Complex EvalPoly(const Complex* c, ptrdiff_t m, Complex z) {
   Complex p = c[m];
-  for (ptrdiff_t k = m - 1; k >= 0; --k) p = Add(Mul(p, z), c[k]);
+  for (ptrdiff_t k = m - 1; k >= 0; --k) p = Mul(p, z) + c[k];
   return p;
 }
 
 // p'(z) by Horner's rule on the derivative coefficients k c[k].
 Complex EvalDerivative(const Complex* c, ptrdiff_t m, Complex z) {
-  Complex d = Scale(static_cast<double>(m), c[m]);
-  for (ptrdiff_t k = m - 1; k >= 1; --k) d = Add(Mul(d, z), Scale(static_cast<double>(k), c[k]));
+  Complex d = static_cast<double>(m) * c[m];
+  for (ptrdiff_t k = m - 1; k >= 1; --k) d = Mul(d, z) + static_cast<double>(k) * c[k];
   return d;
 }
 
@@ -62,7 +59,7 @@ Complex TurnHalf(Complex remembered) { return Mul(remembered, Complex(-0.4, -0.3
 
 // Degree 1: c[0] + c[1] z.
 void SolveLinear(const Complex* c, Complex* roots, ptrdiff_t* written) {
-  roots[(*written)++] = ScaledDivide(Neg(c[0]), c[1]);
+  roots[(*written)++] = ScaledDivide(-c[0], c[1]);
 }
 
 // Degree 2: c[0] + c[1] z + c[2] z^2, in the cancellation-free form.
@@ -72,19 +69,19 @@ void SolveQuadratic(const Complex* coef, Complex* roots, ptrdiff_t* written) {
   const Complex c = coef[0];
   if (IsZero(c)) {
     roots[(*written)++] = Complex(0.0, 0.0);
-    roots[(*written)++] = ScaledDivide(Neg(b), a);
+    roots[(*written)++] = ScaledDivide(-b, a);
     return;
   }
-  const Complex d = Sub(Mul(b, b), Scale(4.0, Mul(a, c)));
+  const Complex d = Mul(b, b) - 4.0 * Mul(a, c);
   double sr = 0.0;
   double si = 0.0;
   (void)ComplexSqrt(d.real(), d.imag(), &sr, &si);
   const Complex s(sr, si);
-  Complex q = Add(b, s);
-  const Complex q_minus = Sub(b, s);
-  if (AbsSq(q_minus) > AbsSq(q)) q = q_minus;
-  roots[(*written)++] = ScaledDivide(Neg(q), Scale(2.0, a));
-  roots[(*written)++] = ScaledDivide(Scale(-2.0, c), q);
+  Complex q = b + s;
+  const Complex q_minus = b - s;
+  if (AbsSquared(q_minus) > AbsSquared(q)) q = q_minus;
+  roots[(*written)++] = ScaledDivide(-q, 2.0 * a);
+  roots[(*written)++] = ScaledDivide(-2.0 * c, q);
 }
 
 // One root of the degree-m polynomial c[0..m] (m >= 3) by the damped Newton
@@ -95,17 +92,18 @@ StatusCode NewtonRoot(const Complex* c, ptrdiff_t m, int32_t max_iterations, Com
   double r = 1.0;
   for (ptrdiff_t k = 1; k <= m; ++k) {
     if (IsZero(c[k])) continue;
-    const double term = std::pow(AbsSq(ScaledDivide(c[0], c[k])), 0.5 / static_cast<double>(k));
+    const double term =
+        std::pow(AbsSquared(ScaledDivide(c[0], c[k])), 0.5 / static_cast<double>(k));
     r = std::min(r, term);
   }
   r *= 0.5;
   Complex u(1.0, 0.0);
   if (!IsZero(c[1])) {
-    const Complex w = ScaledDivide(Neg(c[0]), c[1]);
+    const Complex w = ScaledDivide(-c[0], c[1]);
     const double len = Abs(w);
     if (len > 0.0 && std::isfinite(len)) u = Complex(w.real() / len, w.imag() / len);
   }
-  Complex z = Scale(r, u);
+  Complex z = r * u;
   Complex pz = EvalPoly(c, m, z);
   double f = Abs(pz);
   // |p| = 0 exactly is a root wherever it is met, the start point included.
@@ -125,17 +123,17 @@ StatusCode NewtonRoot(const Complex* c, ptrdiff_t m, int32_t max_iterations, Com
     if (++iterations > max_iterations) return status::kNoConvergence;
     const Complex dp = EvalDerivative(c, m, z);
     if (std::isnan(dp.real()) || std::isnan(dp.imag())) return status::kRootNaN;
-    Complex dz = IsZero(dp) ? TurnHalf(remembered) : ScaledDivide(Neg(pz), dp);
+    Complex dz = IsZero(dp) ? TurnHalf(remembered) : ScaledDivide(-pz, dp);
     // Step-length limit: at most three times the last move, and turned so that
     // a bounded step does not keep heading along a bad direction.
     const double limit = 3.0 * last_move;
     const double len = Abs(dz);
-    if (len > limit) dz = Scale(limit / len, Mul(dz, Complex(0.8, 0.6)));
+    if (len > limit) dz = (limit / len) * Mul(dz, Complex(0.8, 0.6));
 
     Complex best;
     double f_best = 0.0;
     for (;;) {
-      const Complex z1 = Add(z, dz);
+      const Complex z1 = z + dz;
       const double f1 = Abs(EvalPoly(c, m, z1));
       if (f1 < f) {
         // Keep going along dz while |p| falls: a root of multiplicity j is
@@ -143,7 +141,7 @@ StatusCode NewtonRoot(const Complex* c, ptrdiff_t m, int32_t max_iterations, Com
         best = z1;
         f_best = f1;
         for (ptrdiff_t j = 2; j <= m; ++j) {
-          const Complex zj = Add(z, Scale(static_cast<double>(j), dz));
+          const Complex zj = z + static_cast<double>(j) * dz;
           const double fj = Abs(EvalPoly(c, m, zj));
           if (!(fj < f_best)) break;
           best = zj;
@@ -152,10 +150,10 @@ StatusCode NewtonRoot(const Complex* c, ptrdiff_t m, int32_t max_iterations, Com
         break;
       }
       // Overshoot: shorter and turned steps from the same point.
-      const Complex trials[3] = {Scale(0.5, dz), Scale(0.25, dz), Mul(dz, Complex(0.2, 0.15))};
+      const Complex trials[3] = {0.5 * dz, 0.25 * dz, Mul(dz, Complex(0.2, 0.15))};
       bool accepted = false;
       for (const Complex& t : trials) {
-        const Complex zt = Add(z, t);
+        const Complex zt = z + t;
         const double ft = Abs(EvalPoly(c, m, zt));
         if (ft < f) {
           best = zt;
@@ -188,7 +186,7 @@ StatusCode NewtonRoot(const Complex* c, ptrdiff_t m, int32_t max_iterations, Com
     z = best;
     f = f_best;
     pz = EvalPoly(c, m, z);
-    last_move = Abs(Sub(z, z_prev));
+    last_move = Abs(z - z_prev);
     if (f == 0.0 || last_move < 1e-10 * Abs(z)) {
       *root = z;
       return status::kOk;
@@ -199,7 +197,7 @@ StatusCode NewtonRoot(const Complex* c, ptrdiff_t m, int32_t max_iterations, Com
 // Divides c[0..m] by (z - root), highest coefficient first, drops the remainder
 // and moves the quotient down to c[0..m-1].
 void Deflate(Complex* c, ptrdiff_t m, Complex root) {
-  for (ptrdiff_t k = m - 1; k >= 0; --k) c[k] = Add(c[k], Mul(root, c[k + 1]));
+  for (ptrdiff_t k = m - 1; k >= 0; --k) c[k] = c[k] + Mul(root, c[k + 1]);
   std::memmove(c, c + 1, static_cast<size_t>(m) * sizeof(Complex));
 }
 

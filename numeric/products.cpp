@@ -8,10 +8,8 @@
 #include <cmath>
 #include <cstring>
 #include <limits>
-#include <type_traits>
 
 #include "numeric/lapack_boundary.h"
-#include "numeric/mat_mul.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
 
@@ -39,12 +37,7 @@ inline double FlipSign(double v) {
 template <typename T>
 void FillQuietNaN(T* C, int64_t count) {
   const double nan = std::numeric_limits<double>::quiet_NaN();
-  T value;
-  if constexpr (std::is_same_v<T, double>) {
-    value = nan;
-  } else {
-    value = T(nan, nan);
-  }
+  const T value = MakeScalar<T>(nan, nan);
   for (int64_t i = 0; i < count; ++i) C[i] = value;
 }
 
@@ -56,7 +49,7 @@ void GemmInto(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C) {
     lapack::Gemv(m, k, A, B, C);
     return;
   }
-  if constexpr (std::is_same_v<T, double>) {
+  if constexpr (!kIsComplex<T>) {
     // Only the real product is blocked.
     if (m > kBlockRows && k > kBlockMinInner && n > kBlockMinCols) {
       const int32_t blocks = m / kBlockRows;
@@ -93,22 +86,19 @@ StatusCode MatMul(const T* A, const T* B, int32_t m, int32_t k, int32_t n, T* C)
   return status::kOk;
 }
 
-template StatusCode MatMul<double>(const double*, const double*, int32_t, int32_t, int32_t,
-                                   double*);
-template StatusCode MatMul<Complex>(const Complex*, const Complex*, int32_t, int32_t, int32_t,
-                                    Complex*);
+template StatusCode MatMul(const double*, const double*, int32_t, int32_t, int32_t, double*);
+template StatusCode MatMul(const Complex*, const Complex*, int32_t, int32_t, int32_t, Complex*);
 
 StatusCode MatMulReal(const double* A, const double* B, int32_t m, int32_t k, int32_t n,
                       double* C) {
-  return MatMul<double>(A, B, m, k, n, C);
+  return MatMul(A, B, m, k, n, C);
 }
 
 StatusCode MatMulComplex(const Complex* A, const Complex* B, int32_t m, int32_t k, int32_t n,
                          Complex* C) {
-  return MatMul<Complex>(A, B, m, k, n, C);
+  return MatMul(A, B, m, k, n, C);
 }
 
-namespace {
 template <typename T>
 StatusCode AdjointMatMul(const T* A, const T* B, int32_t k, int32_t m, int32_t n, T* C) {
   if (m < 0 || k < 0 || n < 0) return status::kNegativeDim;
@@ -120,21 +110,13 @@ StatusCode AdjointMatMul(const T* A, const T* B, int32_t k, int32_t m, int32_t n
   lapack::Gemm(m, n, k, A, B, C, true);
   return status::kOk;
 }
-}  // namespace
-
-StatusCode AdjointMatMulReal(const double* A, const double* B, int32_t k, int32_t m, int32_t n,
-                             double* C) {
-  return AdjointMatMul<double>(A, B, k, m, n, C);
-}
-StatusCode AdjointMatMulComplex(const Complex* A, const Complex* B, int32_t k, int32_t m, int32_t n,
-                                Complex* C) {
-  return AdjointMatMul<Complex>(A, B, k, m, n, C);
-}
+template StatusCode AdjointMatMul(const double*, const double*, int32_t, int32_t, int32_t, double*);
+template StatusCode AdjointMatMul(const Complex*, const Complex*, int32_t, int32_t, int32_t,
+                                  Complex*);
 
 // ---- Hankel products -------------------------------------------------------------------
 // H is formed a block of rows at a time, each row a run of the reversed record:
 // H[i][j] = x[i + cols - 1 - j] = reversed[rows - 1 - i + j].
-namespace {
 template <typename T>
 StatusCode HankelProduct(const T* x, int32_t rows, int32_t cols, const T* V, int32_t k, T* Z) {
   if (rows < 1 || cols < 1 || k < 1) return status::kBadSize;
@@ -154,16 +136,9 @@ StatusCode HankelProduct(const T* x, int32_t rows, int32_t cols, const T* V, int
   }
   return status::kOk;
 }
-}  // namespace
-
-StatusCode HankelProductReal(const double* x, int32_t rows, int32_t cols, const double* V,
-                             int32_t k, double* Z) {
-  return HankelProduct<double>(x, rows, cols, V, k, Z);
-}
-StatusCode HankelProductComplex(const Complex* x, int32_t rows, int32_t cols, const Complex* V,
-                                int32_t k, Complex* Z) {
-  return HankelProduct<Complex>(x, rows, cols, V, k, Z);
-}
+template StatusCode HankelProduct(const double*, int32_t, int32_t, const double*, int32_t, double*);
+template StatusCode HankelProduct(const Complex*, int32_t, int32_t, const Complex*, int32_t,
+                                  Complex*);
 
 // ---- vector helpers ----------------------------------------------------------------
 
@@ -173,10 +148,17 @@ StatusCode DotReal(const double* x, const double* y, int32_t n, double* result) 
   return status::kOk;
 }
 
-StatusCode VecSubReal(const double* a, const double* b, int32_t n, double* out) {
+template <typename T>
+StatusCode VecSub(const T* a, const T* b, int32_t n, T* out) {
   if (n < 1) return status::kBadSize;
   for (int32_t i = 0; i < n; ++i) out[i] = a[i] - b[i];
   return status::kOk;
+}
+template StatusCode VecSub(const double*, const double*, int32_t, double*);
+template StatusCode VecSub(const Complex*, const Complex*, int32_t, Complex*);
+
+StatusCode VecSubReal(const double* a, const double* b, int32_t n, double* out) {
+  return VecSub(a, b, n, out);
 }
 
 // ---- finiteness screen ---------------------------------------------------------------
@@ -202,9 +184,18 @@ int32_t HasNonFiniteReal(const double* x, int64_t n) {
 }
 
 // A complex array is the array of its 2n parts, real part first.
-int32_t HasNonFiniteComplex(const Complex* x, int64_t n) {
-  return HasNonFiniteReal(reinterpret_cast<const double*>(x), 2 * n);
+template <typename T>
+int32_t HasNonFinite(const T* x, int64_t n) {
+  if constexpr (kIsComplex<T>) {
+    return HasNonFiniteReal(reinterpret_cast<const double*>(x), 2 * n);
+  } else {
+    return HasNonFiniteReal(x, n);
+  }
 }
+template int32_t HasNonFinite(const double*, int64_t);
+template int32_t HasNonFinite(const Complex*, int64_t);
+
+int32_t HasNonFiniteComplex(const Complex* x, int64_t n) { return HasNonFinite(x, n); }
 
 // ---- transposes ----------------------------------------------------------------------
 
@@ -222,7 +213,7 @@ void TransposeTo(const T* A, int32_t m, int32_t n, T* out, bool conjugate) {
         const T* row = A + int64_t{i} * n;
         for (int32_t j = j0; j < j1; ++j) {
           T v = row[j];
-          if constexpr (!std::is_same_v<T, double>) {
+          if constexpr (kIsComplex<T>) {
             if (conjugate) v.imag(FlipSign(v.imag()));
           }
           out[int64_t{j} * m + i] = v;
@@ -232,24 +223,16 @@ void TransposeTo(const T* A, int32_t m, int32_t n, T* out, bool conjugate) {
   }
 }
 
-template void TransposeTo<double>(const double*, int32_t, int32_t, double*, bool);
-template void TransposeTo<Complex>(const Complex*, int32_t, int32_t, Complex*, bool);
+template void TransposeTo(const double*, int32_t, int32_t, double*, bool);
+template void TransposeTo(const Complex*, int32_t, int32_t, Complex*, bool);
 
-namespace {
-
-// out (n-by-m) = A^T, or A^H for complex A; out does not overlap A.
-template <typename T>
-void TransposeInto(const T* A, int32_t m, int32_t n, T* out) {
-  TransposeTo(A, m, n, out, !std::is_same_v<T, double>);
-}
-
-// The transpose in `out`, or back over A (through scratch) when out is null or
+// The adjoint in `out`, or back over A (through scratch) when out is null or
 // is A itself.
 template <typename T>
-StatusCode Transpose(T* A, int32_t m, int32_t n, T* out) {
+StatusCode Adjoint(T* A, int32_t m, int32_t n, T* out) {
   if (m < 1 || n < 1) return status::kBadSize;
   if (out != nullptr && out != A) {
-    TransposeInto(A, m, n, out);
+    TransposeTo(A, m, n, out, kIsComplex<T>);
     return status::kOk;
   }
   const int64_t count = int64_t{m} * n;
@@ -257,17 +240,17 @@ StatusCode Transpose(T* A, int32_t m, int32_t n, T* out) {
   const StatusCode st = NumAlloc(&raw, static_cast<size_t>(count) * sizeof(T));
   if (st != status::kOk) return st;
   T* scratch = static_cast<T*>(raw);
-  TransposeInto(A, m, n, scratch);
+  TransposeTo(A, m, n, scratch, kIsComplex<T>);
   std::memcpy(static_cast<void*>(A), scratch, static_cast<size_t>(count) * sizeof(T));
   return MergeStatus(status::kOk, NumFree(raw));
 }
-
-}  // namespace
+template StatusCode Adjoint(double*, int32_t, int32_t, double*);
+template StatusCode Adjoint(Complex*, int32_t, int32_t, Complex*);
 
 StatusCode TransposeReal(double* A, int32_t m, int32_t n, double* out) {
-  return Transpose<double>(A, m, n, out);
+  return Adjoint(A, m, n, out);
 }
 
 StatusCode ConjTransposeComplex(Complex* A, int32_t m, int32_t n, Complex* out) {
-  return Transpose<Complex>(A, m, n, out);
+  return Adjoint(A, m, n, out);
 }

@@ -7,32 +7,10 @@
 
 #include <algorithm>
 #include <cstring>
-#include <type_traits>
 
 #include "numeric/lapack_boundary.h"
 #include "numeric/numeric.h"
 #include "numeric/work.h"
-
-namespace {
-
-template <typename T>
-int32_t HasNonFinite(const T* x, int64_t n) {
-  if constexpr (std::is_same_v<T, double>) {
-    return HasNonFiniteReal(x, n);
-  } else {
-    return HasNonFiniteComplex(x, n);
-  }
-}
-
-// n-by-m conjugate transpose of the m-by-n A into out (plain transpose for real).
-template <typename T>
-StatusCode AdjointInto(T* A, int32_t m, int32_t n, T* out) {
-  if constexpr (std::is_same_v<T, double>) {
-    return TransposeReal(A, m, n, out);
-  } else {
-    return ConjTransposeComplex(A, m, n, out);
-  }
-}
 
 template <typename T>
 StatusCode Svd(const T* A, int32_t m, int32_t n, T* U, double* S, T* V, int32_t full) {
@@ -64,7 +42,7 @@ StatusCode Svd(const T* A, int32_t m, int32_t n, T* U, double* S, T* V, int32_t 
   if (st != status::kOk) return st;
 
   // V (n-by-q) = conj of U', whose column-major array reads row-major as q-by-n.
-  st = AdjointInto(left, q, n, V);
+  st = Adjoint(left, q, n, V);
   if (st != status::kOk) return st;
   std::memcpy(S, sv, static_cast<size_t>(k) * sizeof(double));
   // V'^H, p-by-m column-major with ldvt = p, is exactly the row-major m-by-p U.
@@ -87,7 +65,7 @@ StatusCode SvdLeading(const T* A, int32_t m, int32_t n, int32_t count, T* U, dou
   if (!block || !sv) return status::kNoMemory;
   T* u = block.get();
   T* v = u + uk;
-  const StatusCode st = Svd<T>(A, m, n, u, sv.get(), v, 0);
+  const StatusCode st = Svd(A, m, n, u, sv.get(), v, 0);
   if (st != status::kOk) return st;
   std::memcpy(S, sv.get(), static_cast<size_t>(count) * sizeof(double));
   for (int32_t i = 0; i < m; ++i) {
@@ -115,37 +93,23 @@ StatusCode SvdLeadingRight(const T* A, int32_t m, int32_t n, int32_t count, doub
   const StatusCode st = lapack::LeadingLeftSvd(n, m, at.get(), n, count, S, left.get(), n);
   if (st != status::kOk) return st;
   // The column-major n-by-count left factor reads row-major as count-by-n.
-  return AdjointInto(left.get(), count, n, V);
+  return Adjoint(left.get(), count, n, V);
 }
 
-}  // namespace
-
-StatusCode SvdLeadingRightReal(const double* A, int32_t m, int32_t n, int32_t count, double* S,
-                               double* V) {
-  return SvdLeadingRight<double>(A, m, n, count, S, V);
-}
-
-StatusCode SvdLeadingRightComplex(const Complex* A, int32_t m, int32_t n, int32_t count, double* S,
-                                  Complex* V) {
-  return SvdLeadingRight<Complex>(A, m, n, count, S, V);
-}
-
-StatusCode SvdLeadingReal(const double* A, int32_t m, int32_t n, int32_t count, double* U,
-                          double* S, double* V) {
-  return SvdLeading<double>(A, m, n, count, U, S, V);
-}
-
-StatusCode SvdLeadingComplex(const Complex* A, int32_t m, int32_t n, int32_t count, Complex* U,
-                             double* S, Complex* V) {
-  return SvdLeading<Complex>(A, m, n, count, U, S, V);
-}
+template StatusCode Svd(const double*, int32_t, int32_t, double*, double*, double*, int32_t);
+template StatusCode Svd(const Complex*, int32_t, int32_t, Complex*, double*, Complex*, int32_t);
+template StatusCode SvdLeading(const double*, int32_t, int32_t, int32_t, double*, double*, double*);
+template StatusCode SvdLeading(const Complex*, int32_t, int32_t, int32_t, Complex*, double*,
+                               Complex*);
+template StatusCode SvdLeadingRight(const double*, int32_t, int32_t, int32_t, double*, double*);
+template StatusCode SvdLeadingRight(const Complex*, int32_t, int32_t, int32_t, double*, Complex*);
 
 StatusCode SvdReal(const double* A, int32_t m, int32_t n, double* U, double* S, double* V,
                    int32_t full) {
-  return Svd<double>(A, m, n, U, S, V, full);
+  return Svd(A, m, n, U, S, V, full);
 }
 
 StatusCode SvdComplex(const Complex* A, int32_t m, int32_t n, Complex* U, double* S, Complex* V,
                       int32_t full) {
-  return Svd<Complex>(A, m, n, U, S, V, full);
+  return Svd(A, m, n, U, S, V, full);
 }

@@ -107,17 +107,8 @@ void CheckProducts() {
     };
     for (T& e : V) e = draw();
     for (T& e : U) e = draw();
-    StatusCode st;
-    if constexpr (kIsCx<T>) {
-      st = HankelProductFftComplex(x.data(), s.rows, s.cols, V.data(), k, Z.data());
-      ASSERT_EQ(st, 0);
-      st = HankelAdjointProductFftComplex(x.data(), s.rows, s.cols, U.data(), k, W.data());
-    } else {
-      st = HankelProductFftReal(x.data(), s.rows, s.cols, V.data(), k, Z.data());
-      ASSERT_EQ(st, 0);
-      st = HankelAdjointProductFftReal(x.data(), s.rows, s.cols, U.data(), k, W.data());
-    }
-    ASSERT_EQ(st, 0);
+    ASSERT_EQ(HankelProductFft(x.data(), s.rows, s.cols, V.data(), k, Z.data()), 0);
+    ASSERT_EQ(HankelAdjointProductFft(x.data(), s.rows, s.cols, U.data(), k, W.data()), 0);
     for (int32_t c = 0; c < k; ++c) {
       const auto z = Direct(x, s.rows, s.cols, V.data() + c, k, false);
       const auto w = Direct(x, s.rows, s.cols, U.data() + c, k, true);
@@ -139,13 +130,7 @@ void CheckTriplets() {
     const std::vector<T> x = Record<T>(s.kind, s.rows + s.cols - 1, modes, 17);
     std::vector<double> S(size_t(s.count));
     std::vector<T> U(size_t(s.rows) * s.count), V(size_t(s.cols) * s.count);
-    StatusCode st;
-    if constexpr (kIsCx<T>) {
-      st = HankelSvdLeadingComplex(x.data(), s.rows, s.cols, s.count, S.data(), U.data(), V.data());
-    } else {
-      st = HankelSvdLeadingReal(x.data(), s.rows, s.cols, s.count, S.data(), U.data(), V.data());
-    }
-    ASSERT_EQ(st, 0);
+    ASSERT_EQ(HankelSvdLeading(x.data(), s.rows, s.cols, s.count, S.data(), U.data(), V.data()), 0);
     // The dense singular values of the formed matrix.
     std::vector<T> H(size_t(s.rows) * s.cols);
     for (int32_t i = 0; i < s.rows; ++i)
@@ -154,11 +139,7 @@ void CheckTriplets() {
     const int32_t r = std::min(s.rows, s.cols);
     std::vector<double> Sd(static_cast<size_t>(r));
     std::vector<T> Ud(size_t(s.rows) * r), Vd(size_t(s.cols) * r);
-    if constexpr (kIsCx<T>)
-      st = SvdComplex(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0);
-    else
-      st = SvdReal(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0);
-    ASSERT_EQ(st, 0);
+    ASSERT_EQ(Svd(H.data(), s.rows, s.cols, Ud.data(), Sd.data(), Vd.data(), 0), 0);
     const double s1 = Sd[0];
     for (int32_t i = 0; i < s.count; ++i) {
       EXPECT_NEAR(S[size_t(i)], Sd[size_t(i)], 1e-12 * s1) << "value " << i;
@@ -196,14 +177,15 @@ TEST(HankelFft, LeadingTripletsMatchDenseSvd) {
 
 TEST(HankelFft, RefusesBadSizesAndCountsAllocations) {
   std::vector<double> x(64, 1.0), S(4), V(32 * 4);
-  EXPECT_EQ(HankelSvdLeadingReal(x.data(), 33, 32, 0, S.data(), nullptr, V.data()), -20003);
-  EXPECT_EQ(HankelSvdLeadingReal(x.data(), 33, 32, 33, S.data(), nullptr, V.data()), -20003);
-  EXPECT_EQ(HankelSvdLeadingReal(x.data(), 0, 32, 1, S.data(), nullptr, V.data()), -20003);
+  EXPECT_EQ(HankelSvdLeading<double>(x.data(), 33, 32, 0, S.data(), nullptr, V.data()), -20003);
+  EXPECT_EQ(HankelSvdLeading<double>(x.data(), 33, 32, 33, S.data(), nullptr, V.data()), -20003);
+  EXPECT_EQ(HankelSvdLeading<double>(x.data(), 0, 32, 1, S.data(), nullptr, V.data()), -20003);
   // Every allocation failed in turn: the failure is returned and nothing leaks.
   const std::vector<double> rec = Record<double>(kModes, 64, 2, 3);
   for (int64_t fail = 1;; ++fail) {
     NumAllocFailAt(fail, false);
-    const StatusCode st = HankelSvdLeadingReal(rec.data(), 33, 32, 4, S.data(), nullptr, V.data());
+    const StatusCode st =
+        HankelSvdLeading<double>(rec.data(), 33, 32, 4, S.data(), nullptr, V.data());
     const bool reached = NumAllocAttempts() >= fail;
     NumAllocFailAt(0, false);
     EXPECT_EQ(NumAllocOutstanding(), 0);
@@ -318,10 +300,7 @@ std::vector<T> Formed(const std::vector<T>& x, int32_t p) {
 
 template <typename T>
 StatusCode Leading(const std::vector<T>& x, int32_t p, int32_t count, double* S, T* U, T* V) {
-  if constexpr (kIsCx<T>)
-    return ForwardBackwardSvdLeadingComplex(x.data(), int32_t(x.size()), p, count, S, U, V);
-  else
-    return ForwardBackwardSvdLeadingReal(x.data(), int32_t(x.size()), p, count, S, U, V);
+  return ForwardBackwardSvdLeading(x.data(), int32_t(x.size()), p, count, S, U, V);
 }
 
 struct Shape {
@@ -412,7 +391,7 @@ TEST(ForwardBackwardFft, RefusesBadSizesAndCountsAllocations) {
                                     {60, 40, 41},
                                     {60, 50, 21},
                                     {0, 0, 1}}) {
-    EXPECT_EQ(ForwardBackwardSvdLeadingComplex(x.data(), n, p, count, S.data(), U.data(), V.data()),
+    EXPECT_EQ(ForwardBackwardSvdLeading(x.data(), n, p, count, S.data(), U.data(), V.data()),
               -20003)
         << n << " " << p << " " << count;
   }
@@ -420,7 +399,7 @@ TEST(ForwardBackwardFft, RefusesBadSizesAndCountsAllocations) {
   for (int64_t fail = 1;; ++fail) {
     NumAllocFailAt(fail, false);
     const StatusCode st =
-        ForwardBackwardSvdLeadingComplex(rec.data(), 60, 20, 5, S.data(), U.data(), V.data());
+        ForwardBackwardSvdLeading(rec.data(), 60, 20, 5, S.data(), U.data(), V.data());
     const bool reached = NumAllocAttempts() >= fail;
     NumAllocFailAt(0, false);
     EXPECT_EQ(NumAllocOutstanding(), 0);

@@ -145,13 +145,8 @@ StatusCode Twin(R real, X complex, P* first, Args... rest) {
 }
 
 const auto Svd = [](auto... a) { return Twin(SvdReal, SvdComplex, a...); };
-const auto SvdLeading = [](auto... a) { return Twin(SvdLeadingReal, SvdLeadingComplex, a...); };
-const auto SvdRight = [](auto... a) {
-  return Twin(SvdLeadingRightReal, SvdLeadingRightComplex, a...);
-};
-const auto QrHankel = [](auto... a) {
-  return Twin(QrReduceHankelReal, QrReduceHankelComplex, a...);
-};
+const auto SvdRight = [](auto... a) { return SvdLeadingRight(a...); };
+const auto QrHankel = [](auto... a) { return QrReduceHankel(a...); };
 const auto Pinv = [](auto... a) { return Twin(PseudoInverseReal, PseudoInverseComplex, a...); };
 const auto MatMul = [](auto... a) { return Twin(MatMulReal, MatMulComplex, a...); };
 const auto Transpose = [](auto... a) { return Twin(TransposeReal, ConjTransposeComplex, a...); };
@@ -162,10 +157,10 @@ template <typename T>
 StatusCode Solve(int solver, const T* A, int32_t m, int32_t n, const T* B, int32_t nrhs, T* X,
                  double rcond, int32_t keep) {
   if constexpr (kIsCx<T>)
-    return solver == kTruncated ? LeastSquaresTruncatedComplex(A, m, n, B, nrhs, X, keep)
+    return solver == kTruncated ? LeastSquaresTruncated(A, m, n, B, nrhs, X, keep)
                                 : LeastSquaresComplex(A, m, n, B, nrhs, X, rcond);
   else if (solver == kTruncated)
-    return LeastSquaresTruncatedReal(A, m, n, B, nrhs, X, keep);
+    return LeastSquaresTruncated(A, m, n, B, nrhs, X, keep);
   else if (solver == kPinv)
     return LeastSquaresPinvReal(A, m, n, B, nrhs, X, rcond);
   else
@@ -362,8 +357,7 @@ TYPED_TEST(Dense, ForwardSolveIsTheFormedSolve) {
     std::vector<T> a(size_t(m) * p), w(p, T(7.0)), want(p, T(7.0));
     for (int32_t i = 0; i < m; ++i)
       for (int32_t j = 0; j < p; ++j) a[size_t(i) * p + j] = x[i + p - 1 - j];
-    const StatusCode got =
-        Twin(ForwardLeastSquaresReal, ForwardLeastSquaresComplex, x.data(), n, p, w.data(), -1.0);
+    const StatusCode got = ForwardLeastSquares(x.data(), n, p, w.data(), -1.0);
     EXPECT_EQ(got, Solve(kFirstSolver<T>, a.data(), m, p, x.data() + p, 1, want.data(), -1.0, 0));
     EXPECT_EQ(got, kind == 0 || kind == 3 ? 0 : kind == 1 ? 20001 : -20068);
     EXPECT_EQ(w, want);
