@@ -8,6 +8,7 @@
 #include <cmath>
 #include <cstring>
 
+#include "core/scalar.h"
 #include "core/types.h"
 #include "estimation/entry_checks.h"
 #include "estimation/mode_errors.h"
@@ -82,7 +83,7 @@ template <typename T>
 int32_t Run(const T* x, int32_t n, double fs, bool pairs, const double* amplitude,
             const double* phase, const double* damping, const double* frequency, int32_t modes,
             const Outputs& o) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
+  constexpr bool cx = kIsComplex<T>;
   const StatusCode check = checks::ModeErrors(n, modes, fs);
   if (check != status::kOk) return Public(check);
   if (x == nullptr || amplitude == nullptr || phase == nullptr || damping == nullptr ||

@@ -12,8 +12,8 @@
 #include <cmath>
 #include <cstring>
 #include <limits>
-#include <type_traits>
 
+#include "core/scalar.h"
 #include "numeric/lapack_boundary.h"
 #include "numeric/work.h"
 
@@ -84,20 +84,13 @@ StatusCode Classify(const ModeSet& m, bool complexData, bool pairs, int32_t i, T
   return status::kOk;
 }
 
-// The rows one sample adds to the Jacobian: two (real and imaginary parts)
-// for complex data, one for real data.
-template <typename T>
-constexpr int32_t kRowsPerSample = std::is_same_v<T, Complex> ? 2 : 1;
-
-// Sample of index t as a complex value.
-inline Complex AsComplex(const Complex& v) { return v; }
-inline Complex AsComplex(double v) { return Complex(v, 0.0); }
-
 template <typename T>
 StatusCode ModeErrors(const T* x, int32_t n, bool pairs, const ModeSet& m,
                       const ModeStdErrors& out) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
-  constexpr int32_t rowsPerSample = kRowsPerSample<T>;
+  constexpr bool cx = kIsComplex<T>;
+  // The rows one sample adds to the Jacobian: its real and imaginary parts
+  // for complex data.
+  constexpr int32_t rowsPerSample = cx ? 2 : 1;
   const int32_t M = m.count;
   const size_t modes = static_cast<size_t>(M);
 
@@ -186,8 +179,8 @@ StatusCode ModeErrors(const T* x, int32_t n, bool pairs, const ModeSet& m,
         }
         u[i] = v * step[i];
       }
-      const Complex r = AsComplex(x[t0 + k]) - model;
-      rss += std::norm(r);
+      const T r = x[t0 + k] - MakeScalar<T>(model.real(), model.imag());
+      rss += AbsSquared(r);
     }
     const StatusCode s = lapack::Tpqrt(ld, P, R.get(), P, rows.get(), ld);
     if (s != status::kOk) return s;
