@@ -71,8 +71,8 @@ bool Screen(const Outputs& o, int32_t modes, int scale, bool warned) {
   for (int32_t i = 0; i < modes; ++i) {
     o.amplitude_se[i] = std::ldexp(o.amplitude_se[i], -scale);
     const double v[4] = {o.amplitude_se[i], o.phase_se[i], o.damping_se[i], o.frequency_se[i]};
-    const bool allNan = std::isnan(v[0]) && std::isnan(v[1]) && std::isnan(v[2]) &&
-                        std::isnan(v[3]);
+    const bool allNan =
+        std::isnan(v[0]) && std::isnan(v[1]) && std::isnan(v[2]) && std::isnan(v[3]);
     if (allNan && warned) continue;
     for (double e : v) good = good && Finite(e);
   }

@@ -315,16 +315,16 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     const int32_t st =
         s.complex ? qdm_mode_errors_complex(cx, n, rate, count, amp, phase, damping, freq, seAmp,
                                             sePhase, seDamping, seFreq, &modeNoise)
-                  : qdm_mode_errors_real(re, n, rate, flag, count, amp, phase, damping, freq,
-                                         seAmp, sePhase, seDamping, seFreq, &modeNoise);
+                  : qdm_mode_errors_real(re, n, rate, flag, count, amp, phase, damping, freq, seAmp,
+                                         sePhase, seDamping, seFreq, &modeNoise);
     const bool refused = st <= -42401 && st >= -42499;
     if (st != QDM_OK && st != QDM_WARN_BOUND_SINGULAR && !refused &&
         st != QDM_ERR_NON_FINITE_RESULT && st != QDM_ERR_EXTREME_VALUE) {
       Check(st, "qdm_mode_errors", s.complex, r);
     }
     if (st != QDM_OK) {
-      r.warning += (r.warning.empty() ? "" : "; ") + std::string("standard errors: ") +
-                   qdm_status_text(st);
+      r.warning +=
+          (r.warning.empty() ? "" : "; ") + std::string("standard errors: ") + qdm_status_text(st);
     }
     if (st != QDM_OK && st != QDM_WARN_BOUND_SINGULAR) {
       for (Array* e : {&seAmp, &sePhase, &seDamping, &seFreq})
@@ -355,14 +355,13 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     res["mode_count"] = count;
     const bool damped = m != kPcarSpectrum;
     const auto se = [&](const double* v) { return withErrors ? v : nullptr; };
-    res["modes"] =
-        Columns({"frequency_hz", "amplitude", "phase_rad", "damping_per_sample", "damping_per_s",
-                 "frequency_hz_stderr", "amplitude_stderr", "phase_rad_stderr",
-                 "damping_per_sample_stderr", "damping_per_s_stderr"},
-                {freq, amp, phase, damped ? damping.v.data() : nullptr,
-                 damped ? perSecond.data() : nullptr, se(seFreq), se(seAmp), se(sePhase),
-                 se(seDamping), se(perSecondSe.data())},
-                size_t(count));
+    res["modes"] = Columns(
+        {"frequency_hz", "amplitude", "phase_rad", "damping_per_sample", "damping_per_s",
+         "frequency_hz_stderr", "amplitude_stderr", "phase_rad_stderr", "damping_per_sample_stderr",
+         "damping_per_s_stderr"},
+        {freq, amp, phase, damped ? damping.v.data() : nullptr, damped ? perSecond.data() : nullptr,
+         se(seFreq), se(seAmp), se(sePhase), se(seDamping), se(perSecondSe.data())},
+        size_t(count));
   }
   if (kSpectra & Bit(m)) {
     // The columns are filled in from the record's arrays as it is written.
@@ -512,7 +511,8 @@ std::string Table(const Json& j) {
     std::vector<std::pair<const Json*, const Json*>> shown;
     for (const auto& [name, column] : columns) {
       const std::string tail = "_stderr";
-      if (name.size() > tail.size() && name.compare(name.size() - tail.size(), tail.size(), tail) == 0 &&
+      if (name.size() > tail.size() &&
+          name.compare(name.size() - tail.size(), tail.size(), tail) == 0 &&
           v.contains(name.substr(0, name.size() - tail.size())))
         continue;
       const std::string errorName = name + tail;

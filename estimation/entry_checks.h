@@ -27,7 +27,6 @@ StatusCode CovSpectrum(int32_t n, int32_t p, int32_t m, double rate, Bound bound
 StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate,
                         Bound bound = Bound::kHost);
 
-
 // ---- error bars of given modes ----
 // The standard errors of `modes` modes on n samples at sampling rate `rate`.
 StatusCode ModeErrors(int32_t n, int32_t modes, double rate);

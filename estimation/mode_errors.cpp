@@ -23,7 +23,7 @@ constexpr double kTwoPi = 6.283185307179586;
 // Samples per block of Jacobian rows. Within a block each mode advances by
 // running products from an anchor computed afresh, so rounding cannot build
 // up over a long record.
-constexpr int32_t kBlockSamples = 256;
+constexpr int32_t kBlockSamples = 2048;
 
 // How one mode enters the model.
 enum class Term : int32_t {
@@ -33,9 +33,7 @@ enum class Term : int32_t {
   kPartner,      // real data with pairs: the conjugate of another mode, no parameters
 };
 
-int32_t Parameters(Term t) {
-  return t == Term::kPartner ? 0 : (t == Term::kRealPole ? 2 : 4);
-}
+int32_t Parameters(Term t) { return t == Term::kPartner ? 0 : (t == Term::kRealPole ? 2 : 4); }
 
 bool Finite(double v) { return std::fabs(v) <= DBL_MAX; }
 

@@ -64,12 +64,12 @@ void Errors(Call& c, bool nullOutput = false) {
   double* out[4] = {c.se[0].data(), c.se[1].data(), c.se[2].data(),
                     nullOutput ? nullptr : c.se[3].data()};
   const double* x = c.x.empty() ? nullptr : c.x.data();
-  c.status = c.complex ? qdm_mode_errors_complex(reinterpret_cast<const qdm_complex*>(x), c.n,
-                                                 c.fs, c.modes, in[0], in[1], in[2], in[3],
-                                                 out[0], out[1], out[2], out[3], &c.variance)
-                       : qdm_mode_errors_real(x, c.n, c.fs, c.real_signal, c.modes, in[0], in[1],
-                                              in[2], in[3], out[0], out[1], out[2], out[3],
-                                              &c.variance);
+  c.status = c.complex
+                 ? qdm_mode_errors_complex(reinterpret_cast<const qdm_complex*>(x), c.n, c.fs,
+                                           c.modes, in[0], in[1], in[2], in[3], out[0], out[1],
+                                           out[2], out[3], &c.variance)
+                 : qdm_mode_errors_real(x, c.n, c.fs, c.real_signal, c.modes, in[0], in[1], in[2],
+                                        in[3], out[0], out[1], out[2], out[3], &c.variance);
 }
 
 bool All(const Call& c, double v) {
@@ -184,14 +184,14 @@ TEST(PlainModeErrors, AGrowingModeThatOverflowsIsAnExtremeValue) {
 TEST(PlainModeErrors, EveryFaultIsReported) {
   int64_t faulted = 0;
   for (const bool complex : {false, true}) {
-    Call clean = Valid(complex, 700);
+    Call clean = Valid(complex, 4500);
     Errors(clean);
     ASSERT_EQ(clean.status, QDM_OK);
     for (int fault = 0; fault < 4; ++fault) {
       for (int64_t k = 1;; ++k) {
         if (fault < 2) NumAllocFailAt(k, fault == 1);
         if (fault >= 2) LapackFailAt(k, fault == 3 ? -1 : 1, false);
-        Call c = Valid(complex, 700);
+        Call c = Valid(complex, 4500);
         Errors(c);
         const bool reached = (fault < 2 ? NumAllocAttempts() : LapackCalls()) >= k;
         NumAllocFailAt(0, false);
