@@ -22,10 +22,10 @@
 #include <cmath>
 #include <cstring>
 #include <initializer_list>
-#include <type_traits>
 
+#include "api/last_error.h"
 #include "core/call_record.h"
-#include "core/types.h"
+#include "core/scalar.h"
 #include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
 #include "numeric/work.h"
@@ -103,15 +103,21 @@ struct OutDouble {
   int power = 0;
 };
 
+// A pointer the call dereferences, named as the header names it.
+struct Required {
+  const void* pointer;
+  const char* name;
+};
+
 struct PlainCall {
-  StatusCode check;  // the argument checks' verdict
+  StatusCode check;  // the argument checks' verdict, its failure already recorded
   Samples x;
-  std::initializer_list<const void*> required;  // pointers the call dereferences
-  double work_bytes;                            // estimated work memory
-  const double* rate;                           // sampling rate, or null
-  std::initializer_list<OutArray> outputs;      // zero-filled on failure
-  std::initializer_list<OutDouble> doubles;     // 0.0 on failure
-  int32_t* count;                               // 0 on failure, or null
+  std::initializer_list<Required> required;  // pointers the call dereferences
+  double work_bytes;                         // estimated work memory
+  const double* rate;                        // sampling rate, or null
+  std::initializer_list<OutArray> outputs;   // zero-filled on failure
+  std::initializer_list<OutDouble> doubles;  // 0.0 on failure
+  int32_t* count;                            // 0 on failure, or null
 };
 
 // Folds one sample into a running largest magnitude; a NaN or an infinity
@@ -184,16 +190,23 @@ bool ResultsFinite(const PlainCall& call, int scale) {
 // The estimator call: `fit` receives the samples to fit, the caller's or a
 // scaled copy of them.
 template <typename Fit>
-int32_t RunPlain(const PlainCall& call, const Fit& fit) {
+int32_t RunChecked(const PlainCall& call, const Fit& fit) {
   if (call.check != status::kOk) return PublicCode(call.check);
-  if (call.x.data == nullptr) return QDM_ERR_NULL_POINTER;
-  for (const void* p : call.required) {
-    if (p == nullptr) return QDM_ERR_NULL_POINTER;
+  if (call.x.data == nullptr) return last_error::Null("x");
+  for (const Required& r : call.required) {
+    if (r.pointer == nullptr) return last_error::Null(r.name);
   }
-  if (call.work_bytes > static_cast<double>(QDM_MAX_WORK_BYTES)) return QDM_ERR_WORK_LIMIT;
+  if (call.work_bytes > static_cast<double>(QDM_MAX_WORK_BYTES)) {
+    return last_error::WorkLimit(call.work_bytes, call.x.n);
+  }
   const double largest = Extent(call.x);
-  if (largest < 0.0 || (call.rate != nullptr && !std::isfinite(*call.rate))) {
-    return QDM_ERR_NON_FINITE;
+  if (largest < 0.0) {
+    const int64_t values = int64_t{call.x.n} * (call.x.complex ? 2 : 1);
+    return last_error::NotFiniteSample(static_cast<const double*>(call.x.data), values,
+                                       call.x.complex);
+  }
+  if (call.rate != nullptr && !std::isfinite(*call.rate)) {
+    return last_error::NotFinite("fs", *call.rate);
   }
 
   const int scale = RecordScale(largest);
@@ -222,6 +235,12 @@ int32_t RunPlain(const PlainCall& call, const Fit& fit) {
     if (call.count != nullptr) *call.count = 0;
   }
   return PublicCode(s);
+}
+
+// Every call of the face through here leaves its status in the thread's record.
+template <typename Fit>
+int32_t RunPlain(const PlainCall& call, const Fit& fit) {
+  return last_error::End(RunChecked(call, fit));
 }
 
 // ---- sizes ------------------------------------------------------------------------
@@ -269,13 +288,13 @@ const T* As(const void* samples) {
 
 template <typename T>
 int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles, double* variance) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
-  const StatusCode check = checks::Covariance(n, p, kWide);
+  constexpr bool cx = kIsComplex<T>;
+  const StatusCode check = checks::Covariance(n, p, kWide, last_error::Begin());
   const size_t e = cx ? kCx : kReal;
   const int32_t q = check == status::kOk ? p : 0;
   return RunPlain({check,
                    {x, n, cx},
-                   {a, poles, variance},
+                   {{a, "coefficients"}, {poles, "poles"}, {variance, "noise_variance"}},
                    LinearPredictionWork(n, q, e, 4),
                    nullptr,
                    {{a, Bytes(q + int64_t{1}, e)}, {poles, Bytes(q, kCx)}},
@@ -290,15 +309,22 @@ int32_t Covariance(const T* x, int32_t n, int32_t p, T* a, qdm_complex* poles, d
                   });
 }
 
+// The shared checks, then this face's own: a solver route it knows.
+StatusCode SolverCheck(StatusCode shared, int32_t solver) {
+  if (shared != status::kOk) return shared;
+  if (solver >= QDM_SOLVER_AUTO && solver <= QDM_SOLVER_KRYLOV) return status::kOk;
+  last_error::Refuse(QDM_ERR_SOLVER, "solver", solver, "is not one of",
+                     "QDM_SOLVER_AUTO, QDM_SOLVER_DENSE, QDM_SOLVER_KRYLOV (0, 1, 2)");
+  return kBadSolver;
+}
+
 // PCAR on either route; the automatic choice also sets the work estimate.
 template <typename T>
 int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t solver, T* a,
              qdm_complex* roots) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
-  StatusCode check = checks::Pcar(n, order, components, kWide);
-  if (check == status::kOk && (solver < QDM_SOLVER_AUTO || solver > QDM_SOLVER_KRYLOV)) {
-    check = kBadSolver;
-  }
+  constexpr bool cx = kIsComplex<T>;
+  const StatusCode check =
+      SolverCheck(checks::Pcar(n, order, components, kWide, last_error::Begin()), solver);
   const size_t e = cx ? kCx : kReal;
   const int32_t p = check == status::kOk ? order : 0;
   const int32_t k = check == status::kOk ? components : 0;
@@ -310,7 +336,7 @@ int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t s
       route == PcarSolver::kKrylov ? PcarKrylovWork(n, p, k, e) : LinearPredictionWork(n, p, e, 8);
   return RunPlain({check,
                    {x, n, cx},
-                   {a, roots},
+                   {{a, "coefficients"}, {roots, "roots"}},
                    work,
                    nullptr,
                    {{a, Bytes(p + int64_t{1}, e)}, {roots, Bytes(p, kCx)}},
@@ -328,12 +354,12 @@ int32_t Pcar(const T* x, int32_t n, int32_t order, int32_t components, int32_t s
 // On an error after the checks the order is 0, as on the host face.
 template <typename T>
 int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t* order) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
-  const StatusCode check = checks::Mdl(n, max_order, min_order, kWide);
+  constexpr bool cx = kIsComplex<T>;
+  const StatusCode check = checks::Mdl(n, max_order, min_order, kWide, last_error::Begin());
   const int32_t L = check == status::kOk ? max_order : 0;
   return RunPlain({check,
                    {x, n, cx},
-                   {order},
+                   {{order, "order"}},
                    PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L),
                    nullptr,
                    {},
@@ -355,16 +381,47 @@ int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t
     frequency, Bytes(m, kReal), 0, true                                     \
   }
 
+// Prony of either data type; real_signal is 0 for complex data, which have no
+// conjugate pairs to fold.
+template <typename T>
+int32_t Prony(const T* x, int32_t n, int32_t order, double fs, int32_t real_signal,
+              double* amplitude, double* phase, double* damping, double* frequency,
+              int32_t* modes) {
+  constexpr bool cx = kIsComplex<T>;
+  const StatusCode check = checks::Prony(n, order, fs, kWide, last_error::Begin());
+  const int32_t p = check == status::kOk ? order : 0;
+  return RunPlain({check,
+                   {x, n, cx},
+                   {{amplitude, "amplitude"},
+                    {phase, "phase"},
+                    {damping, "damping"},
+                    {frequency, "frequency"},
+                    {modes, "modes"}},
+                   LinearPredictionWork(n, p, cx ? kCx : kReal, 4) + ModeFitWork(n, p),
+                   &fs,
+                   {QDM_MODE_OUTPUTS(p)},
+                   {},
+                   modes},
+                  [&](const void* xs) {
+                    if constexpr (cx) {
+                      return PronyComplex(As<T>(xs), n, p, fs, amplitude, phase, damping, frequency,
+                                          modes);
+                    } else {
+                      return PronyReal(As<T>(xs), n, p, fs, real_signal, amplitude, phase, damping,
+                                       frequency, modes);
+                    }
+                  });
+}
+
 // The pencil on either route; the automatic choice also sets the work estimate.
+// real_signal is 0 for complex data, which have no conjugate pairs to fold.
 template <typename T>
 int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, int32_t real_signal,
                int32_t solver, double* amplitude, double* phase, double* damping, double* frequency,
                int32_t* modes, double* mse) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
-  StatusCode check = checks::Pencil(n, pencil, order, fs, kWide);
-  if (check == status::kOk && (solver < QDM_SOLVER_AUTO || solver > QDM_SOLVER_KRYLOV)) {
-    check = kBadSolver;
-  }
+  constexpr bool cx = kIsComplex<T>;
+  const StatusCode check =
+      SolverCheck(checks::Pencil(n, pencil, order, fs, kWide, last_error::Begin()), solver);
   const int32_t M = check == status::kOk ? order : 0;
   const int32_t L = check == status::kOk ? pencil : 0;
   PencilSolver route = static_cast<PencilSolver>(check == status::kOk ? solver : 0);
@@ -377,7 +434,12 @@ int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, 
       ModeFitWork(n, M);
   return RunPlain({check,
                    {x, n, cx},
-                   {amplitude, phase, damping, frequency, modes, mse},
+                   {{amplitude, "amplitude"},
+                    {phase, "phase"},
+                    {damping, "damping"},
+                    {frequency, "frequency"},
+                    {modes, "modes"},
+                    {mse, "mse"}},
                    work,
                    &fs,
                    {QDM_MODE_OUTPUTS(M)},
@@ -386,11 +448,11 @@ int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, 
                   [&](const void* xs) {
                     if constexpr (cx) {
                       return MatrixPencilSolverComplex(As<T>(xs), n, L, M, fs, route, amplitude,
-                                                       phase, damping, frequency, mse, modes);
+                                                       phase, damping, frequency, modes, mse);
                     } else {
                       return MatrixPencilSolverReal(As<T>(xs), n, L, M, fs, real_signal, route,
-                                                    amplitude, phase, damping, frequency, mse,
-                                                    modes);
+                                                    amplitude, phase, damping, frequency, modes,
+                                                    mse);
                     }
                   });
 }
@@ -399,7 +461,42 @@ int32_t Pencil(const T* x, int32_t n, int32_t pencil, int32_t order, double fs, 
 // points; below it this face refuses the call.
 StatusCode SpectrumCheck(StatusCode shared, int32_t points, int32_t order) {
   if (shared != status::kOk) return shared;
-  return SpectrumLength(points) < int64_t{order} + 1 ? kSpectrumTooShort : status::kOk;
+  if (SpectrumLength(points) >= int64_t{order} + 1) return status::kOk;
+  last_error::RefuseAgainst(QDM_ERR_SPECTRUM_TOO_SHORT, "points", points,
+                            "gives fewer spectrum values than", "order + 1", order + 1.0);
+  return kSpectrumTooShort;
+}
+
+// The covariance spectrum of either data type.
+template <typename T>
+int32_t CovSpectrum(const T* x, int32_t n, int32_t order, int32_t points, double fs,
+                    double* spectrum, double* f0, double* df, double* noise_variance) {
+  constexpr bool cx = kIsComplex<T>;
+  const StatusCode check = SpectrumCheck(
+      checks::CovSpectrum(n, order, points, fs, kWide, last_error::Begin()), points, order);
+  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
+  const int32_t p = check == status::kOk ? order : 0;
+  SpectrumResult result{0.0, 0.0, spectrum};
+  return RunPlain(
+      {check,
+       {x, n, cx},
+       {{spectrum, "spectrum"}, {f0, "f0"}, {df, "df"}, {noise_variance, "noise_variance"}},
+       LinearPredictionWork(n, p, cx ? kCx : kReal, 4) + SpectrumWork(N),
+       &fs,
+       {{spectrum, Bytes(N, kReal)}},
+       {{f0}, {df}, {noise_variance, 2}},
+       nullptr},
+      [&](const void* xs) {
+        StatusCode s;
+        if constexpr (cx) {
+          s = CovPowerSpectrumComplex(As<T>(xs), n, p, N, fs, &result, noise_variance);
+        } else {
+          s = CovPowerSpectrumReal(As<T>(xs), n, p, N, fs, &result, noise_variance);
+        }
+        *f0 = result.f0;
+        *df = result.df;
+        return s;
+      });
 }
 
 // The PCAR spectrum of either data type; real_signal is 0 for complex data,
@@ -409,9 +506,10 @@ int32_t PcarSpectrum(const T* x, int32_t n, int32_t order, int32_t points, int32
                      double fs, int32_t real_signal, double* amplitude, double* phase,
                      double* frequency, int32_t* modes, double* spectrum, double* f0, double* df,
                      double* fit_error) {
-  constexpr bool cx = std::is_same_v<T, Complex>;
-  const StatusCode check =
-      SpectrumCheck(checks::PcarSpectrum(n, order, components, points, fs, kWide), points, order);
+  constexpr bool cx = kIsComplex<T>;
+  const StatusCode check = SpectrumCheck(
+      checks::PcarSpectrum(n, order, components, points, fs, kWide, last_error::Begin()), points,
+      order);
   const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
   const int32_t p = check == status::kOk ? order : 0;
   const int32_t k = check == status::kOk ? components : 0;
@@ -419,7 +517,14 @@ int32_t PcarSpectrum(const T* x, int32_t n, int32_t order, int32_t points, int32
   return RunPlain(
       {check,
        {x, n, cx},
-       {amplitude, phase, frequency, modes, spectrum, f0, df, fit_error},
+       {{amplitude, "amplitude"},
+        {phase, "phase"},
+        {frequency, "frequency"},
+        {modes, "modes"},
+        {spectrum, "spectrum"},
+        {f0, "f0"},
+        {df, "df"},
+        {fit_error, "fit_error"}},
        LinearPredictionWork(n, p, cx ? kCx : kReal, 8) + ModeFitWork(n, k) + SpectrumWork(N),
        &fs,
        {{amplitude, Bytes(k, kReal), 1, true},
@@ -432,10 +537,10 @@ int32_t PcarSpectrum(const T* x, int32_t n, int32_t order, int32_t points, int32
         StatusCode s;
         if constexpr (cx) {
           s = PcarPowerSpectrumComplex(As<T>(xs), n, p, k, N, fs, amplitude, phase, frequency,
-                                       fit_error, &result, modes);
+                                       modes, &result, fit_error);
         } else {
           s = PcarPowerSpectrumReal(As<T>(xs), n, p, k, N, fs, real_signal, amplitude, phase,
-                                    frequency, fit_error, &result, modes);
+                                    frequency, modes, &result, fit_error);
         }
         *f0 = result.f0;
         *df = result.df;
@@ -518,39 +623,13 @@ QDM_PLAIN_API int32_t qdm_pcar_solver_complex(const qdm_complex* x, int32_t n, i
 QDM_PLAIN_API int32_t qdm_prony_real(const double* x, int32_t n, int32_t order, double fs,
                                      int32_t real_signal, double* amplitude, double* phase,
                                      double* damping, double* frequency, int32_t* modes) {
-  const StatusCode check = checks::Prony(n, order, fs, kWide);
-  const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check,
-                   {x, n, false},
-                   {amplitude, phase, damping, frequency, modes},
-                   LinearPredictionWork(n, p, kReal, 4) + ModeFitWork(n, p),
-                   &fs,
-                   {QDM_MODE_OUTPUTS(p)},
-                   {},
-                   modes},
-                  [&](const void* xs) {
-                    return PronyReal(As<double>(xs), n, p, fs, real_signal, amplitude, phase,
-                                     damping, frequency, modes);
-                  });
+  return Prony(x, n, order, fs, real_signal, amplitude, phase, damping, frequency, modes);
 }
 
 QDM_PLAIN_API int32_t qdm_prony_complex(const qdm_complex* x, int32_t n, int32_t order, double fs,
                                         double* amplitude, double* phase, double* damping,
                                         double* frequency, int32_t* modes) {
-  const StatusCode check = checks::Prony(n, order, fs, kWide);
-  const int32_t p = check == status::kOk ? order : 0;
-  return RunPlain({check,
-                   {x, n, true},
-                   {amplitude, phase, damping, frequency, modes},
-                   LinearPredictionWork(n, p, kCx, 4) + ModeFitWork(n, p),
-                   &fs,
-                   {QDM_MODE_OUTPUTS(p)},
-                   {},
-                   modes},
-                  [&](const void* xs) {
-                    return PronyComplex(As<Complex>(xs), n, p, fs, amplitude, phase, damping,
-                                        frequency, modes);
-                  });
+  return Prony(AsComplex(x), n, order, fs, 0, amplitude, phase, damping, frequency, modes);
 }
 
 // ---- matrix pencil ----------------------------------------------------------------------
@@ -608,51 +687,13 @@ QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int
 QDM_PLAIN_API int32_t qdm_covariance_psd_real(const double* x, int32_t n, int32_t order,
                                               int32_t points, double fs, double* spectrum,
                                               double* f0, double* df, double* noise_variance) {
-  const StatusCode check =
-      SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
-  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
-  const int32_t p = check == status::kOk ? order : 0;
-  SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain({check,
-                   {x, n, false},
-                   {spectrum, f0, df, noise_variance},
-                   LinearPredictionWork(n, p, kReal, 4) + SpectrumWork(N),
-                   &fs,
-                   {{spectrum, Bytes(N, kReal)}},
-                   {{f0}, {df}, {noise_variance, 2}},
-                   nullptr},
-                  [&](const void* xs) {
-                    const StatusCode s =
-                        CovPowerSpectrumReal(As<double>(xs), n, p, N, fs, &result, noise_variance);
-                    *f0 = result.f0;
-                    *df = result.df;
-                    return s;
-                  });
+  return CovSpectrum(x, n, order, points, fs, spectrum, f0, df, noise_variance);
 }
 
 QDM_PLAIN_API int32_t qdm_covariance_psd_complex(const qdm_complex* x, int32_t n, int32_t order,
                                                  int32_t points, double fs, double* spectrum,
                                                  double* f0, double* df, double* noise_variance) {
-  const StatusCode check =
-      SpectrumCheck(checks::CovSpectrum(n, order, points, fs, kWide), points, order);
-  const int32_t N = check == status::kOk ? SpectrumLength(points) : 0;
-  const int32_t p = check == status::kOk ? order : 0;
-  SpectrumResult result{0.0, 0.0, spectrum};
-  return RunPlain({check,
-                   {x, n, true},
-                   {spectrum, f0, df, noise_variance},
-                   LinearPredictionWork(n, p, kCx, 4) + SpectrumWork(N),
-                   &fs,
-                   {{spectrum, Bytes(N, kReal)}},
-                   {{f0}, {df}, {noise_variance, 2}},
-                   nullptr},
-                  [&](const void* xs) {
-                    const StatusCode s = CovPowerSpectrumComplex(As<Complex>(xs), n, p, N, fs,
-                                                                 &result, noise_variance);
-                    *f0 = result.f0;
-                    *df = result.df;
-                    return s;
-                  });
+  return CovSpectrum(AsComplex(x), n, order, points, fs, spectrum, f0, df, noise_variance);
 }
 
 QDM_PLAIN_API int32_t qdm_pcar_psd_real(const double* x, int32_t n, int32_t order, int32_t points,

@@ -7,6 +7,7 @@
 #include <cmath>
 #include <cstring>
 
+#include "api/last_error.h"
 #include "core/scalar.h"
 #include "estimation/estimation.h"
 #include "estimation/estimators.h"
@@ -38,11 +39,16 @@ double InversePower(const T* a, int32_t order, double f, double fs) {
 
 int32_t Layout(double* values, double* density, int32_t length, double fs, int32_t onesided,
                double* frequency, int32_t* count) {
-  if (values == nullptr || frequency == nullptr || count == nullptr) return QDM_ERR_NULL_POINTER;
+  if (values == nullptr) return last_error::Null("spectrum");
+  if (frequency == nullptr) return last_error::Null("frequency");
+  if (count == nullptr) return last_error::Null("count");
   *count = 0;
-  if (length < 2 || length % 2 != 0) return QDM_ERR_SPECTRUM_SIZE;
-  if (!Finite(fs)) return QDM_ERR_NON_FINITE;
-  if (!(fs > 0.0)) return QDM_ERR_SAMPLE_RATE;
+  if (length < 2)
+    return last_error::Refuse(QDM_ERR_SPECTRUM_SIZE, "length", length, "is below", "2");
+  if (length % 2 != 0)
+    return last_error::Refuse(QDM_ERR_SPECTRUM_SIZE, "length", length, "is not even");
+  if (!Finite(fs)) return last_error::NotFinite("fs", fs);
+  if (!(fs > 0.0)) return last_error::Refuse(QDM_ERR_SAMPLE_RATE, "fs", fs, "is not positive");
   const double df = fs / length;
   if (onesided == 0) {
     for (int32_t i = 0; i < length; ++i) frequency[i] = -0.5 * fs + i * df;
@@ -72,21 +78,43 @@ int32_t ArPsd(const T* a, int32_t order, double noise_variance, int32_t points, 
               int32_t onesided, double* frequency, double* spectrum, double* psd, int32_t* count) {
   if (count != nullptr) *count = 0;
   const int32_t N = qdm_spectrum_length(points);
-  if (N == 0) return QDM_ERR_SPECTRUM_SIZE;
-  if (order < 0) return QDM_ERR_ORDER;
-  if (N < int64_t{order} + 1) return QDM_ERR_SPECTRUM_TOO_SHORT;
-  if (!Finite(fs)) return QDM_ERR_NON_FINITE;
-  if (!(fs > 0.0)) return QDM_ERR_SAMPLE_RATE;
-  if (onesided != 0 && kIsComplex<T>) return QDM_ERR_OPTION;
-  if (kWorkPerValue * N > static_cast<double>(QDM_MAX_WORK_BYTES)) return QDM_ERR_WORK_LIMIT;
-  if (!Finite(noise_variance)) return QDM_ERR_NON_FINITE;
-  if (noise_variance < 0.0) return QDM_ERR_OPTION;
+  if (points < 2)
+    return last_error::Refuse(QDM_ERR_SPECTRUM_SIZE, "points", points, "is below", "2");
+  if (N == 0) {
+    return last_error::RefuseAgainst(QDM_ERR_SPECTRUM_SIZE, "points", points, "is above", "2^30",
+                                     0x1p30);
+  }
+  if (order < 0) return last_error::Refuse(QDM_ERR_ORDER, "order", order, "is below", "0");
+  if (N < int64_t{order} + 1) {
+    return last_error::RefuseAgainst(QDM_ERR_SPECTRUM_TOO_SHORT, "points", points,
+                                     "gives fewer spectrum values than", "order + 1", order + 1.0);
+  }
+  if (!Finite(fs)) return last_error::NotFinite("fs", fs);
+  if (!(fs > 0.0)) return last_error::Refuse(QDM_ERR_SAMPLE_RATE, "fs", fs, "is not positive");
+  if (onesided != 0 && kIsComplex<T>) {
+    return last_error::Refuse(QDM_ERR_OPTION, "onesided", onesided, "is not 0",
+                              "for complex coefficients");
+  }
+  if (kWorkPerValue * N > static_cast<double>(QDM_MAX_WORK_BYTES)) {
+    return last_error::WorkLimit(kWorkPerValue * N, -1);
+  }
+  if (!Finite(noise_variance)) return last_error::NotFinite("noise_variance", noise_variance);
+  if (noise_variance < 0.0) {
+    return last_error::Refuse(QDM_ERR_OPTION, "noise_variance", noise_variance, "is below", "0");
+  }
   // The pointers come after the sizes, so a call with null outputs checks the
   // arguments alone before the caller sets aside room for N values.
-  if (a == nullptr || frequency == nullptr || spectrum == nullptr || count == nullptr)
-    return QDM_ERR_NULL_POINTER;
-  for (int32_t k = 0; k <= order; ++k)
-    if (!Finite(a[k])) return QDM_ERR_NON_FINITE;
+  if (a == nullptr) return last_error::Null("a");
+  if (frequency == nullptr) return last_error::Null("frequency");
+  if (spectrum == nullptr) return last_error::Null("spectrum");
+  if (count == nullptr) return last_error::Null("count");
+  for (int32_t k = 0; k <= order; ++k) {
+    if (!Finite(a[k])) {
+      return last_error::NotFiniteSample(reinterpret_cast<const double*>(a),
+                                         (order + int64_t{1}) * (kIsComplex<T> ? 2 : 1),
+                                         kIsComplex<T>, "a");
+    }
+  }
 
   // The evaluator may window its coefficients in place: it gets a copy.
   const size_t m = static_cast<size_t>(order) + 1;
@@ -123,20 +151,24 @@ int32_t ArPsd(const T* a, int32_t order, double noise_variance, int32_t points, 
 
 QDM_PLAIN_API int32_t qdm_spectrum_layout(double* spectrum, double* psd, int32_t length, double fs,
                                           int32_t onesided, double* frequency, int32_t* count) {
-  return Layout(spectrum, psd, length, fs, onesided, frequency, count);
+  last_error::Begin();
+  return last_error::End(Layout(spectrum, psd, length, fs, onesided, frequency, count));
 }
 
 QDM_PLAIN_API int32_t qdm_ar_psd_real(const double* a, int32_t order, double noise_variance,
                                       int32_t points, double fs, int32_t onesided,
                                       double* frequency, double* spectrum, double* psd,
                                       int32_t* count) {
-  return ArPsd(a, order, noise_variance, points, fs, onesided, frequency, spectrum, psd, count);
+  last_error::Begin();
+  return last_error::End(
+      ArPsd(a, order, noise_variance, points, fs, onesided, frequency, spectrum, psd, count));
 }
 
 QDM_PLAIN_API int32_t qdm_ar_psd_complex(const qdm_complex* a, int32_t order, double noise_variance,
                                          int32_t points, double fs, int32_t onesided,
                                          double* frequency, double* spectrum, double* psd,
                                          int32_t* count) {
-  return ArPsd(reinterpret_cast<const Complex*>(a), order, noise_variance, points, fs, onesided,
-               frequency, spectrum, psd, count);
+  last_error::Begin();
+  return last_error::End(ArPsd(reinterpret_cast<const Complex*>(a), order, noise_variance, points,
+                               fs, onesided, frequency, spectrum, psd, count));
 }

@@ -126,15 +126,21 @@ struct Record {
 constexpr const char* kSpectrumColumns[] = {"frequency_hz", "power_db", "psd_per_hz"};
 
 // A value the library refuses (an argument error, -424xx) is bad input, exit 1;
-// any other error status is a failed fit, exit 2. The message carries the status.
+// any other error status is a failed fit, exit 2. The message carries the status
+// and, for a refusal, the library's words for it: the argument (as the C header
+// names it), its value and the limit it broke. It is read on the thread that
+// made the call, right after it.
 void Check(int32_t status, const char* function, bool complex, Record& r) {
   r.status = status;
   if (status == QDM_WARN_RANK_DEFICIENT) r.warning = qdm_status_text(status);
   if (status == QDM_OK || status == QDM_WARN_RANK_DEFICIENT) return;
   const bool refused = status <= -42401 && status >= -42499;
+  char words[256];
+  qdm_last_error_message(words, sizeof words);
   throw Failure{refused ? kUsage : kFailed, status,
                 function + std::string(complex ? "_complex" : "_real") + " returned " +
-                    std::to_string(status) + ": " + qdm_status_text(status)};
+                    std::to_string(status) + ": " +
+                    (refused && words[0] != '\0' ? words : qdm_status_text(status))};
 }
 
 // A second call of the same fit: only a failure replaces the first call's status.

@@ -3,9 +3,11 @@
 // least-squares sense. Returns a[0..p] with a[0] = 1 and a[k] = -w[k-1], the
 // poles (roots of z^p + a[1] z^(p-1) + ... + a[p]) and the mean squared
 // prediction error over the M = n - p equations.
+#include <cassert>
 #include <cstddef>
 
 #include "core/scalar.h"
+#include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
 #include "estimation/estimators.h"
 #include "numeric/numeric.h"
@@ -22,8 +24,7 @@ constexpr int32_t kRootIterationsComplex = 20000;
 
 template <typename T>
 StatusCode CovarianceAr(const T* x, int32_t n, int32_t p, T* a, Complex* r, double* variance) {
-  if (n < 1) return status::kEmptyInput;
-  if (p <= 0 || p > MaxOrder(n)) return status::kBadCount;
+  assert(checks::Covariance(n, p, checks::Bound::kWide) == status::kOk);
 
   const int32_t M = n - p;
   const size_t rows = static_cast<size_t>(M);

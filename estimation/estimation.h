@@ -1,7 +1,11 @@
 // Time-series model estimators, each in a real and a complex form. Inputs are
 // aligned element arrays (the entry points copy host data into aligned work
 // memory); every routine returns a StatusCode (core/types.h). Count outputs
-// (int32_t* count) receive the number of reported modes.
+// (int32_t* count) receive the number of reported modes, and stand before the
+// fit-error outputs, as on the faces.
+//
+// The estimators take checked arguments: every face runs the checks of
+// estimation/entry_checks.h first, and a debug build asserts them here again.
 #pragma once
 
 #include <cstdint>
@@ -85,10 +89,10 @@ bool PcarPrefersKrylov(int32_t n, int32_t p, int32_t k, bool complex);
                                              Complex* K);
 [[nodiscard]] StatusCode MatrixPencilReal(const double* x, int32_t n, int32_t L, int32_t M,
                                           double fs, int32_t realFlag, double* amp, double* phase,
-                                          double* damp, double* freq, double* mse, int32_t* count);
+                                          double* damp, double* freq, int32_t* count, double* mse);
 [[nodiscard]] StatusCode MatrixPencilComplex(const Complex* x, int32_t n, int32_t L, int32_t M,
                                              double fs, double* amp, double* phase, double* damp,
-                                             double* freq, double* mse, int32_t* count);
+                                             double* freq, int32_t* count, double* mse);
 // How the pencil gets Y1's leading triplets: kDense forms Y1 and Y2 and
 // decomposes Y1 (the fit above); kKrylov forms neither and takes the triplets
 // by Lanczos over FFT products (numeric/krylov.h), for long records: the same
@@ -102,11 +106,11 @@ bool PencilPrefersKrylov(int32_t n, int32_t L, int32_t M, bool complex);
 [[nodiscard]] StatusCode MatrixPencilSolverReal(const double* x, int32_t n, int32_t L, int32_t M,
                                                 double fs, int32_t realFlag, PencilSolver solver,
                                                 double* amp, double* phase, double* damp,
-                                                double* freq, double* mse, int32_t* count);
+                                                double* freq, int32_t* count, double* mse);
 [[nodiscard]] StatusCode MatrixPencilSolverComplex(const Complex* x, int32_t n, int32_t L,
                                                    int32_t M, double fs, PencilSolver solver,
                                                    double* amp, double* phase, double* damp,
-                                                   double* freq, double* mse, int32_t* count);
+                                                   double* freq, int32_t* count, double* mse);
 
 // ---- minimum description length ------------------------------------------------------------
 [[nodiscard]] StatusCode MdlOrderReal(const double* x, int32_t n, int32_t L, int32_t minOrder,
@@ -138,12 +142,12 @@ int32_t SpectrumLength(int32_t m);
                                               double fs, SpectrumResult* result, double* variance);
 [[nodiscard]] StatusCode PcarPowerSpectrumComplex(const Complex* x, int32_t n, int32_t p, int32_t k,
                                                   int32_t N, double fs, double* amp, double* phase,
-                                                  double* freq, double* fitError,
-                                                  SpectrumResult* result, int32_t* count);
+                                                  double* freq, int32_t* count,
+                                                  SpectrumResult* result, double* fitError);
 [[nodiscard]] StatusCode PcarPowerSpectrumReal(const double* x, int32_t n, int32_t p, int32_t k,
                                                int32_t N, double fs, int32_t realFlag, double* amp,
-                                               double* phase, double* freq, double* fitError,
-                                               SpectrumResult* result, int32_t* count);
+                                               double* phase, double* freq, int32_t* count,
+                                               SpectrumResult* result, double* fitError);
 [[nodiscard]] StatusCode ArSpectrumComplex(Complex* a, int32_t m, int32_t recip, double fs,
                                            int32_t N, int32_t mode, SpectrumResult* result);
 [[nodiscard]] StatusCode ArSpectrumReal(double* a, int32_t m, int32_t recip, double fs, int32_t N,

@@ -12,12 +12,14 @@
 // candidates whose decision that bound leaves open get the full fit. The chosen
 // order is the full search's (MdlOrderFull*, kept for tests and benchmarks).
 #include <algorithm>
+#include <cassert>
 #include <cfloat>
 #include <cmath>
 #include <cstddef>
 #include <cstring>
 
 #include "core/scalar.h"
+#include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
 #include "estimation/estimators.h"
 #include "numeric/lapack_boundary.h"
@@ -298,16 +300,7 @@ double SquaredNorm(const T* x, int32_t n) {
 
 template <typename T>
 StatusCode MdlOrder(const T* x, int32_t n, int32_t L, int32_t minOrder, bool fast, int32_t* order) {
-  if constexpr (kIsComplex<T>) {
-    // The complex form leaves minOrder to its entry point and reports a bad upper
-    // order with the general order code.
-    if (n < 1) return status::kEmptyInput;
-    if (L < 1 || L > MaxOrder(n)) return status::kBadOrder;
-  } else {
-    if (n < 1) return status::kEmptyInput;
-    if (minOrder < 1) return status::kBadMinOrder;
-    if (L <= minOrder || L > MaxOrder(n)) return status::kBadMdlUpper;
-  }
+  assert(checks::Mdl(n, L, minOrder, checks::Bound::kWide) == status::kOk);
 
   // A pencil parameter of exactly n/2 is moved one below it.
   const int32_t Lp = (L == n / 2) ? L - 1 : L;

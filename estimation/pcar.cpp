@@ -12,10 +12,12 @@
 // (numeric/krylov.h), O(n log n) per product and O(n k) memory, and the
 // truncated solve is applied from them with the same rank decision.
 #include <algorithm>
+#include <cassert>
 #include <cmath>
 #include <cstddef>
 
 #include "core/scalar.h"
+#include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
 #include "estimation/estimators.h"
 #include "numeric/krylov.h"
@@ -110,10 +112,7 @@ StatusCode SolveKrylov(const T* x, int32_t n, int32_t p, int32_t k, T* w) {
 // ---- estimator ------------------------------------------------------------------------------
 template <typename T>
 StatusCode Pcar(const T* x, int32_t n, int32_t p, int32_t k, T* a, Complex* roots, Route route) {
-  if (n < 1) return status::kEmptyInput;
-  if (p < 0 || p > MaxOrder(n)) return status::kBadOrder;
-  if (k < 1) return status::kBadCount;
-  if (k > p) return status::kCountAboveOrder;
+  assert(checks::Pcar(n, p, k, checks::Bound::kWide) == status::kOk);
 
   auto w = AllocWorkUninit<T>(static_cast<size_t>(p));
   auto poly = AllocWorkUninit<T>(static_cast<size_t>(p) + 1);

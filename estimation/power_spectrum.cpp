@@ -3,6 +3,9 @@
 // (ar_spectrum.cpp). The PCAR form also reports the modes of the roots
 // nearest the unit circle. The drivers always ask for the reciprocal power
 // and no window.
+#include <cassert>
+
+#include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
 #include "estimation/estimators.h"
 #include "numeric/work.h"
@@ -15,18 +18,18 @@ constexpr int32_t kNoWindow = 3;
 template <typename T>
 StatusCode CovPowerSpectrum(const T* x, int32_t n, int32_t p, int32_t N, double fs,
                             SpectrumResult* result, double* variance) {
-  if (n < 1) return status::kEmptyInput;
-  if (p < 0 || p > MaxOrder(n)) return status::kBadOrder;
-  if (N < 2) return status::kBadSpectrumSize;
-  if (fs <= 0.0) return status::kBadSampleRate;  // a NaN rate passes on purpose
+  // N is the power of two the checked size m became, so it passes as m.
+  assert(checks::CovSpectrum(n, p, N, fs, checks::Bound::kWide) == status::kOk);
 
   const size_t order = static_cast<size_t>(p);
   WorkArray<T> a = AllocWork<T>(order + 1);
   WorkArray<Complex> poles = AllocWork<Complex>(order);
   if (!a || !poles) return status::kNoMemory;
 
-  // p = 0 passes the checks here; the estimator decides what an order of 0
-  // means (it refuses it).
+  // An order of 0 passes the spectrum's checks, and the outputs are sized for
+  // it; the covariance fit has no model of order 0 and refuses it, here, after
+  // the work memory, where the fit would.
+  if (p == 0) return status::kBadCount;
   const StatusCode st = CovarianceAr(x, n, p, a.get(), poles.get(), variance);
   if (st != status::kOk) return st;
   return ArSpectrum(a.get(), p + 1, kReciprocal, fs, N, kNoWindow, result);
@@ -35,13 +38,8 @@ StatusCode CovPowerSpectrum(const T* x, int32_t n, int32_t p, int32_t N, double 
 template <typename T>
 StatusCode PcarPowerSpectrum(const T* x, int32_t n, int32_t p, int32_t k, int32_t N, double fs,
                              int32_t realFlag, double* amp, double* phase, double* freq,
-                             double* fitError, SpectrumResult* result, int32_t* count) {
-  if (n < 1) return status::kEmptyInput;
-  if (p < 0 || p > MaxOrder(n)) return status::kBadOrder;
-  if (k < 1) return status::kBadCount;
-  if (k > p) return status::kCountAboveOrder;
-  if (N < 2) return status::kBadSpectrumSize;
-  if (fs <= 0.0) return status::kBadSampleRate;
+                             int32_t* count, SpectrumResult* result, double* fitError) {
+  assert(checks::PcarSpectrum(n, p, k, N, fs, checks::Bound::kWide) == status::kOk);
 
   const size_t order = static_cast<size_t>(p), modes = static_cast<size_t>(k);
   WorkArray<T> a = AllocWork<T>(order + 1);
@@ -77,14 +75,14 @@ StatusCode CovPowerSpectrumReal(const double* x, int32_t n, int32_t p, int32_t N
 
 StatusCode PcarPowerSpectrumComplex(const Complex* x, int32_t n, int32_t p, int32_t k, int32_t N,
                                     double fs, double* amp, double* phase, double* freq,
-                                    double* fitError, SpectrumResult* result, int32_t* count) {
+                                    int32_t* count, SpectrumResult* result, double* fitError) {
   // Complex data have no conjugate pairs to fold: every selected mode is reported.
-  return PcarPowerSpectrum(x, n, p, k, N, fs, 0, amp, phase, freq, fitError, result, count);
+  return PcarPowerSpectrum(x, n, p, k, N, fs, 0, amp, phase, freq, count, result, fitError);
 }
 
 StatusCode PcarPowerSpectrumReal(const double* x, int32_t n, int32_t p, int32_t k, int32_t N,
                                  double fs, int32_t realFlag, double* amp, double* phase,
-                                 double* freq, double* fitError, SpectrumResult* result,
-                                 int32_t* count) {
-  return PcarPowerSpectrum(x, n, p, k, N, fs, realFlag, amp, phase, freq, fitError, result, count);
+                                 double* freq, int32_t* count, SpectrumResult* result,
+                                 double* fitError) {
+  return PcarPowerSpectrum(x, n, p, k, N, fs, realFlag, amp, phase, freq, count, result, fitError);
 }

@@ -2,8 +2,10 @@
 // are the roots of a covariance-method AR model of order p, the amplitudes a
 // least-squares fit of those poles to the record; each mode is then reported
 // as amplitude, phase, damping and frequency.
+#include <cassert>
 #include <cstddef>
 
+#include "estimation/entry_checks.h"
 #include "estimation/estimation.h"
 #include "estimation/estimators.h"
 #include "numeric/work.h"
@@ -15,11 +17,7 @@ namespace {
 template <typename T>
 StatusCode Prony(const T* x, int32_t n, int32_t p, double fs, int32_t realFlag, double* amp,
                  double* phase, double* damp, double* freq, int32_t* count) {
-  if (n < 1) return status::kEmptyInput;
-  if (p < 1) return status::kBadCount;
-  if (p > MaxOrder(n)) return status::kBadCount;
-  // An ordered comparison on purpose: a NaN rate passes.
-  if (0.0 >= fs) return status::kBadSampleRate;
+  assert(checks::Prony(n, p, fs, checks::Bound::kWide) == status::kOk);
 
   const size_t modes = static_cast<size_t>(p);
   WorkArray<T> coefficients = AllocWork<T>(modes + 1);

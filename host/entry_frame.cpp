@@ -44,6 +44,7 @@ StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* hand
   std::memcpy(input.get(), BlockElements(entry.input), n * ElementBytes(entry.inputType));
   EntryCall call{};
   call.input = input.get();
+  call.n = entry.n;
   for (size_t i = 0; i < entry.outputs.size(); ++i) call.outputs[i] = outputs[i].get();
   for (size_t j = 0; j < entry.outDoubles.size(); ++j) {
     if (entry.outDoubles[j].role == OutDoubleRole::kPassThrough) {

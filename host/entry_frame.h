@@ -87,7 +87,7 @@ inline constexpr int kMaxOutDoubles = 3;
 struct EntrySpec {
   QdmArrayHandle input;
   int32_t inputType;
-  int32_t n;                              // the input block's count
+  int32_t n;                              // the input block's count, read once per call
   StatusCode check;                       // the first failed argument check, 0 if all pass
   std::span<const OutputArray> outputs;   // in resize order, at most kMaxOutputs
   std::span<const OutDouble> outDoubles;  // at most kMaxOutDoubles
@@ -96,12 +96,14 @@ struct EntrySpec {
 
 // ---- what the estimator sees -------------------------------------------------------
 
-// Aligned stand-ins for the host memory of one call. outputs[i] belongs to
+// Aligned stand-ins for the host memory of one call. `n` is the input block's
+// count as the entry point read it (once, into EntrySpec::n); outputs[i] belongs to
 // entry.outputs[i] (zero-filled, `length` elements); outDoubles[j] to
 // entry.outDoubles[j]; `modes` is the count for CountSource::kModes outputs;
 // `spectrum` is the record handed to the spectrum estimators.
 struct EntryCall {
   const void* input;
+  int32_t n;
   void* outputs[kMaxOutputs];
   double outDoubles[kMaxOutDoubles];
   int32_t modes;

@@ -147,7 +147,7 @@ int32_t PcarSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t 
 }  // namespace
 
 // ================================ exports ================================
-// Estimator arguments: the input, n, the scalars in the entry point's order,
+// Estimator arguments: the input, its count (c.n), the scalars in the entry point's order,
 // the outputs (aligned stand-ins, in the estimator's own order), extra pointers.
 
 extern "C" {
@@ -155,10 +155,9 @@ extern "C" {
 QDM_API int32_t QdmCxPronyH(QdmArrayHandle data, int32_t p, double samplingRate,
                             QdmArrayHandle amplitude, QdmArrayHandle phase, QdmArrayHandle damping,
                             QdmArrayHandle frequency) {
-  const int32_t n = host::BlockCount(data);
   return PronyEntry(data, kCx, p, samplingRate, amplitude, phase, damping, frequency,
                     ResizeFailure::kEmptyOutputs, [&](EntryCall& c) {
-                      return PronyComplex(c.ComplexInput(), n, p, samplingRate, c.RealOutput(0),
+                      return PronyComplex(c.ComplexInput(), c.n, p, samplingRate, c.RealOutput(0),
                                           c.RealOutput(1), c.RealOutput(2), c.RealOutput(3),
                                           &c.modes);
                     });
@@ -170,10 +169,9 @@ QDM_API int32_t QdmRePronyH(QdmArrayHandle data, int32_t p, double samplingRate,
                             const uint8_t* realSignal, QdmArrayHandle amplitude,
                             QdmArrayHandle phase, QdmArrayHandle damping,
                             QdmArrayHandle frequency) {
-  const int32_t n = host::BlockCount(data);
   return PronyEntry(data, kReal, p, samplingRate, amplitude, phase, damping, frequency,
                     ResizeFailure::kReturnAtOnce, [&](EntryCall& c) {
-                      return PronyReal(c.RealInput(), n, p, samplingRate, FlagValue(realSignal),
+                      return PronyReal(c.RealInput(), c.n, p, samplingRate, FlagValue(realSignal),
                                        c.RealOutput(0), c.RealOutput(1), c.RealOutput(2),
                                        c.RealOutput(3), &c.modes);
                     });
@@ -181,48 +179,43 @@ QDM_API int32_t QdmRePronyH(QdmArrayHandle data, int32_t p, double samplingRate,
 
 QDM_API int32_t QdmCxCovarianceH(QdmArrayHandle data, int32_t p, QdmArrayHandle coefficients,
                                  QdmArrayHandle poles, double* noiseVariance) {
-  const int32_t n = host::BlockCount(data);
   return CovarianceEntry(data, kCx, p, coefficients, poles, noiseVariance, [&](EntryCall& c) {
-    return CovarianceArComplex(c.ComplexInput(), n, p, c.ComplexOutput(1), c.ComplexOutput(0),
+    return CovarianceArComplex(c.ComplexInput(), c.n, p, c.ComplexOutput(1), c.ComplexOutput(0),
                                &c.outDoubles[0]);
   });
 }
 
 QDM_API int32_t QdmReCovarianceH(QdmArrayHandle data, int32_t p, QdmArrayHandle coefficients,
                                  QdmArrayHandle poles, double* noiseVariance) {
-  const int32_t n = host::BlockCount(data);
   return CovarianceEntry(data, kReal, p, coefficients, poles, noiseVariance, [&](EntryCall& c) {
-    return CovarianceArReal(c.RealInput(), n, p, c.RealOutput(1), c.ComplexOutput(0),
+    return CovarianceArReal(c.RealInput(), c.n, p, c.RealOutput(1), c.ComplexOutput(0),
                             &c.outDoubles[0]);
   });
 }
 
 QDM_API int32_t QdmCxPCARH(QdmArrayHandle data, int32_t p, int32_t components,
                            QdmArrayHandle coefficients, QdmArrayHandle roots) {
-  const int32_t n = host::BlockCount(data);
   return PcarEntry(data, kCx, p, components, coefficients, roots, [&](EntryCall& c) {
-    return PcarEstimateComplex(c.ComplexInput(), n, p, components, c.ComplexOutput(1),
+    return PcarEstimateComplex(c.ComplexInput(), c.n, p, components, c.ComplexOutput(1),
                                c.ComplexOutput(0));
   });
 }
 
 QDM_API int32_t QdmRePCARH(QdmArrayHandle data, int32_t p, int32_t components,
                            QdmArrayHandle coefficients, QdmArrayHandle roots) {
-  const int32_t n = host::BlockCount(data);
   return PcarEntry(data, kReal, p, components, coefficients, roots, [&](EntryCall& c) {
-    return PcarEstimateReal(c.RealInput(), n, p, components, c.RealOutput(1), c.ComplexOutput(0));
+    return PcarEstimateReal(c.RealInput(), c.n, p, components, c.RealOutput(1), c.ComplexOutput(0));
   });
 }
 
 QDM_API int32_t QdmCxMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M, double samplingRate,
                                    QdmArrayHandle amplitude, QdmArrayHandle phase,
                                    QdmArrayHandle damping, QdmArrayHandle frequency, double* mse) {
-  const int32_t n = host::BlockCount(data);
   return PencilEntry(data, kCx, L, M, samplingRate, amplitude, phase, damping, frequency, mse,
                      [&](EntryCall& c) {
-                       return MatrixPencilComplex(c.ComplexInput(), n, L, M, samplingRate,
+                       return MatrixPencilComplex(c.ComplexInput(), c.n, L, M, samplingRate,
                                                   c.RealOutput(0), c.RealOutput(1), c.RealOutput(2),
-                                                  c.RealOutput(3), &c.outDoubles[0], &c.modes);
+                                                  c.RealOutput(3), &c.modes, &c.outDoubles[0]);
                      });
 }
 
@@ -230,13 +223,12 @@ QDM_API int32_t QdmReMatrixPencilH(QdmArrayHandle data, int32_t L, int32_t M, do
                                    const uint8_t* realSignal, QdmArrayHandle amplitude,
                                    QdmArrayHandle phase, QdmArrayHandle damping,
                                    QdmArrayHandle frequency, double* mse) {
-  const int32_t n = host::BlockCount(data);
   return PencilEntry(data, kReal, L, M, samplingRate, amplitude, phase, damping, frequency, mse,
                      [&](EntryCall& c) {
-                       return MatrixPencilReal(c.RealInput(), n, L, M, samplingRate,
+                       return MatrixPencilReal(c.RealInput(), c.n, L, M, samplingRate,
                                                FlagValue(realSignal), c.RealOutput(0),
                                                c.RealOutput(1), c.RealOutput(2), c.RealOutput(3),
-                                               &c.outDoubles[0], &c.modes);
+                                               &c.modes, &c.outDoubles[0]);
                      });
 }
 
@@ -259,21 +251,19 @@ QDM_API int32_t QdmReMinDescriptLenH(QdmArrayHandle data, int32_t L, int32_t min
 QDM_API int32_t QdmCxCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m, double samplingRate,
                                      double* f0, double* df, QdmArrayHandle spectrum,
                                      double* noiseVariance) {
-  const int32_t n = host::BlockCount(data);
-  return CovSpectrumEntry(data, kCx, p, m, samplingRate, f0, df, spectrum, noiseVariance,
-                          [&](EntryCall& c, int32_t N) {
-                            return CovPowerSpectrumComplex(c.ComplexInput(), n, p, N, samplingRate,
-                                                           &c.spectrum, &c.outDoubles[2]);
-                          });
+  return CovSpectrumEntry(
+      data, kCx, p, m, samplingRate, f0, df, spectrum, noiseVariance, [&](EntryCall& c, int32_t N) {
+        return CovPowerSpectrumComplex(c.ComplexInput(), c.n, p, N, samplingRate, &c.spectrum,
+                                       &c.outDoubles[2]);
+      });
 }
 
 QDM_API int32_t QdmReCovPowerSpectrH(QdmArrayHandle data, int32_t p, int32_t m, double samplingRate,
                                      double* f0, double* df, QdmArrayHandle spectrum,
                                      double* noiseVariance) {
-  const int32_t n = host::BlockCount(data);
   return CovSpectrumEntry(data, kReal, p, m, samplingRate, f0, df, spectrum, noiseVariance,
                           [&](EntryCall& c, int32_t N) {
-                            return CovPowerSpectrumReal(c.RealInput(), n, p, N, samplingRate,
+                            return CovPowerSpectrumReal(c.RealInput(), c.n, p, N, samplingRate,
                                                         &c.spectrum, &c.outDoubles[2]);
                           });
 }
@@ -282,13 +272,12 @@ QDM_API int32_t QdmCxPCARPowerSpectrumH(QdmArrayHandle data, int32_t p, int32_t 
                                         double samplingRate, QdmArrayHandle amplitude,
                                         QdmArrayHandle phase, QdmArrayHandle frequency, double* f0,
                                         double* df, QdmArrayHandle spectrum, double* fitError) {
-  const int32_t n = host::BlockCount(data);
   return PcarSpectrumEntry(
       data, kCx, p, m, k, samplingRate, amplitude, phase, frequency, f0, df, spectrum, fitError,
       ResizeFailure::kEmptyOutputs, [&](EntryCall& c, int32_t N) {
-        return PcarPowerSpectrumComplex(c.ComplexInput(), n, p, k, N, samplingRate, c.RealOutput(0),
-                                        c.RealOutput(1), c.RealOutput(2), &c.outDoubles[2],
-                                        &c.spectrum, &c.modes);
+        return PcarPowerSpectrumComplex(c.ComplexInput(), c.n, p, k, N, samplingRate,
+                                        c.RealOutput(0), c.RealOutput(1), c.RealOutput(2), &c.modes,
+                                        &c.spectrum, &c.outDoubles[2]);
       });
 }
 
@@ -299,13 +288,12 @@ QDM_API int32_t QdmRePCARPowerSpectrumH(QdmArrayHandle data, int32_t p, int32_t 
                                         QdmArrayHandle amplitude, QdmArrayHandle phase,
                                         QdmArrayHandle frequency, double* f0, double* df,
                                         QdmArrayHandle spectrum, double* fitError) {
-  const int32_t n = host::BlockCount(data);
   return PcarSpectrumEntry(
       data, kReal, p, m, k, samplingRate, amplitude, phase, frequency, f0, df, spectrum, fitError,
       ResizeFailure::kReturnAtOnce, [&](EntryCall& c, int32_t N) {
-        return PcarPowerSpectrumReal(c.RealInput(), n, p, k, N, samplingRate, FlagValue(realSignal),
-                                     c.RealOutput(0), c.RealOutput(1), c.RealOutput(2),
-                                     &c.outDoubles[2], &c.spectrum, &c.modes);
+        return PcarPowerSpectrumReal(c.RealInput(), c.n, p, k, N, samplingRate,
+                                     FlagValue(realSignal), c.RealOutput(0), c.RealOutput(1),
+                                     c.RealOutput(2), &c.modes, &c.spectrum, &c.outDoubles[2]);
       });
 }
 

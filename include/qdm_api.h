@@ -112,6 +112,31 @@ QDM_PLAIN_API const char* qdm_version(void);
  *  general text. Never null. */
 QDM_PLAIN_API const char* qdm_status_text(int32_t status);
 
+/** What went wrong in the calling thread's last call, in words: for an
+ *  argument error the argument, its value and the limit it broke, e.g.
+ *  "order 300 is above floor(2n/3) = 206 (n = 309)", "components 5 is above
+ *  order = 4", "fs -1 is not positive", "poles is null", "x[17] is not
+ *  finite: nan"; for any other error qdm_status_text() of its status; after a
+ *  success or the rank-deficiency warning the empty string.
+ *
+ *  Arguments are named as this header names them (the matrix pencil's M is
+ *  `order`). "Last call" means the last call of a function that returns a
+ *  status (the fits, the spectra, qdm_spectrum_layout()): each one replaces the
+ *  record, so a success clears it. The helpers that return no status
+ *  (qdm_version(), qdm_status_text(), qdm_spectrum_length(), qdm_output_room(),
+ *  qdm_default_pencil()) and this function leave it alone. The record is per
+ *  thread, as errno and sqlite3_errmsg() keep theirs: threads calling at once
+ *  never see each other's messages, and the message stays available until the
+ *  thread's next call however many other threads call meanwhile. A status
+ *  alone stays the interface: the message adds words, never a decision.
+ *
+ *  @param buffer  out: the message, NUL-terminated, cut to size - 1 bytes; may
+ *                 be null when size is 0
+ *  @param size    bytes of room at buffer
+ *  @return the length of the whole message (without the NUL), as snprintf
+ *          returns it: a return >= size means the message was cut. */
+QDM_PLAIN_API int32_t qdm_last_error_message(char* buffer, int32_t size);
+
 /** Number of spectrum values for `points` requested points: the smallest power
  *  of two not below `points`; 0 when points < 2 or points > 2^30 (the spectra
  *  then return ::QDM_ERR_SPECTRUM_SIZE). */

@@ -106,6 +106,11 @@ class Error(Exception):
         What went wrong: `status_text(code)`, or the binding's own message.
     function : str
         The fit that failed, e.g. ``"matrix_pencil"``.
+    detail : str or None
+        For an argument the library refused, which one, its value and the
+        limit it broke, with the argument named as this package names it,
+        e.g. ``"order 300 is above floor(2n/3) = 206 (n = 309)"``; the message
+        is then ``"function: detail"``. None for other errors.
 
     Examples
     --------
@@ -115,13 +120,17 @@ class Error(Exception):
     ... except qdm.Error as e:
     ...     print(type(e).__name__, e.code, e.function)
     ...     print(e.text)
+    ...     print(e)
     ArgumentError -42412 covariance
     order zero, negative or above floor(2n/3), or components, k or M zero or negative
+    covariance: order 5 is above floor(2n/3) = 2 (n = 3)
     """
 
-    def __init__(self, code: Optional[int], text: str, function: str) -> None:
-        self.code, self.text, self.function = code, text, function
-        super().__init__(f"{function}: {text}" if code is None
+    def __init__(self, code: Optional[int], text: str, function: str,
+                 detail: Optional[str] = None) -> None:
+        self.code, self.text, self.function, self.detail = code, text, function, detail
+        super().__init__(f"{function}: {detail}" if detail is not None
+                         else f"{function}: {text}" if code is None
                          else f"{function}: {code}: {text}")
 
 
@@ -243,7 +252,11 @@ _NON_FINITE_RESULT = -30001
 _NULL_POINTER = -42421
 
 
-def _check(status, function):
+def _check(status, function, names=(), *given):
+    """Raises the error a library status stands for. For an argument error,
+    `names` pairs the library's argument names with this package's, and
+    `given` holds the caller's values in the same order (None: the library's
+    value is the caller's): the library's message is told in the caller's terms."""
     if status == 0:
         return
     text = status_text(status)
@@ -254,12 +267,41 @@ def _check(status, function):
         _warnings.warn(SingularBoundWarning(status, text, function), stacklevel=3)
         return
     if -42499 <= status <= -42400:
-        raise ArgumentError(status, text, function)
+        raise ArgumentError(status, text, function, _detail(names, given))
     if status == _NO_MEMORY:
         raise OutOfMemoryError(status, text, function)
     if status == _NON_FINITE_RESULT:
         raise NonFiniteResultError(status, text, function)
     raise NumericError(status, text, function)
+
+
+def _detail(names, given):
+    """The calling thread's last library message, "<argument> <value> <rest>",
+    with the argument renamed and a value the binding pinned to int32 given
+    back as the caller wrote it."""
+    room = _clib.qdm_last_error_message(None, 0) + 1
+    buffer = _ct.create_string_buffer(room)
+    _clib.qdm_last_error_message(buffer, room)
+    detail = buffer.value.decode()
+    head, _, rest = detail.partition(" ")
+    for (ours, yours), value in zip(names, given + (None,) * len(names)):
+        if head == ours:
+            number, _, tail = rest.partition(" ")
+            if value is not None and number.lstrip("-").isdigit():
+                rest = f"{_op.index(value)} {tail}"
+            return f"{yours} {rest}"
+    return detail
+
+
+# Library argument names, and this package's for them, fit by fit.
+_N = ("n", "len(x)")
+_ORDER, _COMPONENTS, _FS = ("order", "order"), ("components", "components"), ("fs", "fs")
+_COVARIANCE = (_N, _ORDER)
+_PCAR = (_N, _ORDER, _COMPONENTS)
+_PRONY = (_N, _ORDER, _FS)
+_PENCIL = (_N, ("pencil", "pencil"), ("order", "modes"), _FS)
+_MDL = (_N, ("max_order", "max_order"), ("min_order", "min_order"))
+_SPECTRUM = (_N, _ORDER, ("points", "nfft"), _COMPONENTS, _FS)
 
 
 # ---- arguments -----------------------------------------------------------------------
@@ -276,27 +318,32 @@ def _signal(x, function):
     if dt is _F64 or dt is _C128:
         if a.ndim == 1 and a.flags.c_contiguous and a.flags.aligned:
             if a.shape[0] > _INT32_MAX:
-                raise ArgumentError(None, "more than 2^31 - 1 samples", function)
+                raise ArgumentError(None, "x has more than 2^31 - 1 samples", function)
             return a, dt is _C128
     elif _np.can_cast(dt, _F64, "safe"):
         dt = _F64
     elif _np.can_cast(dt, _C128, "safe"):
         dt = _C128
     else:
-        raise DTypeError(None, f"dtype {dt} has no lossless conversion to float64 or "
+        raise DTypeError(None, f"x of dtype {dt} has no lossless conversion to float64 or "
                                "complex128", function)
     if a.ndim != 1:
         raise ArgumentError(None, f"x must be one-dimensional, not {a.ndim}-D "
                                   f"of shape {a.shape}", function)
     if a.shape[0] > _INT32_MAX:
-        raise ArgumentError(None, "more than 2^31 - 1 samples", function)
+        raise ArgumentError(None, "x has more than 2^31 - 1 samples", function)
     return _np.ascontiguousarray(a, dtype=dt), dt is _C128
 
 
-def _int(v):
+def _int(v, name, function):
     """An integer argument as int32. Values beyond int32 are pinned to its ends,
-    which every range check of the library refuses with its own code."""
-    v = _op.index(v)
+    which every range check of the library refuses with its own code. Anything
+    but an integer (2.5, "3", None) is a TypeError naming the argument, as
+    numpy and scipy refuse a float where they index."""
+    try:
+        v = _op.index(v)
+    except TypeError:
+        raise TypeError(f"{function}: {name} must be an integer, not {v!r}") from None
     return _INT32_MIN if v < _INT32_MIN else _INT32_MAX if v > _INT32_MAX else v
 
 
@@ -308,12 +355,20 @@ def _room(v, n):
 
 def _real_flag(real_signal, is_complex, function):
     if real_signal and is_complex:
-        raise ArgumentError(None, "real_signal applies to real data only", function)
+        raise ArgumentError(None, "real_signal=True applies to real data only, not to complex x",
+                            function)
     return 1 if real_signal else 0
 
 
-def _fs(fs):
-    return float(fs)
+def _fs(fs, function):
+    """The sampling rate as a float; a string or anything float() refuses is a
+    TypeError naming fs."""
+    if not isinstance(fs, (str, bytes)):
+        try:
+            return float(fs)
+        except (TypeError, ValueError):
+            pass
+    raise TypeError(f"{function}: fs must be a real number, not {fs!r}")
 
 
 _addressof, _from_buffer = _ct.addressof, _ct.c_char.from_buffer
@@ -617,12 +672,12 @@ def _stderr(a, c, fs, flag, block, count, function):
 def _nfft(nfft, points, function):
     """The spectrum length asked for: `nfft`, or its old name `points`."""
     if points is None:
-        return 512 if nfft is None else _int(nfft)
+        return 512 if nfft is None else _int(nfft, "nfft", function)
     if nfft is not None:
         raise ArgumentError(None, "give nfft only (points is its old name)", function)
     _warnings.warn(f"{function}: points= is now called nfft=, as in scipy.signal; the old "
                    "name will be removed", DeprecationWarning, stacklevel=3)
-    return _int(points)
+    return _int(points, "points", function)
 
 
 def _onesided(return_onesided, is_complex, function):
@@ -709,13 +764,13 @@ def covariance(x: "ArrayLike", *, order: int) -> CovarianceFit:
     True
     """
     a, c = _signal(x, "covariance")
-    n, p = a.shape[0], _int(order)
+    n, p = a.shape[0], _int(order, "order", "covariance")
     m = _room(p, n)
     coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
     poles = _np.empty(max(m, 1), _C128)
     nv = _ct.c_double()
     _check(_fn["covariance", _kind(c)](_addr(a), n, p, _addr(coef), _addr(poles),
-                                       _ct.byref(nv)), "covariance")
+                                       _ct.byref(nv)), "covariance", _COVARIANCE, None, order)
     return CovarianceFit(coef, poles[:m], nv.value)
 
 
@@ -811,12 +866,12 @@ def pcar(x: "ArrayLike", *, order: int, components: int,
     """
     a, c = _signal(x, "pcar")
     _solver(solver, "pcar")
-    n, p, k = a.shape[0], _int(order), _int(components)
+    n, p, k = a.shape[0], _int(order, "order", "pcar"), _int(components, "components", "pcar")
     m = _room(p, n)
     coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
     roots = _np.empty(max(m, 1), _C128)
     _check(_fn["pcar_solver", _kind(c)](_addr(a), n, p, k, _SOLVERS[solver], _addr(coef),
-                                        _addr(roots)), "pcar")
+                                        _addr(roots)), "pcar", _PCAR, None, order, components)
     return PcarFit(coef, roots[:m])
 
 
@@ -906,14 +961,14 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
     [0.5  0.25] [ 0.5 -1. ]
     """
     a, c = _signal(x, "prony")
-    n, p = a.shape[0], _int(order)
+    n, p = a.shape[0], _int(order, "order", "prony")
     block, rows = _modes(4, _room(p, n))
     count = _ct.c_int32()
-    args: tuple = (_addr(a), n, p, _fs(fs))
+    args: tuple = (_addr(a), n, p, _fs(fs, "prony"))
     flag = _real_flag(real_signal, c, "prony")
     if not c:
         args += (flag,)
-    _check(_fn["prony", _kind(c)](*args, *rows, _ct.byref(count)), "prony")
+    _check(_fn["prony", _kind(c)](*args, *rows, _ct.byref(count)), "prony", _PRONY, None, order)
     amplitude, phase, damping, frequency = block[:, :count.value]
     sa, sp, sd, sf = _stderr(a, c, args[3], flag, block, count.value, "prony")
     i = _order(frequency, sort)
@@ -1039,22 +1094,23 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
     >>> qdm.matrix_pencil(x, modes=41, pencil=40)
     Traceback (most recent call last):
         ...
-    qdm.ArgumentError: matrix_pencil: -42413: components, k or M greater than the order or L
+    qdm.ArgumentError: matrix_pencil: modes 41 is above pencil = 40
     """
     a, c = _signal(x, "matrix_pencil")
     _solver(solver, "matrix_pencil")
     n = a.shape[0]
-    L = _clib.qdm_default_pencil(n) if pencil is None else _int(pencil)
-    M = _int(modes)
+    L = _clib.qdm_default_pencil(n) if pencil is None else _int(pencil, "pencil", "matrix_pencil")
+    M = _int(modes, "modes", "matrix_pencil")
     block, rows = _modes(4, _room(M, n))
     count, mse = _ct.c_int32(), _ct.c_double()
-    args: tuple = (_addr(a), n, L, M, _fs(fs))
+    args: tuple = (_addr(a), n, L, M, _fs(fs, "matrix_pencil"))
     flag = _real_flag(real_signal, c, "matrix_pencil")
     if not c:
         args += (flag,)
     args += (_SOLVERS[solver],)
     _check(_fn["matrix_pencil_solver", _kind(c)](*args, *rows, _ct.byref(count),
-                                                  _ct.byref(mse)), "matrix_pencil")
+                                                  _ct.byref(mse)), "matrix_pencil", _PENCIL,
+           None, pencil, modes)
     amplitude, phase, damping, frequency = block[:, :count.value]
     sa, sp, sd, sf = _stderr(a, c, args[4], flag, block, count.value, "matrix_pencil")
     i = _order(frequency, sort)
@@ -1134,10 +1190,11 @@ def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int
     """
     a, c = _signal(x, "mdl_order")
     n = a.shape[0]
-    upper = n // 3 if max_order is None else _int(max_order)
+    upper = n // 3 if max_order is None else _int(max_order, "max_order", "mdl_order")
+    lower = _int(min_order, "min_order", "mdl_order")
     order = _ct.c_int32(0)
-    _check(_fn["mdl_order", _kind(c)](_addr(a), n, upper, _int(min_order),
-                                      _ct.byref(order)), "mdl_order")
+    _check(_fn["mdl_order", _kind(c)](_addr(a), n, upper, lower, _ct.byref(order)), "mdl_order",
+           _MDL, None, max_order, min_order)
     return order.value
 
 
@@ -1230,24 +1287,26 @@ def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
     1024 -500.0
     """
     a, c = _signal(x, "covariance_psd")
-    n, p = a.shape[0], _int(order)
+    n, p = a.shape[0], _int(order, "order", "covariance_psd")
     pts = _nfft(nfft, points, "covariance_psd")
+    rate = _fs(fs, "covariance_psd")
+    given = (None, order, nfft if points is None else points)
     flag = _onesided(return_onesided, c, "covariance_psd")
     m = _room(p, n)
     coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
     poles = _np.empty(max(m, 1), _C128)
     nv = _ct.c_double()
     _check(_fn["covariance", _kind(c)](_addr(a), n, p, _addr(coef), _addr(poles),
-                                       _ct.byref(nv)), "covariance_psd")
+                                       _ct.byref(nv)), "covariance_psd", _SPECTRUM, *given)
     psd = _fn["ar_psd", _kind(c)]
     # Null outputs: the sizes are checked before room for them is made.
-    probe = psd(None, p, nv.value, pts, _fs(fs), flag, None, None, None, None)
+    probe = psd(None, p, nv.value, pts, rate, flag, None, None, None, None)
     if probe != _NULL_POINTER:
-        _check(probe, "covariance_psd")
+        _check(probe, "covariance_psd", _SPECTRUM, *given)
     out = _np.empty((3, max(_clib.qdm_spectrum_length(pts), 1)))
     count = _ct.c_int32()
-    _check(psd(_addr(coef), p, nv.value, pts, _fs(fs), flag, *(_addr(row) for row in out),
-               _ct.byref(count)), "covariance_psd")
+    _check(psd(_addr(coef), p, nv.value, pts, rate, flag, *(_addr(row) for row in out),
+               _ct.byref(count)), "covariance_psd", _SPECTRUM, *given)
     f, db, psd = out[:, :count.value]
     return CovarianceSpectrum(f, psd, db, nv.value)
 
@@ -1350,7 +1409,8 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
     [100. 300.] [0.5  0.25] [ 0.5 -1. ]
     """
     a, c = _signal(x, "pcar_psd")
-    n, p, k = a.shape[0], _int(order), _int(components)
+    n, p = a.shape[0], _int(order, "order", "pcar_psd")
+    k = _int(components, "components", "pcar_psd")
     pts = _nfft(nfft, points, "pcar_psd")
     onesided = _onesided(return_onesided, c, "pcar_psd")
     N = _clib.qdm_spectrum_length(pts)
@@ -1358,12 +1418,13 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
     block, rows = _modes(3, _room(k, n))
     count = _ct.c_int32()
     f0, df, err = _ct.c_double(), _ct.c_double(), _ct.c_double()
-    args: tuple = (_addr(a), n, p, pts, k, _fs(fs))
+    args: tuple = (_addr(a), n, p, pts, k, _fs(fs, "pcar_psd"))
     flag = _real_flag(real_signal, c, "pcar_psd")
     if not c:
         args += (flag,)
     _check(_fn["pcar_psd", _kind(c)](*args, *rows, _ct.byref(count), _addr(db),
-                                     _ct.byref(f0), _ct.byref(df), _ct.byref(err)), "pcar_psd")
+                                     _ct.byref(f0), _ct.byref(df), _ct.byref(err)), "pcar_psd",
+           _SPECTRUM, None, order, nfft if points is None else points, components)
     amplitude, phase, frequency = block[:, :count.value]
     axis, length = _np.empty(N), _ct.c_int32()
     _check(_clib.qdm_spectrum_layout(_addr(db), None, N, args[5], onesided, _addr(axis),

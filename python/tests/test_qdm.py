@@ -173,7 +173,61 @@ def test_bad_input_raises_with_the_library_code_and_text(call, exc, code):
     assert isinstance(e, qdm.Error) and e.code == code
     if code is not None:
         assert isinstance(e, ValueError) and e.text == qdm.status_text(code)
-        assert str(code) in str(e) and e.text in str(e)
+        assert e.detail and str(e) == f"{e.function}: {e.detail}"
+
+
+MESSAGES = [  # call, exception, the message exactly: argument, value, limit in the caller's names
+    (lambda: qdm.covariance(np.zeros(309), order=300), E,
+     "covariance: order 300 is above floor(2n/3) = 206 (n = 309)"),
+    (lambda: qdm.covariance(REAL, order=2**40), E,
+     "covariance: order 1099511627776 is above floor(2n/3) = 64 (n = 96)"),
+    (lambda: qdm.covariance(REAL[:0], order=1), E, "covariance: len(x) 0 is below 1"),
+    (lambda: qdm.covariance(np.r_[REAL[:10], np.nan], order=1), E,
+     "covariance: x[10] is not finite: nan"),
+    (lambda: qdm.pcar(REAL, order=-1, components=1), E, "pcar: order -1 is below 0"),
+    (lambda: qdm.pcar(COMPLEX, order=4, components=5), E,
+     "pcar: components 5 is above order = 4"),
+    (lambda: qdm.prony(REAL, order=0), E, "prony: order 0 is below 1"),
+    (lambda: qdm.prony(REAL, order=4, fs=-2.5), E, "prony: fs -2.5 is not positive"),
+    (lambda: qdm.prony(REAL, order=4, fs=np.inf), E, "prony: fs inf is not finite"),
+    (lambda: qdm.matrix_pencil(REAL, modes=11, pencil=10), E,
+     "matrix_pencil: modes 11 is above pencil = 10"),
+    (lambda: qdm.matrix_pencil(COMPLEX, modes=0), E, "matrix_pencil: modes 0 is below 1"),
+    (lambda: qdm.matrix_pencil(REAL, modes=2, pencil=65), E,
+     "matrix_pencil: pencil 65 is above floor(2n/3) = 64 (n = 96)"),
+    (lambda: qdm.mdl_order(REAL, max_order=8, min_order=8), E,
+     "mdl_order: max_order 8 is not above min_order = 8"),
+    (lambda: qdm.mdl_order(REAL, min_order=-2**40), E, "mdl_order: min_order -1099511627776 is below 1"),
+    (lambda: qdm.covariance_psd(REAL, order=4, nfft=1), E, "covariance_psd: nfft 1 is below 2"),
+    (lambda: qdm.covariance_psd(REAL, order=40, nfft=20), E,
+     "covariance_psd: nfft 20 gives fewer spectrum values than order + 1 = 41"),
+    (lambda: qdm.pcar_psd(COMPLEX, order=8, components=9), E,
+     "pcar_psd: components 9 is above order = 8"),
+    (lambda: qdm.pcar_psd(COMPLEX, order=8, components=2, fs=0), E,
+     "pcar_psd: fs 0 is not positive"),
+    (lambda: qdm.covariance(REAL, order=2.5), TypeError, "covariance: order must be an integer, not 2.5"),
+    (lambda: qdm.covariance(REAL, order="3"), TypeError,
+     "covariance: order must be an integer, not '3'"),
+    (lambda: qdm.pcar(REAL, order=8, components=None), TypeError,
+     "pcar: components must be an integer, not None"),
+    (lambda: qdm.matrix_pencil(REAL, modes=2, pencil=30.0), TypeError,
+     "matrix_pencil: pencil must be an integer, not 30.0"),
+    (lambda: qdm.mdl_order(REAL, max_order="9"), TypeError,
+     "mdl_order: max_order must be an integer, not '9'"),
+    (lambda: qdm.covariance_psd(REAL, order=4, nfft=64.5), TypeError,
+     "covariance_psd: nfft must be an integer, not 64.5"),
+    (lambda: qdm.prony(REAL, order=4, fs="1000"), TypeError,
+     "prony: fs must be a real number, not '1000'"),
+    (lambda: qdm.covariance(REAL.reshape(8, 12), order=4), E,
+     "covariance: x must be one-dimensional, not 2-D of shape (8, 12)"),
+    (lambda: qdm.prony(COMPLEX, order=4, real_signal=True), E,
+     "prony: real_signal=True applies to real data only, not to complex x"),
+]
+
+
+@pytest.mark.parametrize("call,exc,message", MESSAGES, ids=range(len(MESSAGES)))
+def test_a_refusal_names_the_argument_its_value_and_the_limit(call, exc, message):
+    assert str(pytest.raises(exc, call).value) == message
 
 
 @pytest.mark.parametrize("call", [

@@ -8,6 +8,7 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
+#include <string>
 #include <thread>
 #include <vector>
 
@@ -91,6 +92,35 @@ TEST(PlainThreads, KrylovCallsMadeTogetherMatchCallsMadeAlone) {
       EXPECT_EQ(got[size_t(t)][i], alone[k]) << "thread " << t << " case " << k;
     }
   }
+}
+
+// Each thread's refusal message is its own: threads refusing different orders
+// at once each read back the message of their own last call.
+TEST(PlainThreads, EachThreadReadsItsOwnArgumentMessage) {
+  constexpr int kThreads = 6, kRounds = 200;
+  std::vector<double> x(30, 1.0);  // floor(2n/3) = 20
+  std::atomic<int> ready{0}, wrong{0};
+  std::vector<std::thread> threads;
+  for (int t = 0; t < kThreads; ++t) {
+    threads.emplace_back([&, t] {
+      ready.fetch_add(1);
+      while (ready.load() < kThreads) std::this_thread::yield();
+      double a[64], v = 0.0;
+      qdm_complex poles[64];
+      for (int i = 0; i < kRounds; ++i) {
+        const int32_t order = 21 + t;
+        const int32_t s = qdm_covariance_real(x.data(), 30, order, a, poles, &v);
+        std::this_thread::yield();
+        char text[128];
+        qdm_last_error_message(text, sizeof text);
+        const std::string want =
+            "order " + std::to_string(order) + " is above floor(2n/3) = 20 (n = 30)";
+        if (s != QDM_ERR_COUNT || want != text) wrong.fetch_add(1);
+      }
+    });
+  }
+  for (std::thread& th : threads) th.join();
+  EXPECT_EQ(wrong.load(), 0);
 }
 
 }  // namespace

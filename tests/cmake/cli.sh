@@ -129,6 +129,21 @@ PY
     || fail "README Python example: $(cat err)"
   echo "ok: README Python example"
   ;;
+argument_words)
+  # A refused value is named with its value and the limit it broke, in one line.
+  while IFS='|' read -r args words; do
+    # shellcheck disable=SC2086
+    expect 1 $args
+    grep -qF -- "$words" err || fail "qdm $args: expected '$words' in: $(cat err)"
+  done <<'EOF'
+covariance --example real --order 300|qdm_covariance_real returned -42412: order 300 is above floor(2n/3) = 85 (n = 128)
+pcar --example complex --order 8 --components 9|returned -42413: components 9 is above order = 8
+pencil --example complex --pencil 10 --modes 11|returned -42413: order 11 is above pencil = 10
+mdl --example real --upper 3 --min-order 3|returned -42415: max_order 3 is not above min_order = 3
+prony --example real --rate -5|returned -42418: fs -5 is not positive
+covspectrum --example real --order 40 --nfft 20|returned -42422: points 20 gives fewer spectrum values than order + 1 = 41
+EOF
+  ;;
 exit_codes)
   # Every command in README's exit-status table gives the code of its row.
   root=$(dirname "$readme")

@@ -116,4 +116,20 @@ TEST(EntryChecks, EveryArgumentSetGivesItsCodeAndItsResizes) {
   }
 }
 
+// An order of 0 passes the covariance spectrum's checks: the outputs are sized
+// for it, and only then is the order refused (12), the outputs emptied again.
+TEST(EntryChecks, CovarianceSpectrumOfOrderZeroIsRefusedAfterItsResizes) {
+  const Scalars s{12, 0, 16, 0, 1};
+  for (const Export& x : Exports()) {
+    if (x.family != Family::kCovSpectrum) continue;
+    Call c = MakeCall(x, s);
+    const int64_t mark = ResizeMark();
+    EXPECT_EQ(x.invoke(Qdm(), c, s), HostCode(12)) << x.name;
+    std::vector<ResizeCall> want = x.resizes(s), emptying = EmptyingResizes(x, s);
+    want.insert(want.end(), emptying.begin(), emptying.end());
+    EXPECT_EQ(ResizesSince(mark), want) << x.name;
+    ExpectEmptied(x, c, x.name, true);
+  }
+}
+
 }  // namespace

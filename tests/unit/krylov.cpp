@@ -237,12 +237,12 @@ void Agree() {
         st[route] = MatrixPencilSolverComplex(x.data(), c.n, L, c.M, 1.0,
                                               route ? PencilSolver::kKrylov : PencilSolver::kDense,
                                               a[route].data(), p[route].data(), d[route].data(),
-                                              f[route].data(), &mse[route], &count[route]);
+                                              f[route].data(), &count[route], &mse[route]);
       } else {
         st[route] = MatrixPencilSolverReal(x.data(), c.n, L, c.M, 1.0, 0,
                                            route ? PencilSolver::kKrylov : PencilSolver::kDense,
                                            a[route].data(), p[route].data(), d[route].data(),
-                                           f[route].data(), &mse[route], &count[route]);
+                                           f[route].data(), &count[route], &mse[route]);
       }
     }
     ASSERT_EQ(st[0], st[1]);
@@ -514,9 +514,9 @@ TEST(PcarKrylov, SameStatusesAtTheEdges) {
     int32_t n, p, k;
     double fill;  // every sample; NaN and infinity included
   };
-  const Edge edges[] = {{0, 0, 1, 1.0},        {9, 7, 1, 1.0}, {9, -1, 1, 1.0},  {9, 3, 0, 1.0},
-                        {9, 3, 4, 1.0},        {9, 6, 6, 0.0}, {40, 13, 3, 0.0}, {40, 13, 3, NAN},
-                        {40, 13, 3, INFINITY}, {3, 2, 1, 0.0}, {3, 2, 2, 0.0}};
+  // Arguments the checks refuse never reach a route: the faces' tests cover them.
+  const Edge edges[] = {{9, 6, 6, 0.0},        {40, 13, 3, 0.0}, {40, 13, 3, NAN},
+                        {40, 13, 3, INFINITY}, {3, 2, 1, 0.0},   {3, 2, 2, 0.0}};
   for (const Edge& e : edges) {
     SCOPED_TRACE(testing::Message()
                  << "n " << e.n << " p " << e.p << " k " << e.k << " fill " << e.fill);
