@@ -1538,13 +1538,13 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
     M = block.shape[1]
     out = _np.empty((4, max(M, 1)))
     variance = _ct.c_double()
-    args: tuple = (_addr(a), a.shape[0], _fs(fs))
+    args: tuple = (_addr(a), a.shape[0], _fs(fs, "mode_errors"))
     flag = _real_flag(real_signal, c, "mode_errors")
     if not c:
         args += (flag,)
     rows = [block[q].ctypes.data for q in range(4)]
     se = [_addr(out[q]) for q in range(4)]
-    _check(_fn["mode_errors", _kind(c)](*args, _int(M), *rows, *se, _ct.byref(variance)),
+    _check(_fn["mode_errors", _kind(c)](*args, _int(M, "modes", "mode_errors"), *rows, *se, _ct.byref(variance)),
            "mode_errors")
     sa, sp, sd, sf = out[:, :M]
     return ModeErrors(sa, sp, sd, sf, sd * args[2], variance.value)
