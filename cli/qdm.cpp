@@ -311,9 +311,41 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
           "qdm_spectrum_layout", s.complex, r);
       break;
   }
-  if ((kModal & Bit(m)) && !o.noSort) SortModes(count, {amp, phase, damping, freq}, freq);
+  // Prony's and the pencil's modes carry standard errors. When they cannot be
+  // had (too few samples for the noise, a singular bound) the fit stands, the
+  // errors concerned are NaN (null in JSON) and the warning says why.
+  const bool withErrors = m == kProny || m == kPencil;
+  Array seAmp(room), sePhase(room), seDamping(room), seFreq(room);
+  double modeNoise = 0.0;
+  if (withErrors && count > 0) {
+    const int32_t st =
+        s.complex ? qdm_mode_errors_complex(cx, n, rate, count, amp, phase, damping, freq, seAmp,
+                                            sePhase, seDamping, seFreq, &modeNoise)
+                  : qdm_mode_errors_real(re, n, rate, flag, count, amp, phase, damping, freq, seAmp,
+                                         sePhase, seDamping, seFreq, &modeNoise);
+    const bool refused = st <= -42401 && st >= -42499;
+    if (st != QDM_OK && st != QDM_WARN_BOUND_SINGULAR && !refused &&
+        st != QDM_ERR_NON_FINITE_RESULT && st != QDM_ERR_EXTREME_VALUE) {
+      Check(st, "qdm_mode_errors", s.complex, r);
+    }
+    if (st != QDM_OK) {
+      r.warning +=
+          (r.warning.empty() ? "" : "; ") + std::string("standard errors: ") + qdm_status_text(st);
+    }
+    if (st != QDM_OK && st != QDM_WARN_BOUND_SINGULAR) {
+      for (Array* e : {&seAmp, &sePhase, &seDamping, &seFreq})
+        std::fill(e->v.begin(), e->v.end(), NAN);
+      modeNoise = NAN;
+    }
+  }
+  if ((kModal & Bit(m)) && !o.noSort)
+    SortModes(count, {amp, phase, damping, seAmp, sePhase, seDamping, seFreq, freq}, freq);
   std::vector<double> perSecond(size_t(std::max(count, 0)));
-  for (size_t i = 0; i < perSecond.size(); ++i) perSecond[i] = damping.v[i] * rate;
+  std::vector<double> perSecondSe(perSecond.size());
+  for (size_t i = 0; i < perSecond.size(); ++i) {
+    perSecond[i] = damping.v[i] * rate;
+    perSecondSe[i] = seDamping.v[i] * rate;
+  }
   if (m == kCovariance || m == kCovSpectrum) res["noise_variance"] = variance;
   if (m == kCovariance || m == kPcar) {
     const double* c = a;
@@ -324,14 +356,18 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   if (m == kMdl) res["order"] = order;
   if (m == kPcarSpectrum) res["fit_error"] = fitError;
   if (m == kPencil) res["mse"] = mse;
+  if (withErrors) res["noise_variance"] = modeNoise;
   if (kModal & Bit(m)) {
     res["mode_count"] = count;
     const bool damped = m != kPcarSpectrum;
-    res["modes"] =
-        Columns({"frequency_hz", "amplitude", "phase_rad", "damping_per_sample", "damping_per_s"},
-                {freq, amp, phase, damped ? damping.v.data() : nullptr,
-                 damped ? perSecond.data() : nullptr},
-                size_t(count));
+    const auto se = [&](const double* v) { return withErrors ? v : nullptr; };
+    res["modes"] = Columns(
+        {"frequency_hz", "amplitude", "phase_rad", "damping_per_sample", "damping_per_s",
+         "frequency_hz_stderr", "amplitude_stderr", "phase_rad_stderr", "damping_per_sample_stderr",
+         "damping_per_s_stderr"},
+        {freq, amp, phase, damped ? damping.v.data() : nullptr, damped ? perSecond.data() : nullptr,
+         se(seFreq), se(seAmp), se(sePhase), se(seDamping), se(perSecondSe.data())},
+        size_t(count));
   }
   if (kSpectra & Bit(m)) {
     // The columns are filled in from the record's arrays as it is written.
@@ -424,6 +460,21 @@ std::string Brief(const Json& v) {
   return v.is_number_float() || v.is_null() ? buf : v.dump();
 }
 
+// A value and its standard error, the error to two significant digits and the
+// value to the same decimals ("120.000 +- 0.031"); without a usable error, the
+// value as Brief shows it and the error as it is.
+std::string WithError(const Json& value, const Json& error) {
+  const double v = value.is_null() ? NAN : value.get<double>();
+  const double e = error.is_null() ? NAN : error.get<double>();
+  if (!std::isfinite(v) || !std::isfinite(e) || e <= 0.0) {
+    return Brief(value) + " +- " + (std::isfinite(e) ? Brief(error) : std::string("nan"));
+  }
+  const int decimals = std::clamp(1 - int(std::floor(std::log10(e))), 0, 12);
+  char b[96];
+  std::snprintf(b, sizeof b, "%.*f +- %.*f", decimals, v, decimals, e);
+  return b;
+}
+
 std::string Padded(const std::string& text, size_t width) {
   return std::string(width > text.size() ? width - text.size() : 1, ' ') + text;
 }
@@ -462,10 +513,24 @@ std::string Table(const Json& j) {
     const size_t rows = columns[0].second->size();
     out += "\n" + key + (rows == 0 ? ": none\n" : "\n   #");
     if (rows == 0) continue;
-    for (const auto& [name, _] : columns) out += Padded(name, 19);
+    // A column with a standard error beside it is shown as "value +- error".
+    std::vector<std::pair<const Json*, const Json*>> shown;
+    for (const auto& [name, column] : columns) {
+      const std::string tail = "_stderr";
+      if (name.size() > tail.size() &&
+          name.compare(name.size() - tail.size(), tail.size(), tail) == 0 &&
+          v.contains(name.substr(0, name.size() - tail.size())))
+        continue;
+      const std::string errorName = name + tail;
+      const Json* error = v.contains(errorName) ? &v[errorName] : nullptr;
+      shown.emplace_back(column, error);
+      out += Padded(name, error ? 24 : 19);
+    }
     for (size_t i = 0; i < rows; ++i) {
       out += "\n" + Padded(std::to_string(i), 4);
-      for (const auto& [_, column] : columns) out += Padded(Brief((*column)[i]), 19);
+      for (const auto& [column, error] : shown)
+        out += error ? Padded(WithError((*column)[i], (*error)[i]), 24)
+                     : Padded(Brief((*column)[i]), 19);
     }
     out += "\n";
   }

@@ -163,4 +163,12 @@ StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate,
   return s;
 }
 
+// ---- error bars of given modes ----
+StatusCode ModeErrors(int32_t n, int32_t modes, double rate) {
+  if (n < 1) return status::kEmptyInput;
+  if (modes < 1) return status::kNoModes;
+  if (BadRate(rate)) return status::kBadSampleRate;
+  return status::kOk;
+}
+
 }  // namespace checks

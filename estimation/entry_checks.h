@@ -55,4 +55,8 @@ StatusCode CovSpectrum(int32_t n, int32_t p, int32_t m, double rate, Bound bound
 StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate,
                         Bound bound = Bound::kHost, Failure* why = nullptr);
 
+// ---- error bars of given modes ----
+// The standard errors of `modes` modes on n samples at sampling rate `rate`.
+StatusCode ModeErrors(int32_t n, int32_t modes, double rate);
+
 }  // namespace checks

@@ -14,7 +14,8 @@
  *   `std::complex<double>`, which may be passed by casting the pointer.
  * - Arrays need only the natural alignment of `double`.
  * - Every fit returns a status from qdm_status.h: ::QDM_OK, the warning
- *   ::QDM_WARN_RANK_DEFICIENT (results complete and valid), or a negative error.
+ *   ::QDM_WARN_RANK_DEFICIENT (results complete and valid), or a negative error
+ *   (the error bars of modes have a warning of their own).
  *   qdm_status_text() gives its meaning. After an argument error (a -424xx
  *   code) nothing has been written. After any other error every output array
  *   is zero-filled, every mode count is 0 and every out double is 0.0.
@@ -479,6 +480,83 @@ QDM_PLAIN_API int32_t qdm_ar_psd_complex(const qdm_complex* a, int32_t order, do
                                          int32_t points, double fs, int32_t onesided,
                                          double* frequency, double* spectrum, double* psd,
                                          int32_t* count);
+/** @} */
+
+/* ---------------------------------------------------------------------------- */
+/** @name Error bars of modes
+ * The standard error of every parameter of a set of modes (a fit's, or the
+ * caller's own): the square root of the diagonal of the Cramer-Rao bound of
+ * the mode model, evaluated at the modes, with the noise variance estimated
+ * from their residual against the record.
+ *
+ * Complex data: x[t] = sum_i A_i z_i^t, A_i = a_i e^{j phi_i},
+ * z_i = exp(alpha_i + j 2 pi f_i / fs), in complex white noise, four real
+ * parameters per mode. The noise variance (per complex sample, E|e|^2) is
+ * s2 = ||x - model||^2 / (n - 2M): 2n real observations, 4M parameters. The
+ * covariance is (s2 / 2) [Re(D^H D)]^-1, D the n-by-4M Jacobian.
+ *
+ * Real data: with `real_signal` non-zero each mode (the member with
+ * arg(z) in [0, pi) of a conjugate pair, amplitude not doubled, as the fits
+ * report them) is the real term 2 a e^{alpha t} cos(2 pi f t / fs + phi) with
+ * four parameters; a mode at 0 Hz (or fs/2) is the single real term
+ * a cos(phi) e^{alpha t} with two, amplitude and damping, and its phase and
+ * frequency errors are 0 (the model fixes them). With `real_signal` zero the
+ * modes are every pole of a real record: each mode off 0 and fs/2 must have
+ * a conjugate partner (frequency opposite and damping equal to within 1e-7
+ * of fs and of 1 + |damping|), the pair is the cosine of its member with
+ * the positive frequency, and both members get its errors. The noise is
+ * real: s2 = ||x - model||^2 / (n - P), P the real parameters, and the
+ * covariance is s2 (D^T D)^-1.
+ *
+ * The bound comes from the singular values of D with its columns scaled to
+ * unit norm. Directions whose singular value is below 1e-7 of the largest
+ * (the scaled Fisher matrix's reciprocal condition below 1e-14) count as
+ * undetermined; a mode any of whose parameters weighs more than 1e-10 in
+ * them (as with a zero amplitude or two equal poles) gets NaN for all four
+ * errors, and the call returns the
+ * warning ::QDM_WARN_BOUND_SINGULAR: the one success of this face that
+ * carries NaN, and only there. The other modes' errors are complete.
+ *
+ * The bound describes the error of an efficient estimate at high SNR; below
+ * the threshold SNR of a fit, or for a biased fit (Prony's method with as many
+ * poles as modes in noise), the actual error can be far larger.
+ *
+ * @param x             n samples
+ * @param n             number of samples: above the real parameters (real
+ *                      data) or above 2 M (complex data)
+ * @param fs            sampling rate of the frequencies, > 0
+ * @param real_signal   (real data only) non-zero: the modes are one per
+ *                      conjugate pair, as the fits report them with it
+ * @param modes         M, the number of modes, >= 1
+ * @param amplitude,phase,damping,frequency  M values each, as the fits report
+ *                      them: |A|, arg A in radians, ln|z| per sample, Hz
+ * @param amplitude_se,phase_se,damping_se,frequency_se  out: M values each,
+ *                      in the units of the modes (x, radians, per sample, Hz)
+ * @param noise_variance out: s2 above
+ * @return ::QDM_OK, ::QDM_WARN_BOUND_SINGULAR; ::QDM_ERR_EMPTY_INPUT (n < 1),
+ *   ::QDM_ERR_NO_MODES (M < 1), ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_NULL_POINTER,
+ *   ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE (a sample or fs),
+ *   ::QDM_ERR_MODE_VALUES (a NaN or infinite mode value, or with
+ *   real_signal zero a mode without its partner), ::QDM_ERR_TOO_FEW_SAMPLES,
+ *   ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE (the model or its Jacobian
+ *   overflows, as a growing mode over a long record can),
+ *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_ILLEGAL_ARGUMENT,
+ *   ::QDM_ERR_NON_FINITE_RESULT (an error or the noise variance beyond the
+ *   double range).
+ * @{ */
+QDM_PLAIN_API int32_t qdm_mode_errors_real(const double* x, int32_t n, double fs,
+                                           int32_t real_signal, int32_t modes,
+                                           const double* amplitude, const double* phase,
+                                           const double* damping, const double* frequency,
+                                           double* amplitude_se, double* phase_se,
+                                           double* damping_se, double* frequency_se,
+                                           double* noise_variance);
+QDM_PLAIN_API int32_t qdm_mode_errors_complex(const qdm_complex* x, int32_t n, double fs,
+                                              int32_t modes, const double* amplitude,
+                                              const double* phase, const double* damping,
+                                              const double* frequency, double* amplitude_se,
+                                              double* phase_se, double* damping_se,
+                                              double* frequency_se, double* noise_variance);
 /** @} */
 
 #ifdef __cplusplus

@@ -3,9 +3,10 @@
  * documentation are both made from it.
  *
  * 0 is success. 20001 is a warning (the plain face only: the results are
- * complete and valid). Codes from -42401 down to -42423 are argument errors,
- * -424xx in the host's numbering; the plain face writes nothing when it returns
- * one. -30001 is the plain face's screen of its own results: a fit ran, but a
+ * complete and valid); 20002 the error bars' warning (NaN errors for the
+ * modes whose bound is singular, every other value complete). Codes from
+ * -42401 down to -42425 are argument errors, -424xx in the host's numbering;
+ * the plain face writes nothing when it returns one. -30001 is the plain face's screen of its own results: a fit ran, but a
  * number it was about to hand back is NaN or infinite. The other negative
  * codes are numeric and FFT failures. The host face also returns -42400 - e
  * when the host's NumericArrayResize fails with its own error e. */
@@ -18,6 +19,9 @@
   X(QDM_WARN_RANK_DEFICIENT, 20001,                                                            \
     "success, but a least-squares system inside the fit was rank deficient (minimum-norm "     \
     "solution used)")                                                                          \
+  X(QDM_WARN_BOUND_SINGULAR, 20002,                                                            \
+    "success, but the error bound is singular or badly conditioned for some modes (their "     \
+    "errors are NaN)")                                                                         \
   X(QDM_ERR_EMPTY_INPUT, -42401, "input array has no elements (n < 1)")                        \
   X(QDM_ERR_ORDER, -42411, "order or pencil parameter negative or above floor(2n/3)")          \
   X(QDM_ERR_COUNT, -42412,                                                                     \
@@ -37,6 +41,12 @@
     "spectrum length (the power of two at or above the points asked for) below order + 1")     \
   X(QDM_ERR_SOLVER, -42423,                                                                    \
     "solver not one of QDM_SOLVER_AUTO, QDM_SOLVER_DENSE, QDM_SOLVER_KRYLOV")                  \
+  X(QDM_ERR_TOO_FEW_SAMPLES, -42424,                                                           \
+    "too few samples for the modes' error bars: n must exceed the real parameters (real "      \
+    "data) or twice the modes (complex data)")                                                 \
+  X(QDM_ERR_MODE_VALUES, -42425,                                                               \
+    "a mode value is NaN or infinite, or a mode of real data (real_signal zero) has no "      \
+    "conjugate partner")                                                                       \
   X(QDM_ERR_NON_FINITE_RESULT, -30001,                                                         \
     "a result of the fit is NaN or infinite (a degenerate record: zero, constant, a spike, a " \
     "ramp, or values beyond the range of double)")                                             \

@@ -24,8 +24,9 @@ def main():
     if not rows:
         sys.exit("no status entries found")
     print("# Status codes\n")
-    print("Every status a qdm function returns. 0 is success, 20001 a warning with")
-    print("complete results (plain C API only), negative codes errors. The host face")
+    print("Every status a qdm function returns. 0 is success, 20001 and 20002 warnings")
+    print("(plain C API only: complete results, NaN errors for the modes 20002 names),")
+    print("negative codes errors. The host face")
     print("also returns -42400 - e when the host's `NumericArrayResize` fails with e.\n")
     print("| name | code | meaning |")
     print("|---|---:|---|")

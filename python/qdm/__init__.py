@@ -21,7 +21,10 @@ Modes follow the model x[t] = sum_i A_i z_i**t: amplitude |A_i|, phase
 arg(A_i) in radians, damping ln|z_i| per sample (negative when decaying) and
 ``damping_per_s`` = damping * fs, frequency arg(z_i) fs / (2 pi), in Hz when
 ``fs`` is given and in cycles per sample with the default fs = 1. Modes come
-sorted by frequency (``sort=False``: in the library's order).
+sorted by frequency (``sort=False``: in the library's order). `prony` and
+`matrix_pencil` also give each mode's standard errors (``amplitude_stderr``,
+...), the Cramer-Rao bound at the fitted modes; `mode_errors` gives them
+for any modes.
 
 Spectra come as scipy.signal.welch gives them: ``frequencies`` and, for the
 covariance model, ``psd`` in units of x**2/Hz, beside ``spectrum`` in dB with
@@ -31,12 +34,13 @@ of two not below ``nfft``; ``return_onesided=False`` asks real data for the
 two-sided form.
 
 Errors are `Error` subclasses carrying the library's status code; a
-rank-deficient least-squares solve inside a fit is a `RankDeficientWarning`.
+rank-deficient least-squares solve inside a fit is a `RankDeficientWarning`,
+and modes whose error bound is singular a `SingularBoundWarning`.
 """
 import ctypes as _ct
 import operator as _op
 import warnings as _warnings
-from typing import Literal, NamedTuple, Optional, Union
+from typing import Literal, NamedTuple, Optional, Sequence, Union
 
 import numpy as _np
 # x's hint is quoted below: help() then shows this alias, not numpy's expansion of it.
@@ -45,10 +49,11 @@ from numpy.typing import ArrayLike, NDArray
 from qdm._lib import functions as _fn, lib as _clib
 
 __all__ = ["covariance", "pcar", "prony", "matrix_pencil", "mdl_order", "covariance_psd",
-           "pcar_psd", "Error", "ArgumentError", "DTypeError", "OutOfMemoryError",
-           "NumericError", "NonFiniteResultError", "RankDeficientWarning", "status_text", "__version__",
+           "pcar_psd", "mode_errors", "Error", "ArgumentError", "DTypeError", "OutOfMemoryError",
+           "NumericError", "NonFiniteResultError", "RankDeficientWarning", "SingularBoundWarning",
+           "status_text", "__version__",
            "CovarianceFit", "PcarFit", "PronyFit", "PencilFit", "CovarianceSpectrum",
-           "PcarSpectrum"]
+           "PcarSpectrum", "ModeErrors"]
 
 __version__: str = _clib.qdm_version().decode()
 
@@ -132,7 +137,7 @@ class Error(Exception):
 class ArgumentError(Error, ValueError):
     """A bad argument, refused before the fit ran; also a `ValueError`.
 
-    The library's argument codes -42401 to -42423 (empty input, an order,
+    The library's argument codes -42401 to -42425 (empty input, an order,
     count, size or sampling rate out of range, a NaN or infinite sample, a
     fit that would exceed the library's work-memory bound, ...), or, with
     `code` None, what the binding refuses itself: an input that is not 1-D,
@@ -203,8 +208,46 @@ class RankDeficientWarning(UserWarning):
         super().__init__(f"{function}: {code}: {text}")
 
 
+class SingularBoundWarning(UserWarning):
+    """Standard errors that could not be given: their modes' values are NaN.
+
+    Code 20002: the error bound (the inverse of the Fisher information) is
+    singular or badly conditioned for some modes, as for a zero amplitude or
+    two equal poles; their four standard errors are NaN, every other value
+    is complete. Inside `prony` and `matrix_pencil` it also stands for
+    errors that could not be computed at all (then every standard error is
+    NaN and `code` says why, e.g. -42424 for too few samples). Raised
+    through `warnings.warn`.
+
+    Attributes
+    ----------
+    code : int
+        20002, or the status of the error computation that failed in a fit.
+    text : str
+        `status_text(code)`.
+    function : str
+        The function that warned.
+
+    Examples
+    --------
+    >>> import warnings, numpy as np, qdm
+    >>> x = np.exp(0.5j * np.arange(32))
+    >>> with warnings.catch_warnings(record=True) as w:
+    ...     warnings.simplefilter("always")
+    ...     e = qdm.mode_errors(x, ([1.0, 0.0], [0.0, 0.0], [0.0, 0.0], [0.0796, 0.2]))
+    >>> print(w[0].category.__name__, w[0].message.code, e.frequency_stderr[1])
+    SingularBoundWarning 20002 nan
+    """
+
+    def __init__(self, code: int, text: str, function: str) -> None:
+        self.code, self.text, self.function = code, text, function
+        super().__init__(f"{function}: {code}: {text}")
+
+
 _NO_MEMORY = -20001
 _RANK_DEFICIENT = 20001
+_BOUND_SINGULAR = 20002
+_NO_BOUND = (-30001, -20068)  # a fit's error bars beyond the double range
 _NON_FINITE_RESULT = -30001
 _NULL_POINTER = -42421
 
@@ -219,6 +262,9 @@ def _check(status, function, names=(), *given):
     text = status_text(status)
     if status == _RANK_DEFICIENT:
         _warnings.warn(RankDeficientWarning(status, text, function), stacklevel=3)
+        return
+    if status == _BOUND_SINGULAR:
+        _warnings.warn(SingularBoundWarning(status, text, function), stacklevel=3)
         return
     if -42499 <= status <= -42400:
         raise ArgumentError(status, text, function, _detail(names, given))
@@ -404,12 +450,33 @@ class PronyFit(NamedTuple):
         damping * fs: the decay rate in 1/s when fs is given (-10.0 is a
         mode whose envelope falls by e every 0.1 s); per sample with the
         default fs = 1.
+    amplitude_stderr : ndarray
+        Standard error of amplitude, in the units of x: the square root of
+        its diagonal entry of the Cramer-Rao bound at the fitted modes, the
+        noise variance taken from their residual (see `mode_errors`). Every
+        ``*_stderr`` field is NaN for a mode whose bound is singular, and
+        for all modes when n is too small to estimate the noise (both with
+        a `SingularBoundWarning`).
+    phase_stderr : ndarray
+        Standard error of phase, in radians.
+    damping_stderr : ndarray
+        Standard error of damping, per sample.
+    frequency_stderr : ndarray
+        Standard error of frequency, in Hz when fs is given, else in cycles
+        per sample.
+    damping_per_s_stderr : ndarray
+        damping_stderr * fs, the standard error of `damping_per_s`.
     """
     amplitude: NDArray[_np.float64]
     phase: NDArray[_np.float64]
     damping: NDArray[_np.float64]
     frequency: NDArray[_np.float64]
     damping_per_s: NDArray[_np.float64]
+    amplitude_stderr: NDArray[_np.float64]
+    phase_stderr: NDArray[_np.float64]
+    damping_stderr: NDArray[_np.float64]
+    frequency_stderr: NDArray[_np.float64]
+    damping_per_s_stderr: NDArray[_np.float64]
 
 
 class PencilFit(NamedTuple):
@@ -437,6 +504,22 @@ class PencilFit(NamedTuple):
     damping_per_s : ndarray
         damping * fs: the decay rate in 1/s when fs is given; per sample
         with the default fs = 1.
+    amplitude_stderr : ndarray
+        Standard error of amplitude, in the units of x: the square root of
+        its diagonal entry of the Cramer-Rao bound at the fitted modes, the
+        noise variance taken from their residual (see `mode_errors`). Every
+        ``*_stderr`` field is NaN for a mode whose bound is singular, and
+        for all modes when n is too small to estimate the noise (both with
+        a `SingularBoundWarning`).
+    phase_stderr : ndarray
+        Standard error of phase, in radians.
+    damping_stderr : ndarray
+        Standard error of damping, per sample.
+    frequency_stderr : ndarray
+        Standard error of frequency, in Hz when fs is given, else in cycles
+        per sample.
+    damping_per_s_stderr : ndarray
+        damping_stderr * fs, the standard error of `damping_per_s`.
     """
     amplitude: NDArray[_np.float64]
     phase: NDArray[_np.float64]
@@ -444,6 +527,11 @@ class PencilFit(NamedTuple):
     frequency: NDArray[_np.float64]
     mse: float
     damping_per_s: NDArray[_np.float64]
+    amplitude_stderr: NDArray[_np.float64]
+    phase_stderr: NDArray[_np.float64]
+    damping_stderr: NDArray[_np.float64]
+    frequency_stderr: NDArray[_np.float64]
+    damping_per_s_stderr: NDArray[_np.float64]
 
 
 class CovarianceSpectrum(NamedTuple):
@@ -510,6 +598,38 @@ class PcarSpectrum(NamedTuple):
     fit_error: float
 
 
+class ModeErrors(NamedTuple):
+    """Standard errors of modes, as `mode_errors` returns them.
+
+    One float64 value per mode, in the order the modes were given; NaN for a
+    mode whose bound is singular (with a `SingularBoundWarning`).
+
+    Attributes
+    ----------
+    amplitude_stderr : ndarray
+        Standard error of the amplitude, in the units of x.
+    phase_stderr : ndarray
+        Standard error of the phase, in radians.
+    damping_stderr : ndarray
+        Standard error of the damping, per sample.
+    frequency_stderr : ndarray
+        Standard error of the frequency, in Hz when fs is given (cycles per
+        sample with the default).
+    damping_per_s_stderr : ndarray
+        damping_stderr * fs, in 1/s when fs is given.
+    noise_variance : float
+        The noise variance the errors rest on, in the units of x squared:
+        ||x - model||**2 / (n - 2M) per complex sample for complex data,
+        ||x - model||**2 / (n - P) for real data (P real parameters).
+    """
+    amplitude_stderr: NDArray[_np.float64]
+    phase_stderr: NDArray[_np.float64]
+    damping_stderr: NDArray[_np.float64]
+    frequency_stderr: NDArray[_np.float64]
+    damping_per_s_stderr: NDArray[_np.float64]
+    noise_variance: float
+
+
 def _modes(rows, k):
     """Room for k values of each of `rows` mode arrays, in one allocation, and
     the addresses of its rows."""
@@ -521,6 +641,32 @@ def _modes(rows, k):
 def _order(frequency, sort):
     """The permutation that sorts modes by frequency (stable), or all as they are."""
     return _np.argsort(frequency, kind="stable") if sort else slice(None)
+
+
+def _stderr(a, c, fs, flag, block, count, function):
+    """The standard errors of the modes a fit left in block[:, :count], in the
+    same order, for the fit's result: an error computation that cannot be
+    made (too few samples, unpaired poles, an overflowing model) gives NaN
+    with a SingularBoundWarning rather than failing the fit."""
+    if count == 0:
+        return _np.empty((4, 0))
+    out = _np.empty((4, count))
+    rows = [_addr(block[q]) for q in range(4)]
+    se = [_addr(out[q]) for q in range(4)]
+    variance = _ct.c_double()
+    args: tuple = (_addr(a), a.shape[0], fs)
+    if not c:
+        args += (flag,)
+    status = _fn["mode_errors", _kind(c)](*args, count, *rows, *se, _ct.byref(variance))
+    if status == 0:
+        return out
+    if status == _BOUND_SINGULAR or -42499 <= status <= -42400 or status in _NO_BOUND:
+        _warnings.warn(SingularBoundWarning(status, status_text(status), function),
+                       stacklevel=4)
+        if status != _BOUND_SINGULAR:
+            out.fill(_np.nan)
+        return out
+    _check(status, function)
 
 
 def _nfft(nfft, points, function):
@@ -824,8 +970,10 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
         args += (flag,)
     _check(_fn["prony", _kind(c)](*args, *rows, _ct.byref(count)), "prony", _PRONY, None, order)
     amplitude, phase, damping, frequency = block[:, :count.value]
+    sa, sp, sd, sf = _stderr(a, c, args[3], flag, block, count.value, "prony")
     i = _order(frequency, sort)
-    return PronyFit(amplitude[i], phase[i], damping[i], frequency[i], damping[i] * args[3])
+    return PronyFit(amplitude[i], phase[i], damping[i], frequency[i], damping[i] * args[3],
+                    sa[i], sp[i], sd[i], sf[i], sd[i] * args[3])
 
 
 def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
@@ -964,9 +1112,10 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
                                                   _ct.byref(mse)), "matrix_pencil", _PENCIL,
            None, pencil, modes)
     amplitude, phase, damping, frequency = block[:, :count.value]
+    sa, sp, sd, sf = _stderr(a, c, args[4], flag, block, count.value, "matrix_pencil")
     i = _order(frequency, sort)
     return PencilFit(amplitude[i], phase[i], damping[i], frequency[i], mse.value,
-                     damping[i] * args[4])
+                     damping[i] * args[4], sa[i], sp[i], sd[i], sf[i], sd[i] * args[4])
 
 
 def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int = 1) -> int:
@@ -1283,3 +1432,119 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
     i = _order(frequency, sort)
     return PcarSpectrum(axis[:length.value], db[:length.value], amplitude[i], phase[i],
                         frequency[i], err.value)
+
+
+def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[ArrayLike]]", *,
+                fs: float = 1.0,
+                real_signal: bool = False) -> ModeErrors:
+    """Standard errors of exponential modes: the Cramer-Rao bound at the modes.
+
+    For the model of `prony` and `matrix_pencil`, evaluates the Jacobian D
+    of the modelled record with respect to every mode's amplitude, phase,
+    damping and frequency at the modes given, estimates the noise variance
+    s2 from their residual against x, and returns the square roots of the
+    diagonal of the bound. Complex data (complex white noise): the bound
+    (s2/2) [Re(D^H D)]**-1, s2 = ||x - model||**2 / (n - 2M) per complex
+    sample. Real data (real white noise): s2 (D^T D)**-1, s2 =
+    ||x - model||**2 / (n - P), each mode a real cosine
+    2 a e**(damping t) cos(2 pi f t / fs + phase) with four parameters, a
+    mode at 0 Hz (or fs/2) the real term a cos(phase) e**(damping t) with
+    two (its phase and frequency errors are 0).
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n samples
+        The record the modes describe: float64 for real data, complex128
+        for complex data (other dtypes as for the fits).
+    modes : PronyFit, PencilFit or a sequence of four arrays
+        The modes: any object with ``amplitude``, ``phase``, ``damping`` and
+        ``frequency`` fields (a fit's result, sorted or not), or the four
+        arrays ``(amplitude, phase, damping, frequency)`` of equal length M,
+        in the units the fits report (frequency in the units of fs).
+    fs : float, fs > 0, default 1.0
+        Sampling rate of the frequencies: that of the fit.
+    real_signal : bool, default False
+        Real data only: the modes are one per conjugate pair, as a fit with
+        real_signal=True reports them. False (real data): every pole of the
+        real record, each off 0 and fs/2 with its conjugate partner.
+
+    Returns
+    -------
+    ModeErrors
+        Named tuple ``(amplitude_stderr, phase_stderr, damping_stderr,
+        frequency_stderr, damping_per_s_stderr, noise_variance)``, the
+        arrays in the order of the modes given.
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D, the mode arrays differ in length or are not 1-D, or
+        real_signal with complex data (code None); x is empty (-42401); no
+        modes (-42416); fs not positive (-42418); a NaN or infinite sample
+        or fs (-42419); a NaN or infinite mode value, or (real data,
+        real_signal False) a mode without its conjugate partner (-42425);
+        n not above the real parameters (real data) or 2M (complex data)
+        (-42424).
+    NumericError
+        The model overflows, as a growing mode over a long record can
+        (-20068); a LAPACK failure; `NonFiniteResultError` (-30001) for an
+        error beyond the float64 range.
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    Warns
+    -----
+    SingularBoundWarning
+        The bound is singular or badly conditioned for some modes (the
+        column-scaled Jacobian's singular values below 1e-7 of the largest
+        carry them): their errors are NaN.
+
+    Notes
+    -----
+    The bound is what an efficient, unbiased estimate achieves at high SNR.
+    Below a method's threshold SNR, or for a biased fit (Prony's method with
+    as many poles as modes in noise), the actual error is larger.
+
+    Examples
+    --------
+    >>> import numpy as np, qdm
+    >>> rng = np.random.default_rng(0)
+    >>> t = np.arange(256)
+    >>> x = np.exp((-0.01 + 0.4j) * t) + 0.01 * (rng.standard_normal(256)
+    ...                                           + 1j * rng.standard_normal(256))
+    >>> fit = qdm.matrix_pencil(x, modes=1)
+    >>> e = qdm.mode_errors(x, fit)
+    >>> bool(np.allclose(e.frequency_stderr, fit.frequency_stderr))
+    True
+    >>> print(f"{e.noise_variance:.1e}")
+    2.0e-04
+    """
+    a, c = _signal(x, "mode_errors")
+    if all(hasattr(modes, f) for f in ("amplitude", "phase", "damping", "frequency")):
+        fields = (modes.amplitude, modes.phase, modes.damping, modes.frequency)
+    else:
+        fields = tuple(modes)
+        if len(fields) != 4:
+            raise ArgumentError(None, "modes must be a fit result or four arrays (amplitude, "
+                                      "phase, damping, frequency)", "mode_errors")
+    block = _np.array([_np.asarray(v, dtype=_np.float64) for v in fields]) \
+        if len({_np.shape(v) for v in fields}) == 1 else None
+    if block is None or block.ndim != 2:
+        raise ArgumentError(None, "the four mode arrays must be 1-D and of one length",
+                            "mode_errors")
+    block = _np.ascontiguousarray(block)
+    M = block.shape[1]
+    out = _np.empty((4, max(M, 1)))
+    variance = _ct.c_double()
+    args: tuple = (_addr(a), a.shape[0], _fs(fs, "mode_errors"))
+    flag = _real_flag(real_signal, c, "mode_errors")
+    if not c:
+        args += (flag,)
+    rows = [block[q].ctypes.data for q in range(4)]
+    se = [_addr(out[q]) for q in range(4)]
+    _check(_fn["mode_errors", _kind(c)](*args, _int(M, "modes", "mode_errors"), *rows, *se, _ct.byref(variance)),
+           "mode_errors")
+    sa, sp, sd, sf = out[:, :M]
+    return ModeErrors(sa, sp, sd, sf, sd * args[2], variance.value)

@@ -59,6 +59,7 @@ _SIGNATURES: dict = {
     "mdl_order": [_I, _I, _P],
     "covariance_psd": [_I, _I, _D, _P, _P, _P, _P],
     "pcar_psd": [_I, _I, _I, _D, "R", _P, _P, _P, _P, _P, _P, _P, _P],
+    "mode_errors": [_D, "R", _I, _P, _P, _P, _P, _P, _P, _P, _P, _P],
     # (coefficients, order) in place of (x, n); both twins take the one-sided flag
     "ar_psd": [_D, _I, _D, _I, _P, _P, _P, _P],
 }

@@ -416,8 +416,11 @@ s, r = (json.load(open(f))["results"]["modes"] for f in ("sorted.json", "raw.jso
 names = ["frequency_hz", "amplitude", "phase_rad"]
 if sys.argv[1] != "pcarspectrum":
     names += ["damping_per_sample", "damping_per_s"]
+    names += [k + "_stderr" for k in names]  # each error beside its mode, sorted with it
     assert all(abs(b - a * 1000) <= 1e-9 * abs(b)
                for a, b in zip(s["damping_per_sample"], s["damping_per_s"]))
+    assert all(0 < e < abs(d) for e, d in zip(s["damping_per_sample_stderr"],
+                                             s["damping_per_sample"]))
 assert list(s) == names and all(isinstance(v, float) for v in s["frequency_hz"]), s
 assert s["frequency_hz"] == sorted(s["frequency_hz"]) != r["frequency_hz"], s
 rows = lambda m: sorted(zip(*(m[k] for k in names)))
@@ -426,6 +429,13 @@ PY
   done
   expect 0 pencil --example --real-signal
   grep -q 'damping_per_s' out && grep -q 'frequency_hz' out || fail "table columns: $(cat out)"
+  grep -Eq ' 119\.9[0-9]* \+- 0\.0[0-9]+ ' out || fail "no error beside the 120 Hz mode: $(cat out)"
+  # Too few samples for the errors: the fit stands, its errors are null, a warning says why.
+  printf '1\n0.5\n-0.2\n-0.9\n-0.4\n0.3\n' >six.csv
+  expect 0 prony six.csv --order 4 --json
+  grep -q "warning: standard errors: too few samples" err || fail "no error-bar warning: $(cat err)"
+  $py -c 'import json; m = json.load(open("out"))["results"]["modes"]; assert len(m["amplitude"]) == 4 and m["frequency_hz_stderr"] == [None] * 4, m' \
+    || fail "errors of a short record: $(head -c 300 out)"
   expect 0 covariance --example --order 4 --json
   $py -c 'import json; c = json.load(open("out"))["results"]["coefficients"]; assert c[0] == 1.0 and len(c) == 5, c' \
     || fail "real coefficients: $(head -c 300 out)"

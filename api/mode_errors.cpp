@@ -1,0 +1,161 @@
+// Error bars of modes on the plain face: the standard errors of any set of
+// modes against a record (estimation/mode_errors.h), with this face's order
+// of refusals: the argument checks, null pointers, the work bound, non-finite
+// samples or rate, the mode values and the degrees of freedom, then the bound.
+// A record or amplitude outside [2^-128, 2^128] is worked on scaled by a power
+// of two, as the fits do, and the results scaled back.
+#include <cfloat>
+#include <cmath>
+#include <cstring>
+
+#include "core/scalar.h"
+#include "core/types.h"
+#include "estimation/entry_checks.h"
+#include "estimation/mode_errors.h"
+#include "numeric/work.h"
+#include "qdm_api.h"
+
+namespace {
+
+static_assert(int32_t(status::kBoundSingular) == QDM_WARN_BOUND_SINGULAR);
+static_assert(-42400 - int32_t(status::kTooFewSamples) == QDM_ERR_TOO_FEW_SAMPLES);
+static_assert(-42400 - int32_t(status::kBadModes) == QDM_ERR_MODE_VALUES);
+
+int32_t Public(StatusCode s) {
+  if (s == status::kRankDeficient || s == status::kBoundSingular) return s;
+  return s > 0 ? -42400 - s : s;
+}
+
+bool Finite(double v) { return std::fabs(v) <= DBL_MAX; }
+
+// Largest magnitude of `count` values, or -1 if one is NaN or infinite.
+double Largest(const double* v, size_t count) {
+  double m = 0.0;
+  for (size_t i = 0; i < count; ++i) {
+    if (!Finite(v[i])) return -1.0;
+    m = std::fmax(m, std::fabs(v[i]));
+  }
+  return m;
+}
+
+// The power of two that brings the largest magnitude into [1, 2), or 0 when it
+// lies inside [2^-128, 2^128] (or is 0).
+int Scale(double largest) {
+  if (largest == 0.0 || (largest >= 0x1p-128 && largest <= 0x1p128)) return 0;
+  return -std::ilogb(largest);
+}
+
+struct Outputs {
+  double* amplitude_se;
+  double* phase_se;
+  double* damping_se;
+  double* frequency_se;
+  double* noise_variance;
+};
+
+void Clear(const Outputs& o, int32_t modes) {
+  const size_t bytes = static_cast<size_t>(modes) * sizeof(double);
+  std::memset(o.amplitude_se, 0, bytes);
+  std::memset(o.phase_se, 0, bytes);
+  std::memset(o.damping_se, 0, bytes);
+  std::memset(o.frequency_se, 0, bytes);
+  *o.noise_variance = 0.0;
+}
+
+// Results scaled back, and screened: an infinity anywhere, or a NaN outside
+// the modes the warning names (all four errors of a mode NaN together), is a
+// non-finite result.
+bool Screen(const Outputs& o, int32_t modes, int scale, bool warned) {
+  *o.noise_variance = std::ldexp(*o.noise_variance, -2 * scale);
+  bool good = Finite(*o.noise_variance);
+  for (int32_t i = 0; i < modes; ++i) {
+    o.amplitude_se[i] = std::ldexp(o.amplitude_se[i], -scale);
+    const double v[4] = {o.amplitude_se[i], o.phase_se[i], o.damping_se[i], o.frequency_se[i]};
+    const bool allNan =
+        std::isnan(v[0]) && std::isnan(v[1]) && std::isnan(v[2]) && std::isnan(v[3]);
+    if (allNan && warned) continue;
+    for (double e : v) good = good && Finite(e);
+  }
+  return good;
+}
+
+template <typename T>
+int32_t Run(const T* x, int32_t n, double fs, bool pairs, const double* amplitude,
+            const double* phase, const double* damping, const double* frequency, int32_t modes,
+            const Outputs& o) {
+  constexpr bool cx = kIsComplex<T>;
+  const StatusCode check = checks::ModeErrors(n, modes, fs);
+  if (check != status::kOk) return Public(check);
+  if (x == nullptr || amplitude == nullptr || phase == nullptr || damping == nullptr ||
+      frequency == nullptr || o.amplitude_se == nullptr || o.phase_se == nullptr ||
+      o.damping_se == nullptr || o.frequency_se == nullptr || o.noise_variance == nullptr) {
+    return QDM_ERR_NULL_POINTER;
+  }
+  if (ModeErrorsWork(modes) > static_cast<double>(QDM_MAX_WORK_BYTES)) return QDM_ERR_WORK_LIMIT;
+  const size_t values = static_cast<size_t>(n) * (cx ? 2 : 1);
+  const double extent = Largest(reinterpret_cast<const double*>(x), values);
+  if (extent < 0.0 || !Finite(fs)) return QDM_ERR_NON_FINITE;
+
+  ModeSet set{amplitude, phase, damping, frequency, modes, fs};
+  int64_t parameters = 0;
+  const StatusCode plan = ModeErrorsPlan(n, cx, pairs, set, &parameters);
+  if (plan != status::kOk) return Public(plan);
+
+  // One scale for the record and the amplitudes: the model is linear in both.
+  const double largest = std::fmax(extent, Largest(amplitude, static_cast<size_t>(modes)));
+  const int scale = Scale(largest);
+  WorkArray<double> copy;
+  WorkArray<double> amps;
+  const T* xs = x;
+  StatusCode s = status::kOk;
+  if (scale != 0) {
+    copy = AllocWorkUninit<double>(values);
+    amps = AllocWorkUninit<double>(static_cast<size_t>(modes));
+    if (!copy || !amps) {
+      s = status::kNoMemory;
+    } else {
+      const double* v = reinterpret_cast<const double*>(x);
+      for (size_t i = 0; i < values; ++i) copy[i] = std::ldexp(v[i], scale);
+      for (int32_t i = 0; i < modes; ++i) amps[i] = std::ldexp(amplitude[i], scale);
+      xs = reinterpret_cast<const T*>(copy.get());
+      set.amplitude = amps.get();
+    }
+  }
+  if (s == status::kOk) {
+    const ModeStdErrors out{o.amplitude_se, o.phase_se, o.damping_se, o.frequency_se,
+                            o.noise_variance};
+    if constexpr (cx) {
+      s = ModeErrorsComplex(xs, n, set, out);
+    } else {
+      s = ModeErrorsReal(xs, n, pairs, set, out);
+    }
+  }
+  if (s >= 0 && !Screen(o, modes, scale, s == status::kBoundSingular)) {
+    s = static_cast<StatusCode>(QDM_ERR_NON_FINITE_RESULT);
+  }
+  if (s < 0) Clear(o, modes);
+  return Public(s);
+}
+
+}  // namespace
+
+QDM_PLAIN_API int32_t qdm_mode_errors_real(const double* x, int32_t n, double fs,
+                                           int32_t real_signal, int32_t modes,
+                                           const double* amplitude, const double* phase,
+                                           const double* damping, const double* frequency,
+                                           double* amplitude_se, double* phase_se,
+                                           double* damping_se, double* frequency_se,
+                                           double* noise_variance) {
+  return Run(x, n, fs, real_signal == 0, amplitude, phase, damping, frequency, modes,
+             {amplitude_se, phase_se, damping_se, frequency_se, noise_variance});
+}
+
+QDM_PLAIN_API int32_t qdm_mode_errors_complex(const qdm_complex* x, int32_t n, double fs,
+                                              int32_t modes, const double* amplitude,
+                                              const double* phase, const double* damping,
+                                              const double* frequency, double* amplitude_se,
+                                              double* phase_se, double* damping_se,
+                                              double* frequency_se, double* noise_variance) {
+  return Run(reinterpret_cast<const Complex*>(x), n, fs, false, amplitude, phase, damping,
+             frequency, modes, {amplitude_se, phase_se, damping_se, frequency_se, noise_variance});
+}
