@@ -8,6 +8,10 @@
 #include <cmath>
 #include <cstring>
 
+#include <utility>
+
+#include "api/last_error.h"
+#include "api/plain_face.h"
 #include "core/scalar.h"
 #include "core/types.h"
 #include "estimation/entry_checks.h"
@@ -21,29 +25,8 @@ static_assert(int32_t(status::kBoundSingular) == QDM_WARN_BOUND_SINGULAR);
 static_assert(-42400 - int32_t(status::kTooFewSamples) == QDM_ERR_TOO_FEW_SAMPLES);
 static_assert(-42400 - int32_t(status::kBadModes) == QDM_ERR_MODE_VALUES);
 
-int32_t Public(StatusCode s) {
-  if (s == status::kRankDeficient || s == status::kBoundSingular) return s;
-  return s > 0 ? -42400 - s : s;
-}
-
-bool Finite(double v) { return std::fabs(v) <= DBL_MAX; }
-
-// Largest magnitude of `count` values, or -1 if one is NaN or infinite.
-double Largest(const double* v, size_t count) {
-  double m = 0.0;
-  for (size_t i = 0; i < count; ++i) {
-    if (!Finite(v[i])) return -1.0;
-    m = std::fmax(m, std::fabs(v[i]));
-  }
-  return m;
-}
-
-// The power of two that brings the largest magnitude into [1, 2), or 0 when it
-// lies inside [2^-128, 2^128] (or is 0).
-int Scale(double largest) {
-  if (largest == 0.0 || (largest >= 0x1p-128 && largest <= 0x1p128)) return 0;
-  return -std::ilogb(largest);
-}
+using plain::Finite;
+using plain::PublicCode;
 
 struct Outputs {
   double* amplitude_se;
@@ -84,26 +67,38 @@ int32_t Run(const T* x, int32_t n, double fs, bool pairs, const double* amplitud
             const double* phase, const double* damping, const double* frequency, int32_t modes,
             const Outputs& o) {
   constexpr bool cx = kIsComplex<T>;
-  const StatusCode check = checks::ModeErrors(n, modes, fs);
-  if (check != status::kOk) return Public(check);
-  if (x == nullptr || amplitude == nullptr || phase == nullptr || damping == nullptr ||
-      frequency == nullptr || o.amplitude_se == nullptr || o.phase_se == nullptr ||
-      o.damping_se == nullptr || o.frequency_se == nullptr || o.noise_variance == nullptr) {
-    return QDM_ERR_NULL_POINTER;
+  const StatusCode check = checks::ModeErrors(n, modes, fs, last_error::Begin());
+  if (check != status::kOk) return last_error::End(PublicCode(check));
+  const std::pair<const void*, const char*> required[] = {{x, "x"},
+                                                          {amplitude, "amplitude"},
+                                                          {phase, "phase"},
+                                                          {damping, "damping"},
+                                                          {frequency, "frequency"},
+                                                          {o.amplitude_se, "amplitude_se"},
+                                                          {o.phase_se, "phase_se"},
+                                                          {o.damping_se, "damping_se"},
+                                                          {o.frequency_se, "frequency_se"},
+                                                          {o.noise_variance, "noise_variance"}};
+  for (const auto& [pointer, name] : required) {
+    if (pointer == nullptr) return last_error::Null(name);
   }
-  if (ModeErrorsWork(modes) > static_cast<double>(QDM_MAX_WORK_BYTES)) return QDM_ERR_WORK_LIMIT;
+  if (ModeErrorsWork(modes) > static_cast<double>(QDM_MAX_WORK_BYTES)) {
+    return last_error::WorkLimit(ModeErrorsWork(modes), n);
+  }
   const size_t values = static_cast<size_t>(n) * (cx ? 2 : 1);
-  const double extent = Largest(reinterpret_cast<const double*>(x), values);
-  if (extent < 0.0 || !Finite(fs)) return QDM_ERR_NON_FINITE;
+  const double extent = plain::Extent(reinterpret_cast<const double*>(x), int64_t(values));
+  if (extent < 0.0)
+    return last_error::NotFiniteSample(reinterpret_cast<const double*>(x), int64_t(values), cx);
+  if (!Finite(fs)) return last_error::NotFinite("fs", fs);
 
   ModeSet set{amplitude, phase, damping, frequency, modes, fs};
   int64_t parameters = 0;
   const StatusCode plan = ModeErrorsPlan(n, cx, pairs, set, &parameters);
-  if (plan != status::kOk) return Public(plan);
+  if (plan != status::kOk) return last_error::End(PublicCode(plan));
 
   // One scale for the record and the amplitudes: the model is linear in both.
-  const double largest = std::fmax(extent, Largest(amplitude, static_cast<size_t>(modes)));
-  const int scale = Scale(largest);
+  const double largest = std::fmax(extent, plain::Extent(amplitude, modes));
+  const int scale = plain::RecordScale(largest);
   WorkArray<double> copy;
   WorkArray<double> amps;
   const T* xs = x;
@@ -134,7 +129,7 @@ int32_t Run(const T* x, int32_t n, double fs, bool pairs, const double* amplitud
     s = static_cast<StatusCode>(QDM_ERR_NON_FINITE_RESULT);
   }
   if (s < 0) Clear(o, modes);
-  return Public(s);
+  return last_error::End(PublicCode(s));
 }
 
 }  // namespace

@@ -24,6 +24,7 @@
 #include <initializer_list>
 
 #include "api/last_error.h"
+#include "api/plain_face.h"
 #include "core/call_record.h"
 #include "core/scalar.h"
 #include "estimation/entry_checks.h"
@@ -35,9 +36,8 @@ namespace {
 
 // ---- one table of codes: the public numbering is the internal one mapped as
 // the host maps it ------------------------------------------------------------------
-constexpr int32_t PublicCode(StatusCode s) {
-  return s == status::kRankDeficient ? s : (s > 0 ? -42400 - s : s);
-}
+using plain::PublicCode;
+using plain::RecordScale;
 static_assert(PublicCode(status::kEmptyInput) == QDM_ERR_EMPTY_INPUT);
 static_assert(PublicCode(status::kBadOrder) == QDM_ERR_ORDER);
 static_assert(PublicCode(status::kBadCount) == QDM_ERR_COUNT);
@@ -120,44 +120,9 @@ struct PlainCall {
   int32_t* count;                            // 0 on failure, or null
 };
 
-// Folds one sample into a running largest magnitude; a NaN or an infinity
-// makes it infinite for good.
-inline void FoldMagnitude(double v, double& largest) {
-  const double a = std::fabs(v);
-  largest = a > largest ? a : largest;
-  if (!(a <= DBL_MAX)) largest = HUGE_VAL;
-}
-
 // The largest magnitude among the samples, or -1 when one is NaN or infinite.
-// Four independent lanes and no early exit keep the scan about as fast as a
-// plain finiteness test.
 double Extent(const Samples& x) {
-  const double* v = static_cast<const double*>(x.data);
-  const int64_t values = int64_t{x.n} * (x.complex ? 2 : 1);
-  double m0 = 0.0, m1 = 0.0, m2 = 0.0, m3 = 0.0;
-  int64_t i = 0;
-  for (; i + 4 <= values; i += 4) {
-    FoldMagnitude(v[i], m0);
-    FoldMagnitude(v[i + 1], m1);
-    FoldMagnitude(v[i + 2], m2);
-    FoldMagnitude(v[i + 3], m3);
-  }
-  for (; i < values; ++i) FoldMagnitude(v[i], m0);
-  const double largest = std::max(std::max(m0, m1), std::max(m2, m3));
-  return largest > DBL_MAX ? -1.0 : largest;
-}
-
-// The power of two a record is multiplied by before the fit: 0 inside
-// [2^-128, 2^128], where the fits' squares and sums cannot overflow or lose
-// bits to underflow and the estimators see the caller's samples unchanged;
-// outside it, the exponent that brings the largest magnitude into [1, 2).
-// Multiplying by a power of two is exact (but for samples that fall below
-// 2^-1022 beside a much larger maximum, far under its rounding), every fit is
-// homogeneous in the record, and the results are scaled back exactly.
-int RecordScale(double largest) {
-  constexpr double kHigh = 0x1p128, kLow = 0x1p-128;
-  if (largest == 0.0 || (largest >= kLow && largest <= kHigh)) return 0;
-  return -std::ilogb(largest);
+  return plain::Extent(static_cast<const double*>(x.data), int64_t{x.n} * (x.complex ? 2 : 1));
 }
 
 // Values of an output that hold results after the fit.

@@ -8,6 +8,7 @@
 #include <cstring>
 
 #include "api/last_error.h"
+#include "api/plain_face.h"
 #include "core/scalar.h"
 #include "estimation/estimation.h"
 #include "estimation/estimators.h"
@@ -22,9 +23,7 @@ constexpr int32_t kNoWindow = 3;
 // The evaluator's buffers, the caller's three outputs and the coefficient copy.
 constexpr double kWorkPerValue = 48.0 + 24.0;
 
-int32_t Public(StatusCode s) { return s > 0 ? -42400 - s : s; }
-
-bool Finite(double v) { return std::fabs(v) <= DBL_MAX; }
+using plain::Finite;
 bool Finite(const Complex& v) { return Finite(v.real()) && Finite(v.imag()); }
 
 // 1/|A(e^{jw})|^2 at w = 2 pi f / fs, by Horner's rule in z^-1.
@@ -123,7 +122,7 @@ int32_t ArPsd(const T* a, int32_t order, double noise_variance, int32_t points, 
   std::memcpy(static_cast<void*>(copy.get()), a, m * sizeof(T));
   SpectrumResult result{0.0, 0.0, spectrum};
   StatusCode s = ArSpectrum(copy.get(), order + 1, kReciprocal, fs, N, kNoWindow, &result);
-  int32_t status = s < 0 || s > 0 ? Public(s) : QDM_OK;
+  int32_t status = s < 0 || s > 0 ? plain::PublicCode(s) : QDM_OK;
   if (status == QDM_OK && psd != nullptr) {
     // The dB values are 10 log10(P / P_peak): the density is P sigma^2 / fs,
     // with P_peak evaluated at the 0 dB bin.

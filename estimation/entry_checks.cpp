@@ -164,11 +164,11 @@ StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate,
 }
 
 // ---- error bars of given modes ----
-StatusCode ModeErrors(int32_t n, int32_t modes, double rate) {
-  if (n < 1) return status::kEmptyInput;
-  if (modes < 1) return status::kNoModes;
-  if (BadRate(rate)) return status::kBadSampleRate;
-  return status::kOk;
+StatusCode ModeErrors(int32_t n, int32_t modes, double rate, Failure* why) {
+  StatusCode s = Samples(n, why);
+  if (s == status::kOk && modes < 1) s = Below(why, status::kNoModes, "modes", modes, "1");
+  if (s == status::kOk) s = Rate(rate, why);
+  return s;
 }
 
 }  // namespace checks

@@ -57,6 +57,6 @@ StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate,
 
 // ---- error bars of given modes ----
 // The standard errors of `modes` modes on n samples at sampling rate `rate`.
-StatusCode ModeErrors(int32_t n, int32_t modes, double rate);
+StatusCode ModeErrors(int32_t n, int32_t modes, double rate, Failure* why = nullptr);
 
 }  // namespace checks

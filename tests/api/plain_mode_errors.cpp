@@ -8,6 +8,7 @@
 #include <functional>
 #include <limits>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "numeric/lapack_boundary.h"
@@ -117,6 +118,26 @@ TEST(PlainModeErrors, EveryRefusalHasItsCodeAndWritesNothing) {
     Call c = Valid(complex);
     Errors(c, true);
     EXPECT_EQ(c.status, QDM_ERR_NULL_POINTER);
+  }
+}
+
+TEST(PlainModeErrors, ARefusalNamesItsArgumentAndASuccessClearsIt) {
+  const std::pair<std::function<void(Call&)>, std::string> rows[] = {
+      {[](Call& c) { c.modes = 0; }, "modes 0 is below 1"},
+      {[](Call& c) { c.fs = -1.0; }, "fs -1 is not positive"},
+      {[](Call& c) { c.phase.clear(); }, "phase is null"},
+      {[](Call& c) { c.x[3] = kNan; }, "x[1] has an imaginary part"},
+      {[](Call&) {}, ""}};
+  for (const auto& [change, says] : rows) {
+    Call c = Valid(true);
+    change(c);
+    Errors(c);
+    char text[200];
+    qdm_last_error_message(text, sizeof text);
+    EXPECT_EQ(std::string(text).substr(0, says.size()), says) << text;
+    if (says.empty()) {
+      EXPECT_STREQ(text, "");
+    }
   }
 }
 
