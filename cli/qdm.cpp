@@ -67,7 +67,7 @@ struct IntOption {
   const char* flag;
   const char* key;
   std::optional<int32_t> Options::*field;
-  int32_t fallback;  // pencil: n/3, prony's order: 6
+  int32_t fallback;  // pencil and upper: from n, prony's order: 6
   const char* help;
   unsigned methods;
 };
@@ -78,7 +78,7 @@ const IntOption kIntOptions[] = {
      Bit(kPcar) | Bit(kPcarSpectrum)},
     {"--pencil", "pencil", &Options::pencil, 0, "pencil parameter L [n/3]", Bit(kPencil)},
     {"--modes", "modes", &Options::modes, 6, "number of modes M [6]", Bit(kPencil)},
-    {"--upper", "upper", &Options::upper, 16, "upper order L [16]", Bit(kMdl)},
+    {"--upper", "upper", &Options::upper, 0, "upper order L [min(n/3, 64), at least 2]", Bit(kMdl)},
     {"--min-order", "min_order", &Options::minOrder, 1, "smallest order tried [1]", Bit(kMdl)},
     {"--points", "points", &Options::points, 512,
      "spectrum points, rounded up to a power of two [512]", kSpectra},
@@ -195,6 +195,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     resolved[i] = (o.*kIntOptions[i].field).value_or(kIntOptions[i].fallback);
   if (!o.order && m == kProny) resolved[0] = 6;
   if (!o.pencil) resolved[2] = qdm_default_pencil(n);
+  if (!o.upper) resolved[4] = qdm_default_mdl_upper(n);
   const auto [p, k, L, M, upper, minOrder, points] = resolved;
   Json par = Json::object(), res = Json::object();
   for (size_t i = 0; i < std::size(kIntOptions); ++i)

@@ -78,5 +78,7 @@ lib.qdm_output_room.restype = _I
 lib.qdm_output_room.argtypes = [_I, _I]
 lib.qdm_default_pencil.restype = _I
 lib.qdm_default_pencil.argtypes = [_I]
+lib.qdm_default_mdl_upper.restype = _I
+lib.qdm_default_mdl_upper.argtypes = [_I]
 lib.qdm_version.restype = ctypes.c_char_p
 lib.qdm_version.argtypes = []

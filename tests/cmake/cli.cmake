@@ -8,7 +8,7 @@ set(_cli_prefix ${CMAKE_CURRENT_BINARY_DIR}/cli_prefix)
 add_test(NAME cli.install
          COMMAND ${CMAKE_COMMAND} --install ${CMAKE_BINARY_DIR} --prefix ${_cli_prefix})
 set_tests_properties(cli.install PROPERTIES FIXTURES_SETUP qdm_cli_installed)
-foreach(case stdin_stdout jobs exit_codes plot csv limits)
+foreach(case stdin_stdout jobs exit_codes plot csv limits defaults)
   add_test(NAME cli.${case}
            COMMAND bash ${CMAKE_CURRENT_LIST_DIR}/cli.sh ${_cli_prefix}
                    ${CMAKE_CURRENT_BINARY_DIR}/cli_work/${case}
