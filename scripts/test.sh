@@ -29,16 +29,18 @@ git ls-files '*.c' '*.cpp' '*.h' '*.h.in' | xargs clang-format-14 --dry-run --We
 launcher=()
 command -v ccache >/dev/null &&
   launcher=(-DCMAKE_C_COMPILER_LAUNCHER=ccache -DCMAKE_CXX_COMPILER_LAUNCHER=ccache)
+# Every tree is built with warnings as errors (GCC, clang, mingw-w64 alike).
 suite() {  # name, cmake options...
   local dir=build/$1; shift
-  cmake -S . -B "$dir" -DQDM_BUILD_BENCH=ON "${launcher[@]}" "$@" >/dev/null || return 1
+  cmake -S . -B "$dir" -DQDM_BUILD_BENCH=ON -DQDM_WERROR=ON "${launcher[@]}" "$@" >/dev/null ||
+    return 1
   cmake --build "$dir" -j"$jobs" >/dev/null || { cmake --build "$dir" -j1 2>&1 | tail -40; return 1; }
 }
 run() {  # name
   ctest --test-dir "build/$1" -j"$jobs" --output-on-failure --schedule-random --timeout 600
 }
 
-suite release -DCMAKE_BUILD_TYPE=Release -DQDM_WERROR=ON || failed=1
+suite release -DCMAKE_BUILD_TYPE=Release -DCMAKE_EXPORT_COMPILE_COMMANDS=ON || failed=1
 # The install test also builds the Debian package and installs it with apt-get
 # (then removes it): CI runs as root on a machine of its own.
 [ $failed -eq 0 ] && { QDM_TEST_DEB=1 run release | tail -n 25 || failed=1; }
@@ -55,7 +57,7 @@ suite release -DCMAKE_BUILD_TYPE=Release -DQDM_WERROR=ON || failed=1
 # from the library's own frames by function name.
 tsan() {
   cmake -S . -B build/tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_TSAN=ON -DQDM_BLAS=reference \
-    -DQDM_BUILD_EXAMPLE=OFF "${launcher[@]}" >/dev/null || return 1
+    -DQDM_BUILD_EXAMPLE=OFF -DQDM_WERROR=ON "${launcher[@]}" >/dev/null || return 1
   cmake --build build/tsan -j"$jobs" --target e2e_concurrency api_plain_threads >/dev/null || return 1
   TSAN_OPTIONS="halt_on_error=1 suppressions=$PWD/tests/tsan.supp" ctest --test-dir build/tsan \
     -R '^(e2e\.Concurrency|api\.PlainThreads)' \
@@ -66,7 +68,7 @@ tsan() {
 fuzz() {
   cmake -S . -B build/fuzz -DCMAKE_C_COMPILER=clang-14 -DCMAKE_CXX_COMPILER=clang++-14 \
     -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_FUZZ=ON -DQDM_BLAS=reference \
-    -DQDM_BUILD_EXAMPLE=OFF >/dev/null || return 1
+    -DQDM_BUILD_EXAMPLE=OFF -DQDM_WERROR=ON >/dev/null || return 1
   cmake --build build/fuzz -j"$jobs" --target fuzz_exports >/dev/null || return 1
   # On the reference BLAS (QDM_BLAS=reference above), as it has always run,
   # so that its corpus and speed stay comparable.
