@@ -108,6 +108,9 @@ Signal Load(const std::string& path, const Options& o) {
 
 // One fit: the record (input, method, signal, parameters, status, results) and
 // the spectrum, which stays out of the JSON tree and is written as a stream.
+// Its implicit members only construct, move and destroy the members; the
+// exception check follows a throw it cannot rule out inside the JSON library.
+// NOLINTNEXTLINE(bugprone-exception-escape)
 struct Record {
   Json json;
   int32_t status = QDM_OK;
