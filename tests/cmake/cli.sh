@@ -341,7 +341,8 @@ with open("long.csv", "w") as f:
 PY
   for file in "$data" long.csv; do
     expect 0 mdl "$file" --json
-    QDM_LIBRARY=$api PYTHONPATH=$(dirname "$readme")/python $py - "$file" <<'PY' ||
+    LD_PRELOAD=${QDM_PYTHON_PRELOAD:-} ASAN_OPTIONS=detect_leaks=0 QDM_LIBRARY=$api \
+      PYTHONPATH=$(dirname "$readme")/python $py - "$file" <<'PY' ||
 import json, sys
 import numpy as np
 import qdm
