@@ -68,7 +68,7 @@ struct IntOption {
   const char* flag;
   const char* key;
   std::optional<int32_t> Options::*field;
-  int32_t fallback;  // pencil: n/3, prony's order: 6
+  int32_t fallback;  // pencil and upper: from n, prony's order: 6
   const char* help;
   unsigned methods;
 };
@@ -79,7 +79,7 @@ const IntOption kIntOptions[] = {
      Bit(kPcar) | Bit(kPcarSpectrum)},
     {"--pencil", "pencil", &Options::pencil, 0, "pencil parameter L [n/3]", Bit(kPencil)},
     {"--modes", "modes", &Options::modes, 6, "number of modes M [6]", Bit(kPencil)},
-    {"--upper", "upper", &Options::upper, 16, "upper order L [16]", Bit(kMdl)},
+    {"--upper", "upper", &Options::upper, 0, "upper order L [min(n/3, 64), at least 2]", Bit(kMdl)},
     {"--min-order", "min_order", &Options::minOrder, 1, "smallest order tried [1]", Bit(kMdl)},
     {"--nfft,--points", "nfft", &Options::nfft, 512,
      "spectrum length over the full circle, rounded up to a power of two (--points: its old "
@@ -111,6 +111,9 @@ Signal Load(const std::string& path, const Options& o) {
 
 // One fit: the record (input, method, signal, parameters, status, results) and
 // the spectrum, which stays out of the JSON tree and is written as a stream.
+// Its implicit members only construct, move and destroy the members; the
+// exception check follows a throw it cannot rule out inside the JSON library.
+// NOLINTNEXTLINE(bugprone-exception-escape)
 struct Record {
   Json json;
   int32_t status = QDM_OK;
@@ -234,6 +237,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     resolved[i] = (o.*kIntOptions[i].field).value_or(kIntOptions[i].fallback);
   if (!o.order && m == kProny) resolved[0] = 6;
   if (!o.pencil) resolved[2] = qdm_default_pencil(n);
+  if (!o.upper) resolved[4] = qdm_default_mdl_upper(n);
   const auto [p, k, L, M, upper, minOrder, points] = resolved;
   if (o.realSignal && s.complex && (kModal & Bit(m)))
     throw Failure{kUsage, {}, "--real-signal applies to real data only, not to complex samples"};
