@@ -350,7 +350,8 @@ int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t
       {check,
        {x, n, cx},
        {{order, "order"}},
-       PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L) + Bytes(n, cx ? kCx : kReal),
+       PencilWork(n, L, cx ? kCx : kReal) + ModeFitWork(n, L) +
+           static_cast<double>(Bytes(n, cx ? kCx : kReal)),
        nullptr,
        {},
        {},
