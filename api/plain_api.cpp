@@ -563,6 +563,14 @@ QDM_PLAIN_API int32_t qdm_output_room(int32_t n, int32_t size) {
 
 QDM_PLAIN_API int32_t qdm_default_pencil(int32_t n) { return n < 1 ? 0 : n / 3; }
 
+QDM_PLAIN_API int32_t qdm_default_mdl_upper(int32_t n) {
+  constexpr int32_t kCap = 64;  // keeps the O(n m + m^3) search small on long records
+  // floor(2n/3) >= 2 from n = 3 on, so 2 (the least upper order above
+  // min_order 1) always passes there; below it nothing does.
+  if (n < 3) return 0;
+  return std::clamp(n / 3, int32_t{2}, kCap);
+}
+
 // ---- covariance AR ----------------------------------------------------------------
 
 QDM_PLAIN_API int32_t qdm_covariance_real(const double* x, int32_t n, int32_t order,

@@ -11,6 +11,7 @@
 
 #include "fft/plan.h"
 #include "core/platform.h"
+#include "fft/kernels/kernels.h"
 #include "numeric/work.h"
 
 namespace {
@@ -19,10 +20,6 @@ constexpr double kTwoPi = 6.283185307179586476925286766559;
 
 // Head of the shared plan list (guarded by the plan mutex).
 FftPlan* g_plan_head = nullptr;
-
-// Specialised radices in the order the factorisation tries them.
-constexpr int32_t kRadixOrder[] = {10, 43, 41, 37, 32, 31, 29, 19, 18, 17, 16,
-                                   14, 13, 11, 9,  8,  7,  5,  4,  3,  2};
 
 template <typename T>
 T* AllocRaw(size_t count) {
@@ -238,7 +235,7 @@ FftPlan* CreatePlan(int32_t n) {
 int32_t FftFactorize(int32_t n, int32_t* factor, int32_t* kind) {
   int32_t count = 0;
   int32_t rest = n;
-  for (int32_t r : kRadixOrder) {
+  for (int32_t r : kFftRadixOrder) {  // the generator's order, with its kernels
     if (rest == 1) break;
     while (rest % r == 0) {
       factor[count] = r;

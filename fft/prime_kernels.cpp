@@ -97,7 +97,10 @@ StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const doubl
   }
   double* cr = yr + os;  // legs 1..r-1 as the transform buffer
   double* ci = yi + os;
-  StatusCode status = FftComplex(st->raderPlan, br, bi, cr, ci, 2, os, len);
+  // Legs 1..r-1 lie inside the transform, whose length and strides are int32:
+  // so does their stride, the sub-plan's.
+  const auto legStride = static_cast<int32_t>(os);
+  StatusCode status = FftComplex(st->raderPlan, br, bi, cr, ci, 2, legStride, len);
   if (status < 0) return status;
   const double sum_r = x0r + cr[0], sum_i = x0i + ci[0];  // bin 0 is the sum of the b_q
   const double* kr = st->raderKernelRe;
@@ -107,7 +110,7 @@ StatusCode RaderDft(const FftStage* st, int32_t r, const double* xr, const doubl
     cr[p * os] = ur * kr[p] - ui * ki[p];
     ci[p * os] = -(ur * ki[p] + ui * kr[p]);  // conjugate of the product
   }
-  status = FftComplex(st->raderPlan, cr, ci, br, bi, os, 2, len);
+  status = FftComplex(st->raderPlan, cr, ci, br, bi, legStride, 2, len);
   if (status < 0) return status;
   for (int32_t p = 0; p < len; ++p) {
     const ptrdiff_t k = scatter[p];

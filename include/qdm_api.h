@@ -153,6 +153,16 @@ QDM_PLAIN_API int32_t qdm_output_room(int32_t n, int32_t size);
  *  the Python package and the tool. */
 QDM_PLAIN_API int32_t qdm_default_pencil(int32_t n);
 
+/** The default upper order L of the MDL search (qdm_mdl_order_real(),
+ *  qdm_mdl_order_complex()) for n samples: the textbook floor(n/3), capped at
+ *  64, and raised to 2 where n/3 is below it; 0 for n < 3, where no upper order
+ *  passes (L must lie above min_order >= 1 and at most at floor(2n/3)). With
+ *  min_order = 1 it is valid for every n that has a valid upper order. The cap
+ *  bounds the cost: the search costs O(n m + m^3) for m up to L, and a
+ *  150,000-sample record would otherwise ask for m = 50,000. The default of
+ *  the Python package and the tool. */
+QDM_PLAIN_API int32_t qdm_default_mdl_upper(int32_t n);
+
 /* ---------------------------------------------------------------------------- */
 /** @name Covariance-method AR
  * Forward linear prediction over the n - p samples that have p predecessors,

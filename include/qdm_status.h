@@ -70,7 +70,7 @@
     "LAPACK reported an illegal argument, or a real transform length mismatch")                \
   X(QDM_ERR_FFT_LENGTH, -1, "complex transform length mismatch")
 
-#define QDM_STATUS_ENUM_ENTRY(name, code, text) name = code,
+#define QDM_STATUS_ENUM_ENTRY(name, code, text) name = (code),
 
 /** Every status code a qdm function can return (see qdm_status_text()). */
 enum qdm_status { QDM_STATUS_TABLE(QDM_STATUS_ENUM_ENTRY) };

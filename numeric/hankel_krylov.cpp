@@ -367,8 +367,8 @@ StatusCode SvdLeadingOf(Op& op, int32_t count, double* S, T* U, T* V) {
   WorkArray<T> Ub = AllocWorkUninit<T>(static_cast<size_t>(int64_t{un} * k));
   WorkArray<T> wu = AllocWorkUninit<T>(static_cast<size_t>(un));
   WorkArray<T> wv = AllocWorkUninit<T>(static_cast<size_t>(vn));
-  WorkArray<T> c = AllocWorkUninit<T>(static_cast<size_t>(k + 1));
-  WorkArray<T> c2 = AllocWorkUninit<T>(static_cast<size_t>(k + 1));
+  WorkArray<T> c = AllocWorkUninit<T>(static_cast<size_t>(int64_t{k} + 1));
+  WorkArray<T> c2 = AllocWorkUninit<T>(static_cast<size_t>(int64_t{k} + 1));
   WorkArray<T> B = AllocWork<T>(kk);
   WorkArray<T> Bw = AllocWorkUninit<T>(kk);
   WorkArray<T> P = AllocWorkUninit<T>(kk);

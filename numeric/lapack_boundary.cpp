@@ -222,8 +222,8 @@ StatusCode LeadingLeftSvd(lapack_int m, lapack_int n, T* a, lapack_int lda, lapa
   // d, e, B's left and right vectors, dbdsdc's workspace (3k^2 + 4k), and
   // IWORK (8k); the reflectors' scalars.
   WorkArray<double> real = AllocWorkUninit<double>(static_cast<size_t>(5 * kk + 6 * int64_t{k}));
-  WorkArray<T> taus = AllocWorkUninit<T>(static_cast<size_t>(2 * k));
-  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(8 * k));
+  WorkArray<T> taus = AllocWorkUninit<T>(static_cast<size_t>(2 * int64_t{k}));
+  WorkArray<lapack_int> iwork = AllocWorkUninit<lapack_int>(static_cast<size_t>(8 * int64_t{k}));
   if (!real || !taus || !iwork) return status::kNoMemory;
   double* d = real.get();
   double* e = d + k;

@@ -6,7 +6,8 @@
 # regressions and then fuzzing for a minute; the AddressSanitizer +
 # UndefinedBehaviorSanitizer build, on OpenBLAS; then the Windows DLL under
 # wine (scripts/windows.sh). Installs what is missing on a fresh Debian 12
-# machine (run as root). It checks the sources' layout (.clang-format) first.
+# machine (run as root). It checks the sources' layout (.clang-format) and runs
+# clang-tidy's bug-finding checks (.clang-tidy) first.
 # The last lines printed are ctest's own summary; the
 # exit status is non-zero if any suite failed. The Python package (python/) is
 # tested in both plain builds as ctest tests: python.pytest, and
@@ -17,7 +18,7 @@ scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev 
   libopenblas0-pthread libopenblas-pthread-dev libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev \
   python3-numpy python3-pytest python3-matplotlib python3-venv python3-pip \
   pkg-config doxygen dpkg-dev libcli11-dev nlohmann-json3-dev gnuplot-nox \
-  clang-14 libclang-rt-14-dev clang-format-14 valgrind || exit 1
+  clang-14 libclang-rt-14-dev clang-format-14 clang-tidy-14 valgrind || exit 1
 
 
 jobs=$(nproc)
@@ -29,16 +30,34 @@ git ls-files '*.c' '*.cpp' '*.h' '*.h.in' | xargs clang-format-14 --dry-run --We
 launcher=()
 command -v ccache >/dev/null &&
   launcher=(-DCMAKE_C_COMPILER_LAUNCHER=ccache -DCMAKE_CXX_COMPILER_LAUNCHER=ccache)
-suite() {  # name, cmake options...
+# Every tree is built with warnings as errors (GCC, clang, mingw-w64 alike).
+configure() {  # name, cmake options...
   local dir=build/$1; shift
-  cmake -S . -B "$dir" -DQDM_BUILD_BENCH=ON "${launcher[@]}" "$@" >/dev/null || return 1
+  cmake -S . -B "$dir" -DQDM_BUILD_BENCH=ON -DQDM_WERROR=ON "${launcher[@]}" "$@" >/dev/null
+}
+suite() {  # name, cmake options...
+  local dir=build/$1
+  configure "$@" || return 1
   cmake --build "$dir" -j"$jobs" >/dev/null || { cmake --build "$dir" -j1 2>&1 | tail -40; return 1; }
 }
+release=(-DCMAKE_BUILD_TYPE=Release -DCMAKE_EXPORT_COMPILE_COMMANDS=ON)
+# Static analysis: clang-tidy's bug-finding checks (.clang-tidy) over the
+# library and the tool, with the release tree's compile commands (configured
+# here, the generated kernels' header made); any finding fails the run.
+tidy() {
+  configure release "${release[@]}" || return 1
+  cmake --build build/release --target qdm_generated_kernels >/dev/null || return 1
+  git ls-files 'core/*.cpp' 'numeric/*.cpp' 'fft/*.cpp' 'estimation/*.cpp' 'host/*.cpp' \
+    'api/*.cpp' 'cli/*.cpp' |
+    xargs -P"$jobs" -n1 clang-tidy-14 -p build/release --quiet --warnings-as-errors='*' \
+      2> >(grep -v ' warnings\? generated\.$' >&2)
+}
+tidy || { echo "tidy: the findings above (.clang-tidy lists the checks)"; failed=1; }
 run() {  # name
   ctest --test-dir "build/$1" -j"$jobs" --output-on-failure --schedule-random --timeout 600
 }
 
-suite release -DCMAKE_BUILD_TYPE=Release -DQDM_WERROR=ON || failed=1
+suite release "${release[@]}" || failed=1
 # The install test also builds the Debian package and installs it with apt-get
 # (then removes it): CI runs as root on a machine of its own.
 [ $failed -eq 0 ] && { QDM_TEST_DEB=1 run release | tail -n 25 || failed=1; }
@@ -55,7 +74,7 @@ suite release -DCMAKE_BUILD_TYPE=Release -DQDM_WERROR=ON || failed=1
 # from the library's own frames by function name.
 tsan() {
   cmake -S . -B build/tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_TSAN=ON -DQDM_BLAS=reference \
-    -DQDM_BUILD_EXAMPLE=OFF "${launcher[@]}" >/dev/null || return 1
+    -DQDM_BUILD_EXAMPLE=OFF -DQDM_WERROR=ON "${launcher[@]}" >/dev/null || return 1
   cmake --build build/tsan -j"$jobs" --target e2e_concurrency api_plain_threads >/dev/null || return 1
   TSAN_OPTIONS="halt_on_error=1 suppressions=$PWD/tests/tsan.supp" ctest --test-dir build/tsan \
     -R '^(e2e\.Concurrency|api\.PlainThreads)' \
@@ -66,7 +85,7 @@ tsan() {
 fuzz() {
   cmake -S . -B build/fuzz -DCMAKE_C_COMPILER=clang-14 -DCMAKE_CXX_COMPILER=clang++-14 \
     -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_FUZZ=ON -DQDM_BLAS=reference \
-    -DQDM_BUILD_EXAMPLE=OFF >/dev/null || return 1
+    -DQDM_BUILD_EXAMPLE=OFF -DQDM_WERROR=ON >/dev/null || return 1
   cmake --build build/fuzz -j"$jobs" --target fuzz_exports >/dev/null || return 1
   # On the reference BLAS (QDM_BLAS=reference above), as it has always run,
   # so that its corpus and speed stay comparable.

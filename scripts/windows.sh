@@ -128,7 +128,7 @@ if [ ! -x "$linux/examples/qdm_example" ]; then
 fi
 say "configuring and building (build/windows)"
 quiet cmake -S "$root" -B "$build" -DCMAKE_TOOLCHAIN_FILE="$toolchain" -DQDM_WIN_DEPS="$deps" \
-  -DCMAKE_BUILD_TYPE=Release "-DCMAKE_CROSSCOMPILING_EMULATOR=$emulator" \
+  -DCMAKE_BUILD_TYPE=Release -DQDM_WERROR=ON "-DCMAKE_CROSSCOMPILING_EMULATOR=$emulator" \
   -DQDM_LINUX_EXAMPLE="$linux/examples/qdm_example" || die "configure"
 if ! cmake --build "$build" -j"$jobs" >/dev/null 2>&1; then
   cmake --build "$build" -j1 2>&1 | grep -v '^\[' | tail -n 40

@@ -24,6 +24,10 @@ import sys
 # from this list.
 RADICES = [2, 3, 4, 5, 7, 8, 9, 10, 11, 13, 14, 16, 17, 18, 19, 29, 31, 32, 37, 41, 43]
 MAX_RADIX = 43
+# The order in which the plan's factorisation takes radices out of a length
+# (kFftRadixOrder in kernels.h): 10 first, so decimal lengths split into passes
+# of ten (1000 = 10^3, not 8 * 5^3), then from the largest down.
+RADIX_ORDER = [10] + sorted((r for r in RADICES if r != 10), reverse=True)
 # Primes whose complex DFTs are written out by Rader's method: fewer operations
 # there than the symmetric-pair form, whose count grows as the square. DFTs of
 # real values keep the symmetric form, which halves its work for them.
@@ -668,8 +672,14 @@ def radix_file(r):
 
 def header_file():
     out = banner("")
-    out += ["// Declarations of the specialised kernels, four forms per radix.",
-            "#pragma once", "", "#include <cstddef>", "", '#include "fft/plan.h"', ""]
+    out += ["// Declarations of the specialised kernels, four forms per radix, and the",
+            "// order in which the factorisation tries the radices.",
+            "#pragma once", "", "#include <cstddef>", "#include <cstdint>", "",
+            '#include "fft/plan.h"', "",
+            "static_assert(kFftMaxRadix == %d, \"the kernel tables run to radix %d\");" % (
+                MAX_RADIX, MAX_RADIX), "",
+            "inline constexpr int32_t kFftRadixOrder[] = {%s};" % ", ".join(
+                str(r) for r in RADIX_ORDER), ""]
     for r in RADICES:
         rr = "%02d" % r
         out += [
@@ -705,6 +715,7 @@ def write(path, text):
 
 
 def main():
+    assert sorted(RADIX_ORDER) == RADICES and max(RADICES) == MAX_RADIX
     parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
     parser.add_argument("--out", help="output directory")
     parser.add_argument("--list", action="store_true", help="print the output file names")

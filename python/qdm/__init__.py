@@ -1137,7 +1137,9 @@ def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int
         other dtypes numpy casts safely to one of them are converted.
     max_order : int or None, min_order < max_order <= floor(2n/3), default None
         The upper order L, also the pencil parameter of the fits. None takes
-        n // 3 (so the default needs n >= 6).
+        the library's default, min(n // 3, 64) and at least 2, valid for
+        every n >= 3 (below that no upper order fits): the cap keeps the
+        O(n m + m**3) search small on long records.
     min_order : int, min_order >= 1, default 1
         The smallest order tried.
 
@@ -1194,7 +1196,8 @@ def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int
     """
     a, c = _signal(x, "mdl_order")
     n = a.shape[0]
-    upper = n // 3 if max_order is None else _int(max_order, "max_order", "mdl_order")
+    upper = (_clib.qdm_default_mdl_upper(n) if max_order is None
+             else _int(max_order, "max_order", "mdl_order"))
     lower = _int(min_order, "min_order", "mdl_order")
     order = _ct.c_int32(0)
     _check(_fn["mdl_order", _kind(c)](_addr(a), n, upper, lower, _ct.byref(order)), "mdl_order",

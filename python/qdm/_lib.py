@@ -90,5 +90,7 @@ lib.qdm_spectrum_layout.restype = _I
 lib.qdm_spectrum_layout.argtypes = [_P, _P, _I, _D, _I, _P, _P]
 lib.qdm_last_error_message.restype = _I
 lib.qdm_last_error_message.argtypes = [ctypes.c_char_p, _I]
+lib.qdm_default_mdl_upper.restype = _I
+lib.qdm_default_mdl_upper.argtypes = [_I]
 lib.qdm_version.restype = ctypes.c_char_p
 lib.qdm_version.argtypes = []

@@ -157,6 +157,7 @@ BAD = [  # call, exception, library code (None: refused before the library)
     (lambda: qdm.mdl_order(REAL, min_order=0), E, -42414),
     (lambda: qdm.mdl_order(COMPLEX, max_order=10**9), E, -42415),
     (lambda: qdm.covariance_psd(REAL, order=4, nfft=1), E, -42417),
+    (lambda: qdm.mdl_order(REAL[:2]), E, -42415),  # no upper order fits two samples
     (lambda: qdm.pcar_psd(COMPLEX, order=4, components=2, fs=0.0), E, -42418),
     (lambda: qdm.covariance_psd(REAL, order=4, nfft=2**30), E, -42420),
     (lambda: qdm.covariance_psd(REAL, order=4, nfft=4), E, -42422),
@@ -328,3 +329,17 @@ def test_the_order_search_does_not_depend_on_the_record_units(kind):
         x = x * np.exp(0.3j)
     orders = {k: qdm.mdl_order(x * 10.0**k, max_order=40) for k in range(-10, 13)}
     assert set(orders.values()) == {4}, orders
+
+
+_long = np.arange(600)
+LONG = (sum(np.exp(-0.002 * _long) * np.cos(0.3 * k * _long + k) for k in range(1, 8))
+        + 0.3 * np.random.default_rng(3).standard_normal(600))
+
+
+# The default upper order, min(n // 3, 64) and at least 2, written out: the
+# long record's order depends on it (16 gives another).
+@pytest.mark.parametrize("x,upper", [(REAL[:3], 2), (REAL[:8], 2), (COMPLEX, 21), (REAL, 32),
+                                     (LONG, 64), (LONG + 0.5j * LONG[::-1], 64)],
+                         ids=["n3", "n8", "n64", "n96", "n600", "n600c"])
+def test_mdl_order_defaults_to_the_capped_third(x, upper):
+    assert qdm.mdl_order(x) == qdm.mdl_order(x, max_order=upper)

@@ -5,6 +5,7 @@ if(TARGET qdm_api)
                  ${CMAKE_SOURCE_DIR}/tests/api/plain_records.cpp
                  ${CMAKE_SOURCE_DIR}/tests/api/plain_krylov.cpp
                  ${CMAKE_SOURCE_DIR}/tests/api/plain_messages.cpp
+                 ${CMAKE_SOURCE_DIR}/tests/api/plain_defaults.cpp
                  $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})
   target_include_directories(api_plain_vs_host PRIVATE ${CMAKE_SOURCE_DIR}
                              ${CMAKE_CURRENT_SOURCE_DIR} ${CMAKE_SOURCE_DIR}/include

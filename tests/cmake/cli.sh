@@ -479,6 +479,36 @@ CASES
   expect 0 covspectrum --example complex --two-sided
   [ ! -e m.png ] || fail "mdl drew a picture"
   ;;
+defaults)
+  # The tool and the Python package both take the library's default upper order
+  # of the MDL search: on the same files they choose the same order. The long
+  # noisy record is one whose order depends on that bound.
+  api=$(find "$prefix" -name 'libqdm_api.so' | head -n 1)
+  [ -n "$api" ] || fail "no libqdm_api.so under $prefix"
+  $py - <<'PY' || fail "long record"
+import math, random
+rng = random.Random(7)
+with open("long.csv", "w") as f:
+    for t in range(600):
+        v = sum(math.exp(-0.002 * t) * math.cos(0.3 * k * t + k) for k in range(1, 8))
+        f.write("%.17g\n" % (v + 0.3 * rng.gauss(0.0, 1.0)))
+PY
+  for file in "$data" long.csv; do
+    expect 0 mdl "$file" --json
+    LD_PRELOAD=${QDM_PYTHON_PRELOAD:-} ASAN_OPTIONS=detect_leaks=0 QDM_LIBRARY=$api \
+      PYTHONPATH=$(dirname "$readme")/python $py - "$file" <<'PY' ||
+import json, sys
+import numpy as np
+import qdm
+a = np.loadtxt(sys.argv[1], delimiter=",", ndmin=2)
+x = a[:, 0] + 1j * a[:, 1] if a.shape[1] == 2 else a[:, 0]
+tool = json.load(open("out"))
+assert tool["results"]["order"] == qdm.mdl_order(x), (tool, qdm.mdl_order(x))
+print("ok: %s: order %d, upper %d" % (sys.argv[1], qdm.mdl_order(x), tool["parameters"]["upper"]))
+PY
+      fail "the tool and Python differ on $file: $(cat out)"
+  done
+  ;;
 *) fail "unknown case $case" ;;
 esac
 echo "passed: $case"
