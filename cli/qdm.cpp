@@ -34,7 +34,7 @@ using Json = nlohmann::ordered_json;
 constexpr auto kReplace = Json::error_handler_t::replace;  // invalid UTF-8 becomes U+FFFD
 constexpr double kPi = 3.14159265358979323846;
 
-enum Method { kCovariance, kProny, kPcar, kPencil, kMdl, kCovSpectrum, kPcarSpectrum };
+enum Method { kCovariance, kProny, kPcar, kPencil, kMdl, kCovSpectrum, kPcarSpectrum, kStabilization };
 constexpr unsigned Bit(Method m) { return 1u << m; }
 constexpr unsigned kSpectra = Bit(kCovSpectrum) | Bit(kPcarSpectrum);
 constexpr unsigned kModal = Bit(kProny) | Bit(kPencil) | Bit(kPcarSpectrum);
@@ -48,12 +48,13 @@ constexpr const char* kMethods[][2] = {
     {"mdl", "minimum description length model order"},
     {"covspectrum", "covariance-method AR power spectrum"},
     {"pcarspectrum", "principal-component AR power spectrum and its modes"},
+    {"stabilization", "stabilization diagram: pencil poles across model orders, stable ones marked"},
 };
 
 // Everything the command line sets; unset parameters take the method's default.
 struct Options {
-  std::optional<int32_t> order, components, pencil, modes, upper, minOrder, nfft;
-  std::optional<double> rate;
+  std::optional<int32_t> order, components, pencil, modes, upper, minOrder, nfft, maxOrder;
+  std::optional<double> rate, freqTol, dampingTol;
   bool realSignal = false, json = false, csv = false;
   bool noSort = false, oneSided = false, twoSided = false, ignoreUnknown = false;
   std::string example, plot, columns, delimiter = ",", solver = "auto";
@@ -77,14 +78,19 @@ const IntOption kIntOptions[] = {
      Bit(kCovariance) | Bit(kProny) | Bit(kPcar) | kSpectra},
     {"--components", "components", &Options::components, 6, "singular components / modes k [6]",
      Bit(kPcar) | Bit(kPcarSpectrum)},
-    {"--pencil", "pencil", &Options::pencil, 0, "pencil parameter L [n/3]", Bit(kPencil)},
+    {"--pencil", "pencil", &Options::pencil, 0,
+     "pencil parameter L [n/3; stabilization: max(n/3, max-order)]",
+     Bit(kPencil) | Bit(kStabilization)},
     {"--modes", "modes", &Options::modes, 6, "number of modes M [6]", Bit(kPencil)},
     {"--upper", "upper", &Options::upper, 0, "upper order L [min(n/3, 64), at least 2]", Bit(kMdl)},
-    {"--min-order", "min_order", &Options::minOrder, 1, "smallest order tried [1]", Bit(kMdl)},
+    {"--min-order", "min_order", &Options::minOrder, 1, "smallest order tried [1]",
+     Bit(kMdl) | Bit(kStabilization)},
     {"--nfft,--points", "nfft", &Options::nfft, 512,
      "spectrum length over the full circle, rounded up to a power of two (--points: its old "
      "name) [512]",
      kSpectra},
+    {"--max-order", "max_order", &Options::maxOrder, 20, "highest order fitted [20]",
+     Bit(kStabilization)},
 };
 
 Signal Load(const std::string& path, const Options& o) {
@@ -226,6 +232,82 @@ int32_t SolverOf(const Options& o) {
                                : QDM_SOLVER_AUTO;
 }
 
+// The stabilization diagram: one row per pole (order, frequency, damping,
+// amplitude, flags and the stable bit), the MDL order, and for the plot the
+// covariance AR spectrum of the record (order max_order) kept beside the
+// record, out of its JSON.
+void Stabilize(const Signal& s, double rate, int32_t flag, int32_t L, int32_t minOrder,
+               int32_t maxOrder, const Json& par, Json& res, Record& r, bool spectrum) {
+  const int32_t n = s.n;
+  const double* re = s.values.data();
+  const auto* cx = reinterpret_cast<const qdm_complex*>(s.values.data());
+  const double freqTol = par["freq_tol"].get<double>(), dampTol = par["damping_tol"].get<double>();
+  // A bad order is refused before the table is touched: no room for one above n/2.
+  const int64_t room =
+      std::max<int64_t>(qdm_stabilization_rows(minOrder, std::min(maxOrder, n / 2)), 1);
+  const size_t rowsRoom = static_cast<size_t>(room);
+  std::vector<int32_t> order(rowsRoom), flags(rowsRoom);
+  std::vector<double> freq(rowsRoom), damping(rowsRoom), amp(rowsRoom);
+  int64_t rows = 0;
+  int32_t mdl = 0;
+  Check(s.complex ? qdm_stabilization_complex(cx, n, L, minOrder, maxOrder, rate, freqTol, dampTol,
+                                              room, order.data(), freq.data(), damping.data(),
+                                              amp.data(), flags.data(), &rows, &mdl)
+                  : qdm_stabilization_real(re, n, L, minOrder, maxOrder, rate, flag, freqTol,
+                                           dampTol, room, order.data(), freq.data(),
+                                           damping.data(), amp.data(), flags.data(), &rows, &mdl),
+        "qdm_stabilization", s.complex, r);
+  // Rows by order, then frequency.
+  std::vector<size_t> by(static_cast<size_t>(rows));
+  for (size_t i = 0; i < by.size(); ++i) by[i] = i;
+  std::stable_sort(by.begin(), by.end(), [&](size_t a, size_t b) {
+    return order[a] != order[b] ? order[a] < order[b] : freq[a] < freq[b];
+  });
+  Json t = Json::object();
+  for (const char* key : {"order", "frequency_hz", "damping_per_sample", "damping_per_s",
+                          "amplitude", "flags", "stable"})
+    t[key] = Json::array();
+  size_t stable = 0;
+  for (size_t i : by) {
+    t["order"].push_back(order[i]);
+    t["frequency_hz"].push_back(freq[i]);
+    t["damping_per_sample"].push_back(damping[i]);
+    t["damping_per_s"].push_back(damping[i] * rate);
+    t["amplitude"].push_back(amp[i]);
+    t["flags"].push_back(flags[i]);
+    t["stable"].push_back((flags[i] & QDM_STABLE) ? 1 : 0);
+    stable += (flags[i] & QDM_STABLE) ? 1 : 0;
+  }
+  res["mdl_order"] = mdl;
+  res["pole_count"] = rows;
+  res["stable_count"] = stable;
+  res["diagram"] = std::move(t);
+  if (!spectrum) return;
+  // The backdrop: a failure here leaves the picture without it, never the fit.
+  const int32_t p = std::min<int32_t>(maxOrder, int32_t(qdm_output_room(n, maxOrder)));
+  const int32_t points = 1024, oneSided = !s.complex && flag ? 1 : 0;
+  std::vector<double> a(2 * size_t(p + 1)), z(2 * size_t(std::max(p, 1)));
+  double variance = 0.0;
+  const int32_t fitted =
+      s.complex ? qdm_covariance_complex(cx, n, p, reinterpret_cast<qdm_complex*>(a.data()),
+                                         reinterpret_cast<qdm_complex*>(z.data()), &variance)
+                : qdm_covariance_real(re, n, p, a.data(), reinterpret_cast<qdm_complex*>(z.data()),
+                                      &variance);
+  if (fitted != QDM_OK && fitted != QDM_WARN_RANK_DEFICIENT) return;
+  const int32_t length = qdm_spectrum_length(points);
+  auto axis = SpectrumOutput(length), db = SpectrumOutput(length);
+  int32_t laid = 0;
+  const int32_t drawn =
+      s.complex ? qdm_ar_psd_complex(reinterpret_cast<const qdm_complex*>(a.data()), p, 0.0,
+                                     points, rate, 0, axis.get(), db.get(), nullptr, &laid)
+                : qdm_ar_psd_real(a.data(), p, 0.0, points, rate, oneSided, axis.get(), db.get(),
+                                  nullptr, &laid);
+  if (drawn != QDM_OK) return;
+  r.frequency = std::move(axis);
+  r.spectrum = std::move(db);
+  r.spectrumLength = size_t(laid);
+}
+
 Record Fit(Method m, const Options& o, const std::string& input, const Signal& s) {
   Record r;
   const double* re = s.values.data();
@@ -238,8 +320,10 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   if (!o.order && m == kProny) resolved[0] = 6;
   if (!o.pencil) resolved[2] = qdm_default_pencil(n);
   if (!o.upper) resolved[4] = qdm_default_mdl_upper(n);
-  const auto [p, k, L, M, upper, minOrder, points] = resolved;
-  if (o.realSignal && s.complex && (kModal & Bit(m)))
+  if (!o.pencil && m == kStabilization)
+    resolved[2] = std::max(resolved[2], std::min(resolved[7], n / 2));
+  const auto [p, k, L, M, upper, minOrder, points, maxOrder] = resolved;
+  if (o.realSignal && s.complex && ((kModal | Bit(kStabilization)) & Bit(m)))
     throw Failure{kUsage, {}, "--real-signal applies to real data only, not to complex samples"};
   if (o.oneSided && s.complex)
     throw Failure{kUsage,
@@ -255,6 +339,12 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   if (kModal & Bit(m)) par["sorted"] = o.noSort ? 0 : 1;
   if (kSpectra & Bit(m)) par["one_sided"] = oneSided;
   if (m == kPencil || m == kPcar) par["solver"] = o.solver;
+  if (m == kStabilization) {
+    if (!s.complex) par["real_signal"] = flag;
+    par["freq_tol"] = o.freqTol.value_or(0.01);
+    par["damping_tol"] = o.dampingTol.value_or(0.05);
+    Stabilize(s, rate, flag, L, minOrder, maxOrder, par, res, r, !o.plot.empty());
+  }
   // Outputs are sized by the library's own room for the size arguments and,
   // for a spectrum, its own length for the points asked.
   const size_t room = size_t(qdm_output_room(n, std::max({p, k, M}))) + 1;
@@ -303,6 +393,8 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
                       : qdm_matrix_pencil_solver_real(re, n, L, M, rate, flag, SolverOf(o), amp,
                                                       phase, damping, freq, &count, &mse),
             "qdm_matrix_pencil_solver", s.complex, r);
+      break;
+    case kStabilization:
       break;
     case kPcarSpectrum:
       Check(s.complex ? qdm_pcar_psd_complex(cx, n, p, points, k, rate, amp, phase, freq, &count,
@@ -572,7 +664,7 @@ void WriteCsvTable(std::FILE* out, const Record& r, const std::string& key) {
 // The method's main table: the spectrum, the modes, the coefficients, or the order.
 void WriteCsv(std::FILE* out, const Record& r) {
   const Json& res = r.json["results"];
-  for (const char* key : {"spectrum", "modes", "coefficients"})
+  for (const char* key : {"spectrum", "modes", "diagram", "coefficients"})
     if (res.contains(key)) return WriteCsvTable(out, r, key);
   Writer(out) << "order\n" << res["order"].dump() << "\n";
 }
@@ -613,6 +705,78 @@ std::vector<ModeLabel> Stagger(std::vector<ModeLabel> modes, double gap) {
   return modes;
 }
 
+// The stabilization diagram: frequency across, model order up, stable poles
+// filled, the others small open circles, the AR spectrum behind on the right
+// axis and the MDL order as a labelled line. Every number is in a data file.
+bool PlotDiagram(const std::string& png, const Record& r, std::vector<PlotFile> files,
+                 std::string script, const std::string& terminal) {
+  const Json& j = r.json;
+  const Json& res = j["results"];
+  const double rate = j["parameters"].value("rate_hz", 1.0);
+  const Json& orders = res["diagram"]["order"];
+  const Json& freqs = res["diagram"]["frequency_hz"];
+  double lo = 0.0, hi = 0.0;
+  for (size_t i = 0; i < freqs.size(); ++i) {
+    lo = std::min(lo, freqs[i].get<double>());
+    hi = std::max(hi, freqs[i].get<double>());
+  }
+  // The frequency range: the spectrum's when there is one, else the poles'
+  // within the band the sampling rate allows.
+  const bool oneSided = lo >= 0.0;
+  double x0 = oneSided ? 0.0 : -rate / 2.0, x1 = rate / 2.0;
+  if (r.spectrum && r.spectrumLength > 1) {
+    x0 = r.frequency[0];
+    x1 = r.frequency[r.spectrumLength - 1];
+  }
+  const int32_t bottom = j["parameters"]["min_order"].get<int32_t>();
+  const int32_t top = orders.empty() ? bottom : orders.back().get<int32_t>();
+  const int32_t mdl = res["mdl_order"].get<int32_t>();
+  files.push_back({"frame.csv", [=](std::FILE* f) {
+                     Writer(f) << "x0,x1,y0,y1,mdl,label\n"
+                               << Exact(x0) << "," << Exact(x1) << "," << Exact(bottom - 0.7)
+                               << "," << Exact(top + 0.7) << "," << std::to_string(mdl)
+                               << ",MDL order " << std::to_string(mdl) << "\n";
+                   }});
+  const bool backdrop = r.spectrum && r.spectrumLength > 1;
+  if (backdrop) {
+    files.push_back({"spectrum.csv", [&r](std::FILE* f) {
+                       Writer w(f);
+                       w << "frequency_hz,power_db\n";
+                       for (size_t i = 0; i < r.spectrumLength; ++i)
+                         w << Exact(r.frequency[i]) << "," << Exact(r.spectrum[i]) << "\n";
+                     }});
+  }
+  script +=
+      "stats 'frame.csv' using 1:2 nooutput prefix 'X'\n"
+      "stats 'frame.csv' using 3:4 nooutput prefix 'Y'\n"
+      "stats 'frame.csv' using 5 nooutput prefix 'M'\n"
+      "set xrange [X_min_x:X_min_y]\nset yrange [Y_min_x:Y_min_y]\n"
+      "set xlabel 'Frequency (Hz)'\nset ylabel 'Model order'\n"
+      "set ytics 1 nomirror\nset mytics 1\nset grid xtics ytics\n"
+      "set title font ',10'\n"
+      "set key at screen 0.99, screen 0.90 right top vertical box opaque\n"
+      "set lmargin at screen 0.07\nset rmargin at screen 0.70\n";
+  if (backdrop)
+    script +=
+        "set y2label 'AR spectrum (dB, peak = 0 dB)'\nset y2tics\n"
+        "set y2range [-100<*:10]\n";
+  script += terminal + "plot ";
+  if (backdrop)
+    script += "'spectrum.csv' using 1:2 axes x1y2 with lines lw 1.5 lc rgb '#b8b8b8' "
+              "title 'AR spectrum', ";
+  script +=
+      "'data.csv' using ((int($6) & 4) ? NaN : $2):1 with points pt 6 ps 0.7 "
+      "lc rgb '#c0392b' title 'not stable', "
+      "'data.csv' using ((int($6) & 4) ? $2 : NaN):1 with points pt 7 ps 1.2 "
+      "lc rgb '#1f5fa8' title 'stable'";
+  if (mdl > 0)
+    script +=
+        ", 'frame.csv' using 1:5:($2 - $1):(0) with vectors nohead dt 2 lw 2 "
+        "lc rgb '#27ae60' title 'MDL order', 'frame.csv' using ($1 + 0.01 * ($2 - $1)):($5 + 0.35):6 "
+        "with labels left tc rgb '#27ae60' notitle";
+  return RunGnuplot(script + "\n", files, png);
+}
+
 // Draws the spectrum (modes marked), the modes, or the poles; false: no gnuplot.
 // The script is fixed text; the title (which names the input), every number
 // and every label are data files it reads.
@@ -620,7 +784,7 @@ bool Plot(const std::string& png, const Record& r) {
   const Json& j = r.json;
   const Json& res = j["results"];
   std::string key;
-  for (const char* k : {"spectrum", "modes", "poles", "roots"})
+  for (const char* k : {"diagram", "spectrum", "modes", "poles", "roots"})
     if (key.empty() && res.contains(k)) key = k;
   std::string title = "qdm " + j["method"].get<std::string>() + ", " +
                       (j["input"] == "-" ? "standard input" : j["input"].get<std::string>());
@@ -640,6 +804,7 @@ bool Plot(const std::string& png, const Record& r) {
   const std::string terminal =
       "set terminal pngcairo size 1100,650 font 'DejaVu Sans,11'\nset output\n";
   const double rate = j["parameters"].value("rate_hz", 1.0);
+  if (res.contains("diagram")) return PlotDiagram(png, r, files, script, terminal);
   std::vector<ModeLabel> labels;
   if (res.contains("modes")) {
     const Json& m = res["modes"];
@@ -864,9 +1029,9 @@ int Main(int argc, char** argv) {
   Options o;
   std::vector<std::pair<CLI::App*, Method>> subs;
   // The options each subcommand has that its method does not use.
-  std::vector<std::vector<CLI::Option*>> foreign(kPcarSpectrum + 1);
+  std::vector<std::vector<CLI::Option*>> foreign(kStabilization + 1);
   const char* const kIgnored = "Options of other methods (an error without --ignore-unknown)";
-  for (int m = kCovariance; m <= kPcarSpectrum; ++m) {
+  for (int m = kCovariance; m <= kStabilization; ++m) {
     CLI::App* sub = app.add_subcommand(kMethods[m][0], kMethods[m][1]);
     subs.push_back({sub, Method(m)});
     const unsigned bit = Bit(Method(m));
@@ -886,7 +1051,16 @@ int Main(int argc, char** argv) {
           Bit(kPencil) | Bit(kPcar));
     group(sub->add_flag("--real-signal", o.realSignal,
                         "real data: one mode per conjugate pair, at its non-negative frequency"),
-          kModal);
+          kModal | Bit(kStabilization));
+    group(sub->add_option("--freq-tol", o.freqTol,
+                          "relative frequency tolerance of a stable pole, of max(|f|, fs/n) "
+                          "[0.01]")
+              ->check(kNonEmpty),
+          Bit(kStabilization));
+    group(sub->add_option("--damping-tol", o.dampingTol,
+                          "relative damping tolerance of a stable pole, of max(|d|, 1/n) [0.05]")
+              ->check(kNonEmpty),
+          Bit(kStabilization));
     group(sub->add_flag("--no-sort", o.noSort,
                         "modes in the library's order, not sorted by frequency"),
           kModal);
@@ -938,7 +1112,7 @@ int Main(int argc, char** argv) {
   if (chosen == nullptr && (argc < 2 || argv[1][0] != '-')) {
     std::fprintf(stderr,
                  "qdm: %s%s%s; methods: covariance, prony, pcar, pencil, mdl, covspectrum, "
-                 "pcarspectrum (see qdm --help)\n",
+                 "pcarspectrum, stabilization (see qdm --help)\n",
                  argc < 2 ? "no method given" : "unknown method '",
                  argc < 2 ? "" : Shown(argv[1], kFieldShown).c_str(), argc < 2 ? "" : "'");
     return kUsage;

@@ -1,6 +1,7 @@
 #include "estimation/entry_checks.h"
 
 #include "estimation/estimation.h"
+#include "estimation/stabilization.h"
 
 namespace checks {
 namespace {
@@ -169,6 +170,54 @@ StatusCode ModeErrors(int32_t n, int32_t modes, double rate, Failure* why) {
   if (s == status::kOk && modes < 1) s = Below(why, status::kNoModes, "modes", modes, "1");
   if (s == status::kOk) s = Rate(rate, why);
   return s;
+}
+
+// ---- the stabilization diagram ----
+namespace {
+
+// "<argument> <value> is below 0", a NaN passing.
+StatusCode Tolerance(double tol, const char* argument, Failure* why) {
+  if (!(0.0 > tol)) return status::kOk;
+  if (why == nullptr) return status::kBadTolerance;
+  Failure f;
+  f.argument = argument;
+  f.value = tol;
+  f.relation = "is below";
+  f.limit = "0";
+  return Refuse(why, status::kBadTolerance, f);
+}
+
+}  // namespace
+
+StatusCode Stabilization(int32_t n, int32_t L, int32_t minOrder, int32_t maxOrder, double rate,
+                         double freqTol, double dampingTol, int64_t room, Bound bound,
+                         Failure* why) {
+  StatusCode s = Samples(n, why);
+  if (s == status::kOk) s = Size(L, 1, n, bound, status::kBadOrder, "pencil", why);
+  if (s != status::kOk) return s;
+  if (minOrder < 1) return Below(why, status::kBadMinOrder, "min_order", minOrder, "1");
+  if (maxOrder <= minOrder)
+    return Against(why, status::kBadMdlUpper, "max_order", maxOrder, "is not above", "min_order",
+                   minOrder);
+  const int32_t r = (n - L) < L ? n - L : L;  // the pencil's most modes
+  if (maxOrder > r)
+    return Against(why, status::kBadMdlUpper, "max_order", maxOrder, "is above",
+                   "min(pencil, n - pencil)", r);
+  s = Rate(rate, why);
+  if (s == status::kOk) s = Tolerance(freqTol, "freq_tol", why);
+  if (s == status::kOk) s = Tolerance(dampingTol, "damping_tol", why);
+  if (s != status::kOk) return s;
+  const int64_t need = StabilizationRows(minOrder, maxOrder);
+  if (room >= need) return status::kOk;
+  if (why == nullptr) return status::kTableRoom;
+  Failure f;
+  f.argument = "room";
+  f.value = static_cast<double>(room);
+  f.relation = "is below";
+  f.limit = "qdm_stabilization_rows(min_order, max_order)";
+  f.limitNamed = true;
+  f.limitValue = static_cast<double>(need);
+  return Refuse(why, status::kTableRoom, f);
 }
 
 }  // namespace checks

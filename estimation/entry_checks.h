@@ -59,4 +59,13 @@ StatusCode PcarSpectrum(int32_t n, int32_t p, int32_t k, int32_t m, double rate,
 // The standard errors of `modes` modes on n samples at sampling rate `rate`.
 StatusCode ModeErrors(int32_t n, int32_t modes, double rate, Failure* why = nullptr);
 
+// ---- the stabilization diagram ----
+// Orders min_order..max_order of pencils with parameter L: 1 <= L <= floor(2n/3),
+// 1 <= min_order < max_order <= min(L, n - L), tolerances >= 0 (a NaN passes
+// here; the face refuses it as not finite), and a table of at least
+// StabilizationRows(min_order, max_order) rows.
+StatusCode Stabilization(int32_t n, int32_t L, int32_t minOrder, int32_t maxOrder, double rate,
+                         double freqTol, double dampingTol, int64_t room,
+                         Bound bound = Bound::kHost, Failure* why = nullptr);
+
 }  // namespace checks

@@ -569,6 +569,93 @@ QDM_PLAIN_API int32_t qdm_mode_errors_complex(const qdm_complex* x, int32_t n, d
                                               double* frequency_se, double* noise_variance);
 /** @} */
 
+/* ---------------------------------------------------------------------------- */
+/** @name Stabilization diagram
+ * The modes of matrix-pencil fits of every order m from `min_order` to
+ * `max_order`, all from one decomposition: the reduced pencil of `max_order`
+ * modes, whose leading m x m block is the m-mode pencil (the poles of order m
+ * are those of qdm_matrix_pencil_*() with order m and the same pencil, to
+ * rounding). Each order's amplitudes are fitted to the record by least
+ * squares. A pole of order m is flagged against the poles of order m - 1
+ * (for m = min_order > 1 that order is fitted too, for the comparison only):
+ *   - ::QDM_STABLE_FREQUENCY when some pole below has |f - f'| <=
+ *     freq_tol * max(|f|, fs / n),
+ *   - ::QDM_STABLE_DAMPING when some pole below has |d - d'| <=
+ *     damping_tol * max(|d|, 1 / n),
+ *   - ::QDM_STABLE when one pole below matches it in both,
+ * f and d the order-m pole's own frequency and damping. The floors fs/n
+ * (the record's frequency resolution) and 1/n (damping of one e-fold over the
+ * record) keep the tolerances meaningful near 0 Hz and near no damping.
+ * Order 1 (when min_order is 1) has nothing below it and no flags. Frequency
+ * is compared as a signed value: complex poles near +fs/2 and -fs/2 do not
+ * match across the wrap.
+ *
+ * The table is flat, one row per pole, order by order from min_order up,
+ * each order's poles in the eigensolver's order (unsorted); column k of row i
+ * is column_k[i]. Order m has m rows, or with real_signal on real data one
+ * per conjugate pair (the poles with arg(z) in [0, pi), as the pencil reports
+ * them), so qdm_stabilization_rows(min_order, max_order) =
+ * (max_order - min_order + 1)(min_order + max_order) / 2 rows always suffice.
+ *
+ * The call also runs qdm_mdl_order_*() on the same record with the same
+ * orders (max_order as its upper order and pencil parameter; its search
+ * stops at max_order - 1 when max_order = n/2) and returns its choice.
+ *
+ * @param x             n samples
+ * @param n             number of samples, >= 1
+ * @param pencil        pencil parameter L, 1 <= L <= floor(2n/3)
+ * @param min_order     lowest order listed, >= 1
+ * @param max_order     highest order listed, min_order < max_order <= min(L, n - L)
+ * @param fs            sampling rate in Hz, > 0
+ * @param real_signal   (real data only) non-zero: one mode per conjugate pair
+ * @param freq_tol      relative frequency tolerance, >= 0 (e.g. 0.01)
+ * @param damping_tol   relative damping tolerance, >= 0 (e.g. 0.05)
+ * @param room          rows set aside in each column, >= qdm_stabilization_rows()
+ * @param order         out: room values, each row's model order m
+ * @param frequency     out: room values, Hz
+ * @param damping       out: room values, ln|z| per sample
+ * @param amplitude     out: room values, |A| (units of x)
+ * @param flags         out: room values, ::qdm_stability bits
+ * @param rows          out: rows written
+ * @param mdl_order     out: the MDL order of the record, 0 when no order
+ *                      scores below 10000
+ * @return ::QDM_OK, ::QDM_WARN_RANK_DEFICIENT; ::QDM_ERR_EMPTY_INPUT,
+ *   ::QDM_ERR_ORDER (pencil), ::QDM_ERR_MIN_ORDER, ::QDM_ERR_MDL_UPPER
+ *   (max_order), ::QDM_ERR_SAMPLE_RATE, ::QDM_ERR_TOLERANCE, ::QDM_ERR_ROOM,
+ *   ::QDM_ERR_NULL_POINTER, ::QDM_ERR_WORK_LIMIT, ::QDM_ERR_NON_FINITE (a
+ *   sample, fs or a tolerance), ::QDM_ERR_NO_MEMORY, ::QDM_ERR_EXTREME_VALUE,
+ *   ::QDM_ERR_NO_CONVERGENCE, ::QDM_ERR_ILLEGAL_ARGUMENT,
+ *   ::QDM_ERR_NON_FINITE_RESULT (a pole at 0, as a spike gives, has damping
+ *   -inf). On an error the columns are zeroed over `room` rows (none when an
+ *   argument check refused the call), and rows and mdl_order are 0.
+ * @{ */
+/** The flags bits of a stabilization row. */
+typedef enum qdm_stability {
+  QDM_STABLE_FREQUENCY = 1, /**< a pole of the order below within freq_tol */
+  QDM_STABLE_DAMPING = 2,   /**< a pole of the order below within damping_tol */
+  QDM_STABLE = 4            /**< one pole of the order below within both */
+} qdm_stability;
+
+/** Rows a table for orders min_order..max_order needs:
+ *  (max_order - min_order + 1)(min_order + max_order) / 2, or 0 when
+ *  min_order < 1 or max_order < min_order. */
+QDM_PLAIN_API int64_t qdm_stabilization_rows(int32_t min_order, int32_t max_order);
+QDM_PLAIN_API int32_t qdm_stabilization_real(const double* x, int32_t n, int32_t pencil,
+                                             int32_t min_order, int32_t max_order, double fs,
+                                             int32_t real_signal, double freq_tol,
+                                             double damping_tol, int64_t room, int32_t* order,
+                                             double* frequency, double* damping,
+                                             double* amplitude, int32_t* flags, int64_t* rows,
+                                             int32_t* mdl_order);
+QDM_PLAIN_API int32_t qdm_stabilization_complex(const qdm_complex* x, int32_t n, int32_t pencil,
+                                                int32_t min_order, int32_t max_order, double fs,
+                                                double freq_tol, double damping_tol, int64_t room,
+                                                int32_t* order, double* frequency,
+                                                double* damping, double* amplitude,
+                                                int32_t* flags, int64_t* rows,
+                                                int32_t* mdl_order);
+/** @} */
+
 #ifdef __cplusplus
 }
 #endif

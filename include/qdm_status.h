@@ -5,7 +5,7 @@
  * 0 is success. 20001 is a warning (the plain face only: the results are
  * complete and valid); 20002 the error bars' warning (NaN errors for the
  * modes whose bound is singular, every other value complete). Codes from
- * -42401 down to -42425 are argument errors, -424xx in the host's numbering;
+ * -42401 down to -42427 are argument errors, -424xx in the host's numbering;
  * the plain face writes nothing when it returns one. -30001 is the plain face's screen of its own results: a fit ran, but a
  * number it was about to hand back is NaN or infinite. The other negative
  * codes are numeric and FFT failures. The host face also returns -42400 - e
@@ -47,6 +47,9 @@
   X(QDM_ERR_MODE_VALUES, -42425,                                                               \
     "a mode value is NaN or infinite, or a mode of real data (real_signal zero) has no "      \
     "conjugate partner")                                                                       \
+  X(QDM_ERR_TOLERANCE, -42426, "a stabilization tolerance (frequency or damping) is negative") \
+  X(QDM_ERR_ROOM, -42427,                                                                      \
+    "the caller's table has fewer rows than the call may write (qdm_stabilization_rows)")      \
   X(QDM_ERR_NON_FINITE_RESULT, -30001,                                                         \
     "a result of the fit is NaN or infinite (a degenerate record: zero, constant, a spike, a " \
     "ramp, or values beyond the range of double)")                                             \

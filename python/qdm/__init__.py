@@ -9,6 +9,7 @@ matrix_pencil   damped exponentials by the matrix pencil method
 mdl_order       model order by the minimum description length
 covariance_psd  power spectrum of the covariance AR model
 pcar_psd        power spectrum of the principal-component AR model, and its modes
+stabilization   pencil modes across model orders, the stable ones marked
 
 Every fit takes one 1-D array ``x``; every other argument is keyword-only.
 Its dtype picks the real (float64) or the complex (complex128) fit; other
@@ -49,11 +50,11 @@ from numpy.typing import ArrayLike, NDArray
 from qdm._lib import functions as _fn, lib as _clib
 
 __all__ = ["covariance", "pcar", "prony", "matrix_pencil", "mdl_order", "covariance_psd",
-           "pcar_psd", "mode_errors", "Error", "ArgumentError", "DTypeError", "OutOfMemoryError",
+           "pcar_psd", "mode_errors", "stabilization", "Error", "ArgumentError", "DTypeError", "OutOfMemoryError",
            "NumericError", "NonFiniteResultError", "RankDeficientWarning", "SingularBoundWarning",
            "status_text", "__version__",
            "CovarianceFit", "PcarFit", "PronyFit", "PencilFit", "CovarianceSpectrum",
-           "PcarSpectrum", "ModeErrors"]
+           "PcarSpectrum", "ModeErrors", "Stabilization"]
 
 __version__: str = _clib.qdm_version().decode()
 
@@ -137,7 +138,7 @@ class Error(Exception):
 class ArgumentError(Error, ValueError):
     """A bad argument, refused before the fit ran; also a `ValueError`.
 
-    The library's argument codes -42401 to -42425 (empty input, an order,
+    The library's argument codes -42401 to -42427 (empty input, an order,
     count, size or sampling rate out of range, a NaN or infinite sample, a
     fit that would exceed the library's work-memory bound, ...), or, with
     `code` None, what the binding refuses itself: an input that is not 1-D,
@@ -302,6 +303,9 @@ _PRONY = (_N, _ORDER, _FS)
 _PENCIL = (_N, ("pencil", "pencil"), ("order", "modes"), _FS)
 _MDL = (_N, ("max_order", "max_order"), ("min_order", "min_order"))
 _SPECTRUM = (_N, _ORDER, ("points", "nfft"), _COMPONENTS, _FS)
+_STABILIZATION = (_N, ("pencil", "pencil"), ("min_order", "min_order"),
+                  ("max_order", "max_order"), _FS, ("freq_tol", "freq_tol"),
+                  ("damping_tol", "damping_tol"))
 
 
 # ---- arguments -----------------------------------------------------------------------
@@ -1551,3 +1555,176 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
            "mode_errors")
     sa, sp, sd, sf = out[:, :M]
     return ModeErrors(sa, sp, sd, sf, sd * args[2], variance.value)
+
+
+class Stabilization(NamedTuple):
+    """A stabilization diagram, as `stabilization` returns it.
+
+    One row per pole: the i-th value of every array field belongs to the same
+    pole. Rows run order by order from min_order up, each order's poles
+    sorted by frequency.
+
+    Attributes
+    ----------
+    order : ndarray
+        int32: the model order m of the fit the pole comes from.
+    frequency : ndarray
+        arg(z) fs / (2 pi): Hz when fs is given, else cycles per sample.
+    damping : ndarray
+        ln|z| per sample, negative for a decaying mode.
+    amplitude : ndarray
+        |A| of the pole's mode in the order-m least-squares fit, in the
+        units of x.
+    stable : ndarray
+        bool: one pole of order m - 1 lies within both tolerances.
+    stable_frequency : ndarray
+        bool: some pole of order m - 1 lies within the frequency tolerance.
+    stable_damping : ndarray
+        bool: some pole of order m - 1 lies within the damping tolerance.
+    mdl_order : int
+        The order `mdl_order` chooses for the same record with the same
+        max_order and min_order (0 when none scores below 10000).
+    """
+    order: NDArray[_np.int32]
+    frequency: NDArray[_np.float64]
+    damping: NDArray[_np.float64]
+    amplitude: NDArray[_np.float64]
+    stable: NDArray[_np.bool_]
+    stable_frequency: NDArray[_np.bool_]
+    stable_damping: NDArray[_np.bool_]
+    mdl_order: int
+
+
+def stabilization(x: "ArrayLike", *, max_order: int, min_order: int = 1,
+                  pencil: Optional[int] = None, fs: float = 1.0, real_signal: bool = False,
+                  freq_tol: float = 0.01, damping_tol: float = 0.05) -> Stabilization:
+    """Matrix-pencil poles across model orders, the stable ones marked.
+
+    Fits the matrix pencil with every order m from `min_order` to
+    `max_order`, all from one decomposition of the record (the poles of
+    order m are those of ``matrix_pencil(x, modes=m, pencil=L)``), and marks
+    each pole of order m that a pole of order m - 1 matches: in frequency
+    when |f - f'| <= freq_tol * max(|f|, fs / n), in damping when
+    |d - d'| <= damping_tol * max(|d|, 1 / n). Physical modes stand in
+    columns across the orders; noise poles wander.
+
+    Parameters
+    ----------
+    x : array_like, 1-D, n >= 1 samples
+        The record. float64 runs the real fit, complex128 the complex one;
+        other dtypes numpy casts safely to one of them are converted.
+    max_order : int, min_order < max_order <= min(pencil, n - pencil)
+        The highest order fitted.
+    min_order : int, min_order >= 1, default 1
+        The lowest order listed. Its poles are compared with those of
+        order min_order - 1 (none for order 1).
+    pencil : int or None, 1 <= pencil <= floor(2n/3), default None
+        The pencil parameter L. None takes max(n // 3, max_order), or n // 2
+        for a max_order above that.
+    fs : float, fs > 0, default 1.0
+        Sampling rate: frequencies in Hz when given.
+    real_signal : bool, default False
+        Real data only: one pole per conjugate pair (arg(z) in [0, pi)).
+    freq_tol : float, >= 0, default 0.01
+        Frequency tolerance, relative to max(|f|, fs / n): the floor fs/n,
+        the record's frequency resolution, keeps it from vanishing at 0 Hz.
+    damping_tol : float, >= 0, default 0.05
+        Damping tolerance, relative to max(|d|, 1 / n): the floor 1/n (one
+        e-fold over the record) keeps it from vanishing for undamped modes.
+
+    Returns
+    -------
+    Stabilization
+        Named tuple ``(order, frequency, damping, amplitude, stable,
+        stable_frequency, stable_damping, mdl_order)``: one row per pole,
+        order by order, each order sorted by frequency, and the MDL order.
+
+    Raises
+    ------
+    DTypeError
+        x has a dtype with no lossless conversion to float64 or complex128.
+    ArgumentError
+        x is not 1-D or real_signal with complex data (code None); x is
+        empty (-42401); pencil below 1 or above floor(2n/3) (-42411);
+        min_order < 1 (-42414); max_order not above min_order or above
+        min(pencil, n - pencil) (-42415); fs not positive (-42418); a
+        negative tolerance (-42426); a NaN or infinite sample, fs or
+        tolerance (-42419); the fits would exceed the library's work-memory
+        bound (-42420).
+    TypeError
+        max_order, min_order or pencil is not an integer.
+    NonFiniteResultError
+        A pole or amplitude would be NaN or infinite (-30001): a degenerate
+        record, such as a single spike (a pole at 0).
+    NumericError
+        Another numeric failure (LAPACK, extreme values).
+    OutOfMemoryError
+        The library could not allocate its work memory (-20001).
+
+    Warns
+    -----
+    RankDeficientWarning
+        A least-squares system in a fit was rank deficient.
+
+    See Also
+    --------
+    matrix_pencil : the fit of one order.
+    mdl_order : one order by the minimum description length.
+
+    Examples
+    --------
+    >>> import numpy as np, qdm
+    >>> t = np.arange(128)
+    >>> x = (np.exp((-0.01 + 0.2j * np.pi) * t)
+    ...      + 0.7 * np.exp((-0.02 + 0.6j * np.pi) * t)
+    ...      + 0.5 * np.exp((-0.005 - 0.5j * np.pi) * t))
+    >>> d = qdm.stabilization(x + 1e-3 * np.cos(0.9 * t ** 1.5), max_order=8)
+    >>> d.mdl_order
+    3
+    >>> top = d.order == 8                   # rows of one order, by frequency
+    >>> print(d.frequency[top].round(3))
+    [-0.329 -0.25  -0.142 -0.093  0.1    0.141  0.207  0.3  ]
+    >>> print(d.stable[top])
+    [False  True False False  True False False  True]
+    >>> print(d.amplitude[top & d.stable].round(2))
+    [0.5 1.  0.7]
+    """
+    a, c = _signal(x, "stabilization")
+    n = a.shape[0]
+    upper = _int(max_order, "max_order", "stabilization")
+    lower = _int(min_order, "min_order", "stabilization")
+    L = max(n // 3, min(upper, n // 2)) if pencil is None else _int(pencil, "pencil",
+                                                                    "stabilization")
+    # An order above n/2 is refused before the table is touched: no room for it.
+    room = max(int(_clib.qdm_stabilization_rows(lower, min(upper, n // 2))), 1)
+    table = _np.zeros((3, room))
+    ints = _np.zeros((2, room), dtype=_np.int32)
+    rows, mdl = _ct.c_int64(), _ct.c_int32()
+    ff = _fs(fs, "stabilization")
+    args: tuple = (_addr(a), n, L, lower, upper, ff)
+    if not c:
+        args += (_real_flag(real_signal, c, "stabilization"),)
+    else:
+        _real_flag(real_signal, c, "stabilization")
+    args += (_tolerance(freq_tol, "freq_tol"), _tolerance(damping_tol, "damping_tol"), room,
+             _addr(ints[0]), _addr(table[0]), _addr(table[1]), _addr(table[2]), _addr(ints[1]),
+             _ct.byref(rows), _ct.byref(mdl))
+    _check(_fn["stabilization", _kind(c)](*args), "stabilization", _STABILIZATION, None,
+           pencil, min_order, max_order)
+    k = rows.value
+    order, flags = ints[0, :k], ints[1, :k]
+    frequency, damping, amplitude = table[:, :k]
+    i = _np.lexsort((frequency, order))
+    flags = flags[i]
+    return Stabilization(order[i], frequency[i], damping[i], amplitude[i], (flags & 4) != 0,
+                         (flags & 1) != 0, (flags & 2) != 0, mdl.value)
+
+
+def _tolerance(v, name):
+    """A tolerance as a float; anything float() refuses is a TypeError naming it."""
+    if not isinstance(v, (str, bytes)):
+        try:
+            return float(v)
+        except (TypeError, ValueError):
+            pass
+    raise TypeError(f"stabilization: {name} must be a real number, not {v!r}")

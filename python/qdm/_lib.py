@@ -62,6 +62,9 @@ _SIGNATURES: dict = {
     "mode_errors": [_D, "R", _I, _P, _P, _P, _P, _P, _P, _P, _P, _P],
     # (coefficients, order) in place of (x, n); both twins take the one-sided flag
     "ar_psd": [_D, _I, _D, _I, _P, _P, _P, _P],
+    # (pencil, min_order, max_order, fs, R, freq_tol, damping_tol, room, the five
+    # columns, rows, mdl_order)
+    "stabilization": [_I, _I, _I, _D, "R", _D, _D, ctypes.c_int64, _P, _P, _P, _P, _P, _P, _P],
 }
 
 functions = {}
@@ -79,6 +82,8 @@ lib.qdm_spectrum_length.restype = _I
 lib.qdm_spectrum_length.argtypes = [_I]
 lib.qdm_output_room.restype = _I
 lib.qdm_output_room.argtypes = [_I, _I]
+lib.qdm_stabilization_rows.restype = ctypes.c_int64
+lib.qdm_stabilization_rows.argtypes = [_I, _I]
 lib.qdm_default_pencil.restype = _I
 lib.qdm_default_pencil.argtypes = [_I]
 lib.qdm_spectrum_layout.restype = _I

@@ -13,9 +13,10 @@ import pytest
 import qdm
 
 FUNCTIONS = [qdm.covariance, qdm.pcar, qdm.prony, qdm.matrix_pencil, qdm.mdl_order,
-             qdm.covariance_psd, qdm.pcar_psd, qdm.mode_errors, qdm.status_text]
+             qdm.covariance_psd, qdm.pcar_psd, qdm.mode_errors, qdm.stabilization,
+             qdm.status_text]
 RESULTS = [qdm.CovarianceFit, qdm.PcarFit, qdm.PronyFit, qdm.PencilFit,
-           qdm.CovarianceSpectrum, qdm.PcarSpectrum, qdm.ModeErrors]
+           qdm.CovarianceSpectrum, qdm.PcarSpectrum, qdm.ModeErrors, qdm.Stabilization]
 SECTIONS = ["Parameters", "Returns", "Raises", "Examples"]
 
 

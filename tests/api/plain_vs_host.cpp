@@ -169,7 +169,7 @@ TEST(PlainApi, EveryDocumentedStatusHasItsOwnText) {
                                         -42415, -42416, -42417, -42418, -20001, -20003, -20004,
                                         -20061, -20062, -20063, -20068, -20116, -20999, -1,
                                         -42419, -42420, -42421, -42422, -42423, -30001, -20070,
-                                        20002,  -42424, -42425};
+                                        20002,  -42424, -42425, -42426, -42427};
   std::set<int32_t> table;
 #define QDM_TEST_STATUS(name, code, text) table.insert(code);
   QDM_STATUS_TABLE(QDM_TEST_STATUS)

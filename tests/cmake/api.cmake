@@ -46,3 +46,17 @@ if(TARGET qdm_api)
   gtest_discover_tests(api_mode_errors DISCOVERY_MODE PRE_TEST TEST_PREFIX "api."
                        DISCOVERY_TIMEOUT 120)
 endif()
+
+# The stabilization diagram on the plain face, linked from the core objects
+# (the test reaches the allocation and LAPACK fault hooks).
+if(TARGET qdm_api)
+  add_executable(api_stabilization ${CMAKE_SOURCE_DIR}/tests/api/plain_stabilization.cpp
+                 $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})
+  target_include_directories(api_stabilization PRIVATE ${CMAKE_SOURCE_DIR}
+                             ${CMAKE_SOURCE_DIR}/include ${QDM_GENERATED_INCLUDE})
+  target_compile_definitions(api_stabilization PRIVATE QDM_BUILDING_API)
+  target_link_libraries(api_stabilization PRIVATE ${QDM_LINALG_LIBS} GTest::gtest_main
+                        Threads::Threads ${CMAKE_DL_LIBS})
+  gtest_discover_tests(api_stabilization DISCOVERY_MODE PRE_TEST TEST_PREFIX "api."
+                       DISCOVERY_TIMEOUT 120)
+endif()

@@ -231,13 +231,27 @@ plot)
     for quote in "'" '"'; do
       name="x$quote"$'\nsystem "touch PWNED"\nprint '"$quote"'.csv'
       cp "$data" "$name"
-      for method in pencil covspectrum covariance; do
+      for method in pencil covspectrum covariance stabilization; do
         expect 0 $method "$name" --plot "b$quote.png"
         [ ! -e PWNED ] || fail "gnuplot ran a command from the input's name"
         [ "$(head -c 4 "b$quote.png" | tail -c 3)" = PNG ] || fail "no PNG for a hostile name"
       done
     done
     expect 0 pcarspectrum --example --real-signal --plot spectrum.png
+    # The diagram: JSON of one row per pole and the MDL order, and its picture.
+    expect 0 stabilization --example --real-signal --max-order 14 --json --plot diagram.png
+    python3 -c 'import json, sys
+r = json.load(open(sys.argv[1]))["results"]; d = r["diagram"]
+assert set(d) == {"order", "frequency_hz", "damping_per_sample", "damping_per_s", "amplitude",
+                  "flags", "stable"}, d.keys()
+assert len({len(c) for c in d.values()}) == 1 and len(d["order"]) == r["pole_count"]
+assert d["order"][0] == 1 and d["order"][-1] == 14 and d["order"] == sorted(d["order"])
+assert all(s == (f >> 2) & 1 for s, f in zip(d["stable"], d["flags"]))
+assert 0 < r["stable_count"] == sum(d["stable"]) and 1 <= r["mdl_order"] <= 14' out \
+      || fail "stabilization JSON: $(head -c 300 out)"
+    [ "$(head -c 4 diagram.png | tail -c 3)" = PNG ] || fail "no diagram drawn"
+    expect 1 stabilization --example --max-order 14 --freq-tol -1
+    grep -q 'freq_tol -1 is below 0' err || fail "tolerance refusal: $(cat err)"
     [ "$(head -c 4 spectrum.png | tail -c 3)" = PNG ] || fail "no PNG drawn"
     expect 3 covariance --example --plot "$work/no_such_dir/x.png"
     expect 3 pencil --example --plot /dev/full
