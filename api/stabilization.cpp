@@ -71,10 +71,14 @@ int32_t Run(const T* x, int32_t n, const StabilizationSpec& spec, StabilizationT
       checks::Stabilization(n, spec.L, spec.minOrder, spec.maxOrder, spec.fs, spec.freqTol,
                             spec.dampingTol, table.room, checks::Bound::kWide, last_error::Begin());
   if (check != status::kOk) return last_error::End(PublicCode(check));
-  const std::pair<const void*, const char*> required[] = {
-      {x, "x"},         {table.order, "order"},         {table.frequency, "frequency"},
-      {table.damping, "damping"}, {table.amplitude, "amplitude"}, {table.flags, "flags"},
-      {rows, "rows"},   {mdl, "mdl_order"}};
+  const std::pair<const void*, const char*> required[] = {{x, "x"},
+                                                          {table.order, "order"},
+                                                          {table.frequency, "frequency"},
+                                                          {table.damping, "damping"},
+                                                          {table.amplitude, "amplitude"},
+                                                          {table.flags, "flags"},
+                                                          {rows, "rows"},
+                                                          {mdl, "mdl_order"}};
   for (const auto& [pointer, name] : required) {
     if (pointer == nullptr) return last_error::Null(name);
   }
@@ -148,9 +152,8 @@ QDM_PLAIN_API int32_t qdm_stabilization_real(const double* x, int32_t n, int32_t
                                              int32_t min_order, int32_t max_order, double fs,
                                              int32_t real_signal, double freq_tol,
                                              double damping_tol, int64_t room, int32_t* order,
-                                             double* frequency, double* damping,
-                                             double* amplitude, int32_t* flags, int64_t* rows,
-                                             int32_t* mdl_order) {
+                                             double* frequency, double* damping, double* amplitude,
+                                             int32_t* flags, int64_t* rows, int32_t* mdl_order) {
   return Run(x, n,
              {pencil, min_order, max_order, fs, real_signal != 0 ? 1 : 0, freq_tol, damping_tol},
              {order, frequency, damping, amplitude, flags, room, 0}, rows, mdl_order);
@@ -159,9 +162,8 @@ QDM_PLAIN_API int32_t qdm_stabilization_real(const double* x, int32_t n, int32_t
 QDM_PLAIN_API int32_t qdm_stabilization_complex(const qdm_complex* x, int32_t n, int32_t pencil,
                                                 int32_t min_order, int32_t max_order, double fs,
                                                 double freq_tol, double damping_tol, int64_t room,
-                                                int32_t* order, double* frequency,
-                                                double* damping, double* amplitude,
-                                                int32_t* flags, int64_t* rows,
+                                                int32_t* order, double* frequency, double* damping,
+                                                double* amplitude, int32_t* flags, int64_t* rows,
                                                 int32_t* mdl_order) {
   return Run(reinterpret_cast<const Complex*>(x), n,
              {pencil, min_order, max_order, fs, 0, freq_tol, damping_tol},

@@ -34,7 +34,16 @@ using Json = nlohmann::ordered_json;
 constexpr auto kReplace = Json::error_handler_t::replace;  // invalid UTF-8 becomes U+FFFD
 constexpr double kPi = 3.14159265358979323846;
 
-enum Method { kCovariance, kProny, kPcar, kPencil, kMdl, kCovSpectrum, kPcarSpectrum, kStabilization };
+enum Method {
+  kCovariance,
+  kProny,
+  kPcar,
+  kPencil,
+  kMdl,
+  kCovSpectrum,
+  kPcarSpectrum,
+  kStabilization
+};
 constexpr unsigned Bit(Method m) { return 1u << m; }
 constexpr unsigned kSpectra = Bit(kCovSpectrum) | Bit(kPcarSpectrum);
 constexpr unsigned kModal = Bit(kProny) | Bit(kPencil) | Bit(kPcarSpectrum);
@@ -48,7 +57,8 @@ constexpr const char* kMethods[][2] = {
     {"mdl", "minimum description length model order"},
     {"covspectrum", "covariance-method AR power spectrum"},
     {"pcarspectrum", "principal-component AR power spectrum and its modes"},
-    {"stabilization", "stabilization diagram: pencil poles across model orders, stable ones marked"},
+    {"stabilization",
+     "stabilization diagram: pencil poles across model orders, stable ones marked"},
 };
 
 // Everything the command line sets; unset parameters take the method's default.
@@ -254,8 +264,8 @@ void Stabilize(const Signal& s, double rate, int32_t flag, int32_t L, int32_t mi
                                               room, order.data(), freq.data(), damping.data(),
                                               amp.data(), flags.data(), &rows, &mdl)
                   : qdm_stabilization_real(re, n, L, minOrder, maxOrder, rate, flag, freqTol,
-                                           dampTol, room, order.data(), freq.data(),
-                                           damping.data(), amp.data(), flags.data(), &rows, &mdl),
+                                           dampTol, room, order.data(), freq.data(), damping.data(),
+                                           amp.data(), flags.data(), &rows, &mdl),
         "qdm_stabilization", s.complex, r);
   // Rows by order, then frequency.
   std::vector<size_t> by(static_cast<size_t>(rows));
@@ -298,8 +308,8 @@ void Stabilize(const Signal& s, double rate, int32_t flag, int32_t L, int32_t mi
   auto axis = SpectrumOutput(length), db = SpectrumOutput(length);
   int32_t laid = 0;
   const int32_t drawn =
-      s.complex ? qdm_ar_psd_complex(reinterpret_cast<const qdm_complex*>(a.data()), p, 0.0,
-                                     points, rate, 0, axis.get(), db.get(), nullptr, &laid)
+      s.complex ? qdm_ar_psd_complex(reinterpret_cast<const qdm_complex*>(a.data()), p, 0.0, points,
+                                     rate, 0, axis.get(), db.get(), nullptr, &laid)
                 : qdm_ar_psd_real(a.data(), p, 0.0, points, rate, oneSided, axis.get(), db.get(),
                                   nullptr, &laid);
   if (drawn != QDM_OK) return;
@@ -733,9 +743,9 @@ bool PlotDiagram(const std::string& png, const Record& r, std::vector<PlotFile> 
   const int32_t mdl = res["mdl_order"].get<int32_t>();
   files.push_back({"frame.csv", [=](std::FILE* f) {
                      Writer(f) << "x0,x1,y0,y1,mdl,label\n"
-                               << Exact(x0) << "," << Exact(x1) << "," << Exact(bottom - 0.7)
-                               << "," << Exact(top + 0.7) << "," << std::to_string(mdl)
-                               << ",MDL order " << std::to_string(mdl) << "\n";
+                               << Exact(x0) << "," << Exact(x1) << "," << Exact(bottom - 0.7) << ","
+                               << Exact(top + 0.7) << "," << std::to_string(mdl) << ",MDL order "
+                               << std::to_string(mdl) << "\n";
                    }});
   const bool backdrop = r.spectrum && r.spectrumLength > 1;
   if (backdrop) {
@@ -762,8 +772,9 @@ bool PlotDiagram(const std::string& png, const Record& r, std::vector<PlotFile> 
         "set y2range [-100<*:10]\n";
   script += terminal + "plot ";
   if (backdrop)
-    script += "'spectrum.csv' using 1:2 axes x1y2 with lines lw 1.5 lc rgb '#b8b8b8' "
-              "title 'AR spectrum', ";
+    script +=
+        "'spectrum.csv' using 1:2 axes x1y2 with lines lw 1.5 lc rgb '#b8b8b8' "
+        "title 'AR spectrum', ";
   script +=
       "'data.csv' using ((int($6) & 4) ? NaN : $2):1 with points pt 6 ps 0.7 "
       "lc rgb '#c0392b' title 'not stable', "
@@ -772,7 +783,8 @@ bool PlotDiagram(const std::string& png, const Record& r, std::vector<PlotFile> 
   if (mdl > 0)
     script +=
         ", 'frame.csv' using 1:5:($2 - $1):(0) with vectors nohead dt 2 lw 2 "
-        "lc rgb '#27ae60' title 'MDL order', 'frame.csv' using ($1 + 0.01 * ($2 - $1)):($5 + 0.35):6 "
+        "lc rgb '#27ae60' title 'MDL order', 'frame.csv' using ($1 + 0.01 * ($2 - $1)):($5 + "
+        "0.35):6 "
         "with labels left tc rgb '#27ae60' notitle";
   return RunGnuplot(script + "\n", files, png);
 }

@@ -644,15 +644,13 @@ QDM_PLAIN_API int32_t qdm_stabilization_real(const double* x, int32_t n, int32_t
                                              int32_t min_order, int32_t max_order, double fs,
                                              int32_t real_signal, double freq_tol,
                                              double damping_tol, int64_t room, int32_t* order,
-                                             double* frequency, double* damping,
-                                             double* amplitude, int32_t* flags, int64_t* rows,
-                                             int32_t* mdl_order);
+                                             double* frequency, double* damping, double* amplitude,
+                                             int32_t* flags, int64_t* rows, int32_t* mdl_order);
 QDM_PLAIN_API int32_t qdm_stabilization_complex(const qdm_complex* x, int32_t n, int32_t pencil,
                                                 int32_t min_order, int32_t max_order, double fs,
                                                 double freq_tol, double damping_tol, int64_t room,
-                                                int32_t* order, double* frequency,
-                                                double* damping, double* amplitude,
-                                                int32_t* flags, int64_t* rows,
+                                                int32_t* order, double* frequency, double* damping,
+                                                double* amplitude, int32_t* flags, int64_t* rows,
                                                 int32_t* mdl_order);
 /** @} */
 

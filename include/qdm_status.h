@@ -6,9 +6,10 @@
  * complete and valid); 20002 the error bars' warning (NaN errors for the
  * modes whose bound is singular, every other value complete). Codes from
  * -42401 down to -42427 are argument errors, -424xx in the host's numbering;
- * the plain face writes nothing when it returns one. -30001 is the plain face's screen of its own results: a fit ran, but a
- * number it was about to hand back is NaN or infinite. The other negative
- * codes are numeric and FFT failures. The host face also returns -42400 - e
+ * the plain face writes nothing when it returns one. -30001 is the plain
+ * face's screen of its own results: a fit ran, but a number it was about to
+ * hand back is NaN or infinite. The other negative codes are numeric and FFT
+ * failures. The host face also returns -42400 - e
  * when the host's NumericArrayResize fails with its own error e. */
 #ifndef QDM_STATUS_H
 #define QDM_STATUS_H
@@ -45,7 +46,7 @@
     "too few samples for the modes' error bars: n must exceed the real parameters (real "      \
     "data) or twice the modes (complex data)")                                                 \
   X(QDM_ERR_MODE_VALUES, -42425,                                                               \
-    "a mode value is NaN or infinite, or a mode of real data (real_signal zero) has no "      \
+    "a mode value is NaN or infinite, or a mode of real data (real_signal zero) has no "       \
     "conjugate partner")                                                                       \
   X(QDM_ERR_TOLERANCE, -42426, "a stabilization tolerance (frequency or damping) is negative") \
   X(QDM_ERR_ROOM, -42427,                                                                      \

@@ -97,14 +97,13 @@ void Fit(Call& c) {
   int32_t* mdl = c.nullMdl ? nullptr : &c.mdl;
   if (c.complex) {
     c.status = qdm_stabilization_complex(reinterpret_cast<const qdm_complex*>(x), c.n, c.pencil,
-                                         c.min_order, c.max_order, c.fs, c.freq_tol,
-                                         c.damping_tol, c.room, order, c.frequency.data(),
-                                         c.damping.data(), c.amplitude.data(), flags, rows, mdl);
+                                         c.min_order, c.max_order, c.fs, c.freq_tol, c.damping_tol,
+                                         c.room, order, c.frequency.data(), c.damping.data(),
+                                         c.amplitude.data(), flags, rows, mdl);
   } else {
-    c.status = qdm_stabilization_real(x, c.n, c.pencil, c.min_order, c.max_order, c.fs,
-                                      c.real_signal, c.freq_tol, c.damping_tol, c.room, order,
-                                      c.frequency.data(), c.damping.data(), c.amplitude.data(),
-                                      flags, rows, mdl);
+    c.status = qdm_stabilization_real(
+        x, c.n, c.pencil, c.min_order, c.max_order, c.fs, c.real_signal, c.freq_tol, c.damping_tol,
+        c.room, order, c.frequency.data(), c.damping.data(), c.amplitude.data(), flags, rows, mdl);
   }
 }
 
@@ -118,8 +117,12 @@ TEST(PlainStabilization, RowsFormula) {
   struct Case {
     int32_t lo, hi;
     int64_t rows;
-  } cases[] = {{1, 1, 1},  {1, 4, 10}, {3, 5, 12}, {0, 4, 0},
-               {5, 4, 0},  {1, 65536, int64_t{65536} * 65537 / 2},
+  } cases[] = {{1, 1, 1},
+               {1, 4, 10},
+               {3, 5, 12},
+               {0, 4, 0},
+               {5, 4, 0},
+               {1, 65536, int64_t{65536} * 65537 / 2},
                {2147483647, 2147483647, 2147483647}};
   for (const Case& k : cases) EXPECT_EQ(qdm_stabilization_rows(k.lo, k.hi), k.rows) << k.lo;
 }
@@ -147,9 +150,9 @@ TEST(PlainStabilization, ThreeModesStandInStableColumns) {
       }
     }
     int32_t mdl = -1;
-    ASSERT_EQ(qdm_mdl_order_complex(reinterpret_cast<const qdm_complex*>(c.x.data()), c.n, 14, 1,
-                                    &mdl),
-              QDM_OK);
+    ASSERT_EQ(
+        qdm_mdl_order_complex(reinterpret_cast<const qdm_complex*>(c.x.data()), c.n, 14, 1, &mdl),
+        QDM_OK);
     EXPECT_EQ(c.mdl, mdl);
   }
 }
@@ -160,8 +163,8 @@ TEST(PlainStabilization, EachOrderIsThePencilFitOfThatOrder) {
   struct Case {
     bool complex;
     int32_t real_signal, pencil, lo, hi;
-  } cases[] = {{true, 0, 85, 1, 10}, {true, 0, 120, 3, 12}, {false, 0, 85, 2, 9},
-               {false, 1, 100, 1, 10}};
+  } cases[] = {
+      {true, 0, 85, 1, 10}, {true, 0, 120, 3, 12}, {false, 0, 85, 2, 9}, {false, 1, 100, 1, 10}};
   for (const Case& k : cases) {
     Call c = Valid(k.complex, 256, 9);
     c.real_signal = k.real_signal;
@@ -177,13 +180,13 @@ TEST(PlainStabilization, EachOrderIsThePencilFitOfThatOrder) {
       int32_t modes = 0;
       double mse = 0.0;
       const int32_t s =
-          k.complex ? qdm_matrix_pencil_solver_complex(
-                          reinterpret_cast<const qdm_complex*>(c.x.data()), c.n, k.pencil, m, 1.0,
-                          QDM_SOLVER_DENSE, amp.data(), ph.data(), dm.data(), fr.data(), &modes,
-                          &mse)
-                    : qdm_matrix_pencil_solver_real(c.x.data(), c.n, k.pencil, m, 1.0,
-                                                    k.real_signal, QDM_SOLVER_DENSE, amp.data(),
-                                                    ph.data(), dm.data(), fr.data(), &modes, &mse);
+          k.complex
+              ? qdm_matrix_pencil_solver_complex(
+                    reinterpret_cast<const qdm_complex*>(c.x.data()), c.n, k.pencil, m, 1.0,
+                    QDM_SOLVER_DENSE, amp.data(), ph.data(), dm.data(), fr.data(), &modes, &mse)
+              : qdm_matrix_pencil_solver_real(c.x.data(), c.n, k.pencil, m, 1.0, k.real_signal,
+                                              QDM_SOLVER_DENSE, amp.data(), ph.data(), dm.data(),
+                                              fr.data(), &modes, &mse);
       ASSERT_EQ(s, QDM_OK);
       int32_t rowsOfM = 0;
       for (int64_t i = 0; i < c.rows; ++i) {
@@ -333,7 +336,8 @@ TEST(PlainStabilization, ExtremeRecordsScaleExactly) {
     ASSERT_EQ(c.status, QDM_OK);
     EXPECT_EQ(c.frequency, base.frequency);
     EXPECT_EQ(c.flags, base.flags);
-    for (size_t i = 0; i < c.amplitude.size(); ++i) EXPECT_EQ(c.amplitude[i], base.amplitude[i] * f);
+    for (size_t i = 0; i < c.amplitude.size(); ++i)
+      EXPECT_EQ(c.amplitude[i], base.amplitude[i] * f);
   }
 }
 
