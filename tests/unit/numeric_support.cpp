@@ -11,6 +11,7 @@
 #include <functional>
 #include <numbers>
 #include <random>
+#include <utility>
 #include <vector>
 
 #include "numeric/lapack_boundary.h"
@@ -816,3 +817,24 @@ TEST(Scalars, SqrtDividePolarAndTheFinitenessScreen) {
 }
 
 }  // namespace
+
+// rcond = 0 leaves DGELSD its own cut at machine epsilon; a negative rcond
+// cuts at epsilon times max(m, n). On diag(1, 4e-16), between the two, the
+// second component of the solution is 2.5e15 or 0, for a system solved
+// directly and for a tall one reduced by QR first.
+TEST(LeastSquares, ZeroRcondKeepsWhatTheDefaultCuts) {
+  for (const int32_t rows : {2, 3, 40}) {
+    std::vector<double> A(static_cast<size_t>(rows) * 2, 0.0), b(static_cast<size_t>(rows), 0.0);
+    A[0] = 1.0;
+    A[3] = 4e-16;
+    b[0] = 1.0;
+    b[1] = 1.0;
+    for (const auto& [rcond, second] : {std::pair{0.0, 2.5e15}, std::pair{-1.0, 0.0}}) {
+      double x[2] = {-7.0, -7.0};
+      const StatusCode st = LeastSquaresReal(A.data(), rows, 2, b.data(), 1, x, rcond);
+      EXPECT_EQ(st, rcond == 0.0 ? status::kOk : status::kRankDeficient) << rows;
+      EXPECT_DOUBLE_EQ(x[0], 1.0) << rows;
+      EXPECT_NEAR(x[1], second, 1e-6 * std::max(second, 1.0)) << rows << " rcond " << rcond;
+    }
+  }
+}
