@@ -12,6 +12,7 @@ std::atomic<int64_t> g_fail_at{0};
 std::atomic<bool> g_fail_persistent{false};
 std::atomic<int64_t> g_attempts{0};
 std::atomic<int64_t> g_outstanding{0};
+std::atomic<int64_t> g_guards_broken{0};
 
 // Every block is guarded on both sides by bytes the library never uses,
 // because optimized BLAS kernels read outside the operands they are given.
@@ -87,8 +88,22 @@ Header HeaderOf(const void* block) {
   return h;
 }
 
+// True when nothing wrote to either guard: kernels may read the zeroed guards,
+// never write them.
+bool GuardsIntact(const unsigned char* block, const Header& h) {
+  const unsigned char* front = block - h.front;
+  unsigned char any = 0;
+  for (size_t i = 0; i + sizeof(Header) < h.front; ++i) any |= front[i];
+  for (size_t i = 0; i < h.front; ++i) any |= block[h.bytes + i];
+  return any == 0;
+}
+
 void GuardedFree(void* block) {
-  std::free(static_cast<unsigned char*>(block) - HeaderOf(block).front);
+  const Header h = HeaderOf(block);
+  if (!GuardsIntact(static_cast<const unsigned char*>(block), h)) {
+    g_guards_broken.fetch_add(1, std::memory_order_relaxed);
+  }
+  std::free(static_cast<unsigned char*>(block) - h.front);
 }
 }  // namespace
 
@@ -119,3 +134,5 @@ void NumAllocFailAt(int64_t k, bool persistent) {
 
 int64_t NumAllocAttempts() { return g_attempts.load(std::memory_order_relaxed); }
 int64_t NumAllocOutstanding() { return g_outstanding.load(std::memory_order_relaxed); }
+
+int64_t NumGuardsBroken() { return g_guards_broken.load(std::memory_order_relaxed); }

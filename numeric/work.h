@@ -24,6 +24,9 @@ void NumAllocFailAt(int64_t k, bool persistent);
 int64_t NumAllocAttempts();
 // Blocks currently allocated and not yet released.
 int64_t NumAllocOutstanding();
+// Blocks released so far whose guards something had written to: a write
+// outside its block, which no routine may make. Tests check it stays 0.
+int64_t NumGuardsBroken();
 
 // ---- RAII holder -------------------------------------------------------------
 struct NumFreeDeleter {

@@ -2,6 +2,7 @@
 # hook), against the built libqdm loaded as the host loads it.
 if(TARGET qdm_api)
   add_executable(api_plain_vs_host ${CMAKE_SOURCE_DIR}/tests/api/plain_vs_host.cpp
+                 ${CMAKE_SOURCE_DIR}/tests/support/guard_check.cpp
                  ${CMAKE_SOURCE_DIR}/tests/api/plain_records.cpp
                  ${CMAKE_SOURCE_DIR}/tests/api/plain_krylov.cpp
                  ${CMAKE_SOURCE_DIR}/tests/api/plain_messages.cpp
@@ -23,6 +24,7 @@ endif()
 # ThreadSanitizer run).
 if(TARGET qdm_api)
   add_executable(api_plain_threads ${CMAKE_SOURCE_DIR}/tests/api/plain_threads.cpp
+                 ${CMAKE_SOURCE_DIR}/tests/support/guard_check.cpp
                  $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})
   target_include_directories(api_plain_threads PRIVATE ${CMAKE_SOURCE_DIR}
                              ${CMAKE_SOURCE_DIR}/include ${QDM_GENERATED_INCLUDE})
@@ -37,6 +39,7 @@ endif()
 # test reaches the allocation and LAPACK fault hooks).
 if(TARGET qdm_api)
   add_executable(api_mode_errors ${CMAKE_SOURCE_DIR}/tests/api/plain_mode_errors.cpp
+                 ${CMAKE_SOURCE_DIR}/tests/support/guard_check.cpp
                  $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})
   target_include_directories(api_mode_errors PRIVATE ${CMAKE_SOURCE_DIR}
                              ${CMAKE_SOURCE_DIR}/include ${QDM_GENERATED_INCLUDE})
@@ -51,6 +54,7 @@ endif()
 # (the test reaches the allocation and LAPACK fault hooks).
 if(TARGET qdm_api)
   add_executable(api_stabilization ${CMAKE_SOURCE_DIR}/tests/api/plain_stabilization.cpp
+                 ${CMAKE_SOURCE_DIR}/tests/support/guard_check.cpp
                  $<TARGET_OBJECTS:qdm_core> ${QDM_API_SOURCES})
   target_include_directories(api_stabilization PRIVATE ${CMAKE_SOURCE_DIR}
                              ${CMAKE_SOURCE_DIR}/include ${QDM_GENERATED_INCLUDE})
