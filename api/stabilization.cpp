@@ -64,12 +64,12 @@ bool Screen(StabilizationTable* t, int scale) {
 }
 
 template <typename T>
-int32_t Run(const T* x, int32_t n, const StabilizationSpec& spec, StabilizationTable table,
+int32_t Run(const T* x, int32_t n, const StabilizationRange& range, StabilizationTable table,
             int64_t* rows, int32_t* mdl) {
   constexpr bool cx = kIsComplex<T>;
-  const StatusCode check =
-      checks::Stabilization(n, spec.L, spec.minOrder, spec.maxOrder, spec.fs, spec.freqTol,
-                            spec.dampingTol, table.room, checks::Bound::kWide, last_error::Begin());
+  const StatusCode check = checks::Stabilization(
+      n, range.L, range.minOrder, range.maxOrder, range.fs, range.freqTol, range.dampingTol,
+      table.room, checks::Bound::kWide, last_error::Begin());
   if (check != status::kOk) return last_error::End(PublicCode(check));
   const std::pair<const void*, const char*> required[] = {{x, "x"},
                                                           {table.order, "order"},
@@ -82,15 +82,15 @@ int32_t Run(const T* x, int32_t n, const StabilizationSpec& spec, StabilizationT
   for (const auto& [pointer, name] : required) {
     if (pointer == nullptr) return last_error::Null(name);
   }
-  const double work = Work(n, spec.L, spec.maxOrder, cx);
+  const double work = Work(n, range.L, range.maxOrder, cx);
   if (work > static_cast<double>(QDM_MAX_WORK_BYTES)) return last_error::WorkLimit(work, n);
   const size_t values = static_cast<size_t>(n) * (cx ? 2 : 1);
   const double* v = reinterpret_cast<const double*>(x);
   const double extent = plain::Extent(v, int64_t(values));
   if (extent < 0.0) return last_error::NotFiniteSample(v, int64_t(values), cx);
-  if (!Finite(spec.fs)) return last_error::NotFinite("fs", spec.fs);
-  if (!Finite(spec.freqTol)) return last_error::NotFinite("freq_tol", spec.freqTol);
-  if (!Finite(spec.dampingTol)) return last_error::NotFinite("damping_tol", spec.dampingTol);
+  if (!Finite(range.fs)) return last_error::NotFinite("fs", range.fs);
+  if (!Finite(range.freqTol)) return last_error::NotFinite("freq_tol", range.freqTol);
+  if (!Finite(range.dampingTol)) return last_error::NotFinite("damping_tol", range.dampingTol);
 
   const int scale = plain::RecordScale(extent);
   WorkArray<double> copy;
@@ -108,9 +108,9 @@ int32_t Run(const T* x, int32_t n, const StabilizationSpec& spec, StabilizationT
   if (s == status::kOk) {
     call_record::Begin();
     if constexpr (cx) {
-      s = StabilizationComplex(xs, n, spec, &table);
+      s = StabilizationComplex(xs, n, range, &table);
     } else {
-      s = StabilizationReal(xs, n, spec, &table);
+      s = StabilizationReal(xs, n, range, &table);
     }
     const StatusCode absorbed = call_record::End();
     if (s == status::kOk || s == status::kRankDeficient) s = MergeStatus(s, absorbed);
@@ -123,10 +123,10 @@ int32_t Run(const T* x, int32_t n, const StabilizationSpec& spec, StabilizationT
     int32_t chosen = 0;
     int32_t searched = 0;
     if constexpr (cx) {
-      searched = qdm_mdl_order_complex(reinterpret_cast<const qdm_complex*>(x), n, spec.maxOrder,
-                                       spec.minOrder, &chosen);
+      searched = qdm_mdl_order_complex(reinterpret_cast<const qdm_complex*>(x), n, range.maxOrder,
+                                       range.minOrder, &chosen);
     } else {
-      searched = qdm_mdl_order_real(x, n, spec.maxOrder, spec.minOrder, &chosen);
+      searched = qdm_mdl_order_real(x, n, range.maxOrder, range.minOrder, &chosen);
     }
     *mdl = chosen;
     // Public codes are the internal ones but for the argument codes, which

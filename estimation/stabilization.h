@@ -39,7 +39,7 @@ struct StabilizationTable {
   int64_t rows;
 };
 
-struct StabilizationSpec {
+struct StabilizationRange {
   int32_t L;  // pencil parameter
   int32_t minOrder;
   int32_t maxOrder;  // <= min(L, n - L)
@@ -56,8 +56,8 @@ int64_t StabilizationRows(int32_t minOrder, int32_t maxOrder);
 // Statuses: kNoMemory and the LAPACK failures of the decomposition and the
 // eigensolver.
 [[nodiscard]] StatusCode StabilizationReal(const double* x, int32_t n,
-                                           const StabilizationSpec& spec,
+                                           const StabilizationRange& range,
                                            StabilizationTable* table);
 [[nodiscard]] StatusCode StabilizationComplex(const Complex* x, int32_t n,
-                                              const StabilizationSpec& spec,
+                                              const StabilizationRange& range,
                                               StabilizationTable* table);

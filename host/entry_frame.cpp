@@ -28,7 +28,7 @@ size_t ElementBytes(int32_t typeCode) { return DoublesPerElement(typeCode) * siz
 
 // Steps 4 and 5: aligned copies, the estimator, results into the host blocks.
 // `handles` are the output handles as the resizes left them.
-StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* handles,
+StatusCode EstimateAndCopyOut(const EntryPlan& entry, const QdmArrayHandle* handles,
                               EstimatorCall estimate) {
   const size_t n = entry.n < 0 ? 0 : static_cast<size_t>(entry.n);
   WorkArray<double> input = AllocWork<double>(n * DoublesPerElement(entry.inputType));
@@ -89,7 +89,7 @@ StatusCode EstimateAndCopyOut(const EntrySpec& entry, const QdmArrayHandle* hand
 
 }  // namespace
 
-int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate) {
+int32_t RunEntry(const EntryPlan& entry, EstimatorCall estimate) {
   // A resize may replace a null handle, as the host function does with any
   // handle passed by address; later steps use what it left.
   QdmArrayHandle handles[kMaxOutputs] = {};

@@ -84,7 +84,7 @@ enum class ResizeFailure : uint8_t { kEmptyOutputs, kReturnAtOnce };
 inline constexpr int kMaxOutputs = 4;
 inline constexpr int kMaxOutDoubles = 3;
 
-struct EntrySpec {
+struct EntryPlan {
   QdmArrayHandle input;
   int32_t inputType;
   int32_t n;                              // the input block's count, read once per call
@@ -97,7 +97,7 @@ struct EntrySpec {
 // ---- what the estimator sees -------------------------------------------------------
 
 // Aligned stand-ins for the host memory of one call. `n` is the input block's
-// count as the entry point read it (once, into EntrySpec::n); outputs[i] belongs to
+// count as the entry point read it (once, into EntryPlan::n); outputs[i] belongs to
 // entry.outputs[i] (zero-filled, `length` elements); outDoubles[j] to
 // entry.outDoubles[j]; `modes` is the count for CountSource::kModes outputs;
 // `spectrum` is the record handed to the spectrum estimators.
@@ -121,10 +121,10 @@ struct EstimatorCall {
   const void* estimator;
 };
 
-int32_t RunEntry(const EntrySpec& entry, EstimatorCall estimate);
+int32_t RunEntry(const EntryPlan& entry, EstimatorCall estimate);
 
 template <typename Estimator>
-int32_t RunEntry(const EntrySpec& entry, const Estimator& estimator) {
+int32_t RunEntry(const EntryPlan& entry, const Estimator& estimator) {
   const EstimatorCall call{[](const void* e, EntryCall& c) -> StatusCode {
                              return (*static_cast<const Estimator*>(e))(c);
                            },

@@ -11,7 +11,7 @@
 
 using host::CountSource;
 using host::EntryCall;
-using host::EntrySpec;
+using host::EntryPlan;
 using host::OutDouble;
 using host::OutDoubleRole;
 using host::OutputArray;
@@ -41,7 +41,7 @@ int32_t PronyEntry(QdmArrayHandle data, int32_t type, int32_t p, double rate, Qd
                                  {phase, kReal, p, CountSource::kModes},
                                  {damp, kReal, p, CountSource::kModes},
                                  {freq, kReal, p, CountSource::kModes}};
-  return host::RunEntry(EntrySpec{data, type, n, check, outputs, {}, onResizeFailure}, estimate);
+  return host::RunEntry(EntryPlan{data, type, n, check, outputs, {}, onResizeFailure}, estimate);
 }
 
 // ---- covariance AR and principal-component AR ----------------------------------------------
@@ -55,7 +55,7 @@ int32_t ArEntry(QdmArrayHandle data, int32_t type, int32_t n, StatusCode check, 
   const bool sized = check == status::kOk;
   const OutputArray outputs[] = {{second, kCx, sized ? p : 0, CountSource::kLength},
                                  {coefficients, type, sized ? p + 1 : 0, CountSource::kLength}};
-  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles}, estimate);
+  return host::RunEntry(EntryPlan{data, type, n, check, outputs, outDoubles}, estimate);
 }
 
 template <typename Estimate>
@@ -88,7 +88,7 @@ int32_t PencilEntry(QdmArrayHandle data, int32_t type, int32_t L, int32_t M, dou
                                  {damp, kReal, M, CountSource::kModes},
                                  {freq, kReal, M, CountSource::kModes}};
   const OutDouble outDoubles[] = {{mse, OutDoubleRole::kEstimator}};
-  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles}, estimate);
+  return host::RunEntry(EntryPlan{data, type, n, check, outputs, outDoubles}, estimate);
 }
 
 // ---- MDL --------------------------------------------------------------------------------
@@ -115,7 +115,7 @@ int32_t CovSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t m
   const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
                                   {df, OutDoubleRole::kSpectrumDf},
                                   {variance, OutDoubleRole::kEstimator}};
-  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles}, [&](EntryCall& c) {
+  return host::RunEntry(EntryPlan{data, type, n, check, outputs, outDoubles}, [&](EntryCall& c) {
     c.spectrum.values = c.RealOutput(0);
     return estimate(c, N);
   });
@@ -137,7 +137,7 @@ int32_t PcarSpectrumEntry(QdmArrayHandle data, int32_t type, int32_t p, int32_t 
   const OutDouble outDoubles[] = {{f0, OutDoubleRole::kSpectrumF0},
                                   {df, OutDoubleRole::kSpectrumDf},
                                   {fitError, OutDoubleRole::kPassThrough}};
-  return host::RunEntry(EntrySpec{data, type, n, check, outputs, outDoubles, onResizeFailure},
+  return host::RunEntry(EntryPlan{data, type, n, check, outputs, outDoubles, onResizeFailure},
                         [&](EntryCall& c) {
                           c.spectrum.values = c.RealOutput(3);
                           return estimate(c, N);
