@@ -342,10 +342,10 @@ StatusCode MdlOfUnitPower(const T* x, int32_t n, int32_t L, int32_t min_order, i
 }
 
 template <typename T>
-int32_t Mdl(const T* x, int32_t n, int32_t max_order, int32_t min_order, int32_t* order) {
+int32_t Mdl(const T* x, int32_t n, int32_t pencil, int32_t min_order, int32_t* order) {
   constexpr bool cx = kIsComplex<T>;
-  const StatusCode check = checks::Mdl(n, max_order, min_order, kWide, last_error::Begin());
-  const int32_t L = check == status::kOk ? max_order : 0;
+  const StatusCode check = checks::Mdl(n, pencil, min_order, kWide, last_error::Begin());
+  const int32_t L = check == status::kOk ? pencil : 0;
   return RunPlain(
       {check,
        {x, n, cx},
@@ -665,14 +665,14 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int
 
 // ---- MDL ----------------------------------------------------------------------------------
 
-QDM_PLAIN_API int32_t qdm_mdl_order_real(const double* x, int32_t n, int32_t max_order,
+QDM_PLAIN_API int32_t qdm_mdl_order_real(const double* x, int32_t n, int32_t pencil,
                                          int32_t min_order, int32_t* order) {
-  return Mdl(x, n, max_order, min_order, order);
+  return Mdl(x, n, pencil, min_order, order);
 }
 
-QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int32_t max_order,
+QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int32_t pencil,
                                             int32_t min_order, int32_t* order) {
-  return Mdl(AsComplex(x), n, max_order, min_order, order);
+  return Mdl(AsComplex(x), n, pencil, min_order, order);
 }
 
 // ---- spectra ------------------------------------------------------------------------------

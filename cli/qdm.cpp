@@ -89,10 +89,11 @@ const IntOption kIntOptions[] = {
     {"--components", "components", &Options::components, 6, "singular components / modes k [6]",
      Bit(kPcar) | Bit(kPcarSpectrum)},
     {"--pencil", "pencil", &Options::pencil, 0,
-     "pencil parameter L [n/3; stabilization: max(n/3, max-order)]",
-     Bit(kPencil) | Bit(kStabilization)},
+     "pencil parameter L [n/3; mdl: min(n/3, 64), at least 2; stabilization: max(n/3, "
+     "max-order)]",
+     Bit(kPencil) | Bit(kMdl) | Bit(kStabilization)},
     {"--modes", "modes", &Options::modes, 6, "number of modes M [6]", Bit(kPencil)},
-    {"--upper", "upper", &Options::upper, 0, "upper order L [min(n/3, 64), at least 2]", Bit(kMdl)},
+    {"--upper", "upper", &Options::upper, 0, "the old name of --pencil for mdl", Bit(kMdl)},
     {"--min-order", "min_order", &Options::minOrder, 1, "smallest order tried [1]",
      Bit(kMdl) | Bit(kStabilization)},
     {"--nfft,--points", "nfft", &Options::nfft, 512,
@@ -329,7 +330,11 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     resolved[i] = (o.*kIntOptions[i].field).value_or(kIntOptions[i].fallback);
   if (!o.order && m == kProny) resolved[0] = 6;
   if (!o.pencil) resolved[2] = qdm_default_pencil(n);
-  if (!o.upper) resolved[4] = qdm_default_mdl_upper(n);
+  if (m == kMdl) {  // the order search's pencil: its own default, and --upper its old name
+    if (o.pencil && o.upper)
+      throw Failure{kUsage, {}, "give --pencil only (--upper is its old name)"};
+    if (!o.pencil) resolved[2] = o.upper ? *o.upper : qdm_default_mdl_upper(n);
+  }
   if (!o.pencil && m == kStabilization)
     resolved[2] = std::max(resolved[2], std::min(resolved[7], n / 2));
   const auto [p, k, L, M, upper, minOrder, points, maxOrder] = resolved;
@@ -343,7 +348,8 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   const int32_t oneSided = !s.complex && !o.twoSided ? 1 : 0;
   Json par = Json::object(), res = Json::object();
   for (size_t i = 0; i < std::size(kIntOptions); ++i)
-    if (kIntOptions[i].methods & Bit(m)) par[kIntOptions[i].key] = resolved[i];
+    if ((kIntOptions[i].methods & Bit(m)) && kIntOptions[i].field != &Options::upper)
+      par[kIntOptions[i].key] = resolved[i];
   if (m != kMdl) par["rate_hz"] = rate;
   if ((kModal & Bit(m)) && !s.complex) par["real_signal"] = flag;
   if (kModal & Bit(m)) par["sorted"] = o.noSort ? 0 : 1;
@@ -381,7 +387,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
       QDM_TWIN(qdm_pcar_solver, n, p, k, SolverOf(o), a, z);
       break;
     case kMdl:
-      QDM_TWIN(qdm_mdl_order, n, upper, minOrder, &order);
+      QDM_TWIN(qdm_mdl_order, n, L, minOrder, &order);
       break;
     case kCovSpectrum:  // the model, then its density laid out
       QDM_TWIN(qdm_covariance, n, p, a, z, &variance);

@@ -138,10 +138,8 @@ StatusCode Mdl(int32_t n, int32_t L, int32_t minOrder, Bound bound, Failure* why
   if (s != status::kOk) return s;
   if (minOrder < 1) return Below(why, status::kBadMinOrder, "min_order", minOrder, "1");
   if (L <= minOrder)
-    return Against(why, status::kBadMdlUpper, "max_order", L, "is not above", "min_order",
-                   minOrder);
-  if (L > Bound2n3(n, bound))
-    return AboveBound(why, status::kBadMdlUpper, "max_order", L, n, bound);
+    return Against(why, status::kBadMdlUpper, "pencil", L, "is not above", "min_order", minOrder);
+  if (L > Bound2n3(n, bound)) return AboveBound(why, status::kBadMdlUpper, "pencil", L, n, bound);
   return status::kOk;
 }
 

@@ -28,7 +28,7 @@ def pole_modes(poles):
     return np.angle(z) * fs / (2 * np.pi), np.log(np.abs(z)) * fs
 
 
-order = qdm.mdl_order(x, max_order=40)
+order = qdm.mdl_order(x, pencil=40)
 cov = qdm.covariance(x, order=12)
 pc = qdm.pcar(x, order=12, components=6)
 pr = qdm.prony(x, order=6, fs=fs, real_signal=True)

@@ -153,10 +153,10 @@ QDM_PLAIN_API int32_t qdm_output_room(int32_t n, int32_t size);
  *  the Python package and the tool. */
 QDM_PLAIN_API int32_t qdm_default_pencil(int32_t n);
 
-/** The default upper order L of the MDL search (qdm_mdl_order_real(),
- *  qdm_mdl_order_complex()) for n samples: the textbook floor(n/3), capped at
- *  64, and raised to 2 where n/3 is below it; 0 for n < 3, where no upper order
- *  passes (L must lie above min_order >= 1 and at most at floor(2n/3)). With
+/** The default pencil parameter L of the MDL search (`pencil` of
+ *  qdm_mdl_order_real(), qdm_mdl_order_complex()) for n samples: the textbook
+ *  floor(n/3), capped at 64, and raised to 2 where n/3 is below it; 0 for
+ *  n < 3, where no value passes (L must lie above min_order >= 1 and at most at floor(2n/3)). With
  *  min_order = 1 it is valid for every n that has a valid upper order. The cap
  *  bounds the cost: the search costs O(n m + m^3) for m up to L, and a
  *  150,000-sample record would otherwise ask for m = 50,000. The default of
@@ -347,7 +347,9 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int
  * same order.
  * @param x             n samples
  * @param n             number of samples, >= 1
- * @param max_order     upper order L, min_order < L <= floor(2n/3)
+ * @param pencil        pencil parameter L of the scored fits, min_order < L <=
+ *                      floor(2n/3); the largest order tried is min(n - L', L').
+ *                      qdm_default_mdl_upper() gives the default
  * @param min_order     smallest order tried, >= 1
  * @param order         in/out: the chosen order. Left as the caller set it when
  *                      no order scores below 10000 (initialise it, e.g. to 0).
@@ -357,9 +359,9 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_solver_complex(const qdm_complex* x, int
  *   ::QDM_ERR_EXTREME_VALUE, ::QDM_ERR_NO_CONVERGENCE,
  *   ::QDM_ERR_ILLEGAL_ARGUMENT. On an error *order is 0.
  * @{ */
-QDM_PLAIN_API int32_t qdm_mdl_order_real(const double* x, int32_t n, int32_t max_order,
+QDM_PLAIN_API int32_t qdm_mdl_order_real(const double* x, int32_t n, int32_t pencil,
                                          int32_t min_order, int32_t* order);
-QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int32_t max_order,
+QDM_PLAIN_API int32_t qdm_mdl_order_complex(const qdm_complex* x, int32_t n, int32_t pencil,
                                             int32_t min_order, int32_t* order);
 /** @} */
 

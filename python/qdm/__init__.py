@@ -301,7 +301,7 @@ _COVARIANCE = (_N, _ORDER)
 _PCAR = (_N, _ORDER, _COMPONENTS)
 _PRONY = (_N, _ORDER, _FS)
 _PENCIL = (_N, ("pencil", "pencil"), ("order", "modes"), _FS)
-_MDL = (_N, ("max_order", "max_order"), ("min_order", "min_order"))
+_MDL = (_N, ("pencil", "pencil"), ("min_order", "min_order"))
 _SPECTRUM = (_N, _ORDER, ("points", "nfft"), _COMPONENTS, _FS)
 _STABILIZATION = (_N, ("pencil", "pencil"), ("min_order", "min_order"),
                   ("max_order", "max_order"), _FS, ("freq_tol", "freq_tol"),
@@ -1122,26 +1122,29 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
                      damping[i] * args[4], sa[i], sp[i], sd[i], sf[i], sd[i] * args[4])
 
 
-def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int = 1) -> int:
+def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 1,
+              max_order: Optional[int] = None) -> int:
     """Model order by the minimum description length of matrix-pencil fits.
 
     Scores each order m from `min_order` to r = min(n - L', L') by
     n ln(E_m) + 10 m ln(n), E_m the fitting error of the m-mode matrix
     pencil with pencil parameter L', and returns the order of the lowest
-    score. L' is `max_order`, less one when it is exactly n/2.
+    score. L' is `pencil`, less one when it is exactly n/2.
 
     Parameters
     ----------
     x : array_like, 1-D, n >= 1 samples
         The record. float64 runs the real fit, complex128 the complex one;
         other dtypes numpy casts safely to one of them are converted.
-    max_order : int or None, min_order < max_order <= floor(2n/3), default None
-        The upper order L, also the pencil parameter of the fits. None takes
-        the library's default, min(n // 3, 64) and at least 2, valid for
-        every n >= 3 (below that no upper order fits): the cap keeps the
-        O(n m + m**3) search small on long records.
+    pencil : int or None, min_order < pencil <= floor(2n/3), default None
+        The pencil parameter L of the scored fits; the largest order tried
+        is min(n - L', L'). None takes the library's default, min(n // 3, 64)
+        and at least 2, valid for every n >= 3 (below that no value fits):
+        the cap keeps the O(n m + m**3) search small on long records.
     min_order : int, min_order >= 1, default 1
         The smallest order tried.
+    max_order : int or None, default None
+        The old name of `pencil`: still accepted, with a DeprecationWarning.
 
     Returns
     -------
@@ -1157,11 +1160,12 @@ def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int
         x has a dtype with no lossless conversion to float64 or complex128.
     ArgumentError
         x is not 1-D (code None); x is empty (-42401); min_order < 1
-        (-42414); max_order not above min_order or above floor(2n/3)
-        (-42415); a NaN or infinite sample (-42419); the fits would exceed
+        (-42414); pencil not above min_order or above floor(2n/3)
+        (-42415); both pencil and max_order given (code None); a NaN or
+        infinite sample (-42419); the fits would exceed
         the library's work-memory bound (-42420).
     TypeError
-        max_order or min_order is not an integer.
+        pencil or min_order is not an integer.
     NumericError
         A numeric failure in a fit (LAPACK, extreme values).
     OutOfMemoryError
@@ -1171,6 +1175,8 @@ def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int
     -----
     RankDeficientWarning
         A least-squares system in a fit was rank deficient.
+    DeprecationWarning
+        max_order was given (the old name of pencil).
 
     See Also
     --------
@@ -1178,10 +1184,9 @@ def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int
 
     Notes
     -----
-    The threshold 10000 and the floor 2.2e-16 are fixed, so the result
-    depends on the record's scale. A record whose largest magnitude lies
-    outside [2**-128, 2**128] is scored as a copy scaled by a power of two
-    that brings it into [1, 2).
+    The record is scored at unit power (divided by its root mean square),
+    so the fixed threshold 10000 and floor 2.2e-16 weigh the fitting error
+    against the record's own power: x and c * x give the same order.
 
     Examples
     --------
@@ -1191,17 +1196,24 @@ def mdl_order(x: "ArrayLike", *, max_order: Optional[int] = None, min_order: int
     ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
     >>> qdm.mdl_order(x)            # two real sinusoids: four exponentials
     4
-    >>> qdm.mdl_order(x, max_order=20, min_order=2)
+    >>> qdm.mdl_order(x, pencil=20, min_order=2)
     4
     """
     a, c = _signal(x, "mdl_order")
     n = a.shape[0]
-    upper = (_clib.qdm_default_mdl_upper(n) if max_order is None
-             else _int(max_order, "max_order", "mdl_order"))
+    if max_order is not None:
+        if pencil is not None:
+            raise ArgumentError(None, "give pencil only (max_order is its old name)", "mdl_order")
+        _warnings.warn("mdl_order: max_order= is the pencil parameter of the scored fits, now "
+                       "called pencil=; the old name will be removed", DeprecationWarning,
+                       stacklevel=2)
+        pencil = max_order
+    upper = (_clib.qdm_default_mdl_upper(n) if pencil is None
+             else _int(pencil, "pencil", "mdl_order"))
     lower = _int(min_order, "min_order", "mdl_order")
     order = _ct.c_int32(0)
     _check(_fn["mdl_order", _kind(c)](_addr(a), n, upper, lower, _ct.byref(order)), "mdl_order",
-           _MDL, None, max_order, min_order)
+           _MDL, None, pencil, min_order)
     return order.value
 
 
@@ -1582,8 +1594,8 @@ class Stabilization(NamedTuple):
     stable_damping : ndarray
         bool: some pole of order m - 1 lies within the damping tolerance.
     mdl_order : int
-        The order `mdl_order` chooses for the same record with the same
-        max_order and min_order (0 when none scores below 10000).
+        The order ``mdl_order(x, pencil=max_order, min_order=min_order)``
+        chooses for the same record (0 when none scores below 10000).
     """
     order: NDArray[_np.int32]
     frequency: NDArray[_np.float64]

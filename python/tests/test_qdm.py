@@ -74,7 +74,7 @@ CASES = {
                           lambda x: c_modes("prony", x, 6, 6, 1.0, *rs(x, 1))),
     "matrix_pencil": (lambda x: qdm.matrix_pencil(x, modes=4, fs=2.0, sort=False), lambda x: c_modes(
         "matrix_pencil", x, 4, len(x) // 3, 4, 2.0, *rs(x, 0), mse=True)),
-    "mdl_order": (lambda x: qdm.mdl_order(x, max_order=16, min_order=2),
+    "mdl_order": (lambda x: qdm.mdl_order(x, pencil=16, min_order=2),
                   lambda x: c_api("mdl_order", x, 16, 2, outs=[(1, np.int32)])[0][0]),
     "covariance_psd": (lambda x: qdm.covariance_psd(x, order=12, nfft=100, fs=8.0),
                        lambda x: c_ar_psd(x, 12, 100, 8.0)),
@@ -155,7 +155,7 @@ BAD = [  # call, exception, library code (None: refused before the library)
     (lambda: qdm.pcar(REAL, order=-1, components=1), E, -42411),
     (lambda: qdm.pcar(REAL, order=4, components=5), E, -42413),
     (lambda: qdm.mdl_order(REAL, min_order=0), E, -42414),
-    (lambda: qdm.mdl_order(COMPLEX, max_order=10**9), E, -42415),
+    (lambda: qdm.mdl_order(COMPLEX, pencil=10**9), E, -42415),
     (lambda: qdm.covariance_psd(REAL, order=4, nfft=1), E, -42417),
     (lambda: qdm.mdl_order(REAL[:2]), E, -42415),  # no upper order fits two samples
     (lambda: qdm.pcar_psd(COMPLEX, order=4, components=2, fs=0.0), E, -42418),
@@ -196,8 +196,8 @@ MESSAGES = [  # call, exception, the message exactly: argument, value, limit in 
     (lambda: qdm.matrix_pencil(COMPLEX, modes=0), E, "matrix_pencil: modes 0 is below 1"),
     (lambda: qdm.matrix_pencil(REAL, modes=2, pencil=65), E,
      "matrix_pencil: pencil 65 is above floor(2n/3) = 64 (n = 96)"),
-    (lambda: qdm.mdl_order(REAL, max_order=8, min_order=8), E,
-     "mdl_order: max_order 8 is not above min_order = 8"),
+    (lambda: qdm.mdl_order(REAL, pencil=8, min_order=8), E,
+     "mdl_order: pencil 8 is not above min_order = 8"),
     (lambda: qdm.mdl_order(REAL, min_order=-2**40), E, "mdl_order: min_order -1099511627776 is below 1"),
     (lambda: qdm.covariance_psd(REAL, order=4, nfft=1), E, "covariance_psd: nfft 1 is below 2"),
     (lambda: qdm.covariance_psd(REAL, order=40, nfft=20), E,
@@ -213,8 +213,8 @@ MESSAGES = [  # call, exception, the message exactly: argument, value, limit in 
      "pcar: components must be an integer, not None"),
     (lambda: qdm.matrix_pencil(REAL, modes=2, pencil=30.0), TypeError,
      "matrix_pencil: pencil must be an integer, not 30.0"),
-    (lambda: qdm.mdl_order(REAL, max_order="9"), TypeError,
-     "mdl_order: max_order must be an integer, not '9'"),
+    (lambda: qdm.mdl_order(REAL, pencil="9"), TypeError,
+     "mdl_order: pencil must be an integer, not '9'"),
     (lambda: qdm.covariance_psd(REAL, order=4, nfft=64.5), TypeError,
      "covariance_psd: nfft must be an integer, not 64.5"),
     (lambda: qdm.prony(REAL, order=4, fs="1000"), TypeError,
@@ -327,7 +327,7 @@ def test_the_order_search_does_not_depend_on_the_record_units(kind):
          + 0.05 * rng.standard_normal(200))
     if kind == "complex":
         x = x * np.exp(0.3j)
-    orders = {k: qdm.mdl_order(x * 10.0**k, max_order=40) for k in range(-10, 13)}
+    orders = {k: qdm.mdl_order(x * 10.0**k, pencil=40) for k in range(-10, 13)}
     assert set(orders.values()) == {4}, orders
 
 
@@ -342,4 +342,11 @@ LONG = (sum(np.exp(-0.002 * _long) * np.cos(0.3 * k * _long + k) for k in range(
                                      (LONG, 64), (LONG + 0.5j * LONG[::-1], 64)],
                          ids=["n3", "n8", "n64", "n96", "n600", "n600c"])
 def test_mdl_order_defaults_to_the_capped_third(x, upper):
-    assert qdm.mdl_order(x) == qdm.mdl_order(x, max_order=upper)
+    assert qdm.mdl_order(x) == qdm.mdl_order(x, pencil=upper)
+
+
+def test_mdl_order_takes_max_order_as_the_old_name_of_pencil():
+    with pytest.warns(DeprecationWarning, match="pencil"):
+        assert qdm.mdl_order(REAL, max_order=16) == qdm.mdl_order(REAL, pencil=16)
+    with pytest.raises(qdm.ArgumentError, match="pencil only"):
+        qdm.mdl_order(REAL, pencil=16, max_order=16)

@@ -41,7 +41,7 @@ def test_three_modes_stand_in_stable_columns(seed, fs):
         for f in FREQS * fs:
             hit = np.abs(d.frequency[rows] - f) <= 0.01 * max(abs(f), fs / N)
             assert (hit & d.stable[rows]).any(), (m, f)
-    assert d.mdl_order == qdm.mdl_order(x, max_order=14)
+    assert d.mdl_order == qdm.mdl_order(x, pencil=14)
 
 
 @pytest.mark.parametrize("seed", [1, 2, 3])

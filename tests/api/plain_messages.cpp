@@ -119,10 +119,10 @@ const BadCall kBadCalls[] = {
      "min_order 0 is below 1"},
     {"mdl upper not above min", QDM_ERR_MDL_UPPER,
      [](Buffers& b) { return qdm_mdl_order_complex(b.cx(), kN, 5, 5, &b.count); },
-     "max_order 5 is not above min_order = 5"},
+     "pencil 5 is not above min_order = 5"},
     {"mdl upper above the bound", QDM_ERR_MDL_UPPER,
      [](Buffers& b) { return qdm_mdl_order_real(b.x.data(), kN, 250, 1, &b.count); },
-     "max_order 250 is above floor(2n/3) = 206 (n = 309)"},
+     "pencil 250 is above floor(2n/3) = 206 (n = 309)"},
     {"spectrum of one point", QDM_ERR_SPECTRUM_SIZE,
      [](Buffers& b) {
        return qdm_covariance_psd_real(b.x.data(), kN, 4, 1, 1.0, b.o(0), &b.d1, &b.d2, &b.d3);

@@ -139,7 +139,7 @@ argument_words)
 covariance --example real --order 300|qdm_covariance_real returned -42412: order 300 is above floor(2n/3) = 85 (n = 128)
 pcar --example complex --order 8 --components 9|returned -42413: components 9 is above order = 8
 pencil --example complex --pencil 10 --modes 11|returned -42413: order 11 is above pencil = 10
-mdl --example real --upper 3 --min-order 3|returned -42415: max_order 3 is not above min_order = 3
+mdl --example real --pencil 3 --min-order 3|returned -42415: pencil 3 is not above min_order = 3
 prony --example real --rate -5|returned -42418: fs -5 is not positive
 covspectrum --example real --order 40 --nfft 20|returned -42422: points 20 gives fewer spectrum values than order + 1 = 41
 EOF
@@ -504,7 +504,7 @@ a = np.loadtxt(sys.argv[1], delimiter=",", ndmin=2)
 x = a[:, 0] + 1j * a[:, 1] if a.shape[1] == 2 else a[:, 0]
 tool = json.load(open("out"))
 assert tool["results"]["order"] == qdm.mdl_order(x), (tool, qdm.mdl_order(x))
-print("ok: %s: order %d, upper %d" % (sys.argv[1], qdm.mdl_order(x), tool["parameters"]["upper"]))
+print("ok: %s: order %d, pencil %d" % (sys.argv[1], qdm.mdl_order(x), tool["parameters"]["pencil"]))
 PY
       fail "the tool and Python differ on $file: $(cat out)"
   done
