@@ -17,9 +17,11 @@ foreach(case stdin_stdout jobs exit_codes argument_words plot csv limits present
   set_tests_properties(cli.${case} PROPERTIES FIXTURES_REQUIRED qdm_cli_installed)
 endforeach()
 if(QDM_SANITIZE)
-  # cli.defaults also runs the Python package on the instrumented library: the
-  # interpreter is not instrumented, so the sanitizer run-time has to come first.
+  # cli.defaults and cli.readme also run the Python package on the instrumented
+  # library: the interpreter is not instrumented, so the sanitizer run-time has
+  # to come first.
   execute_process(COMMAND ${CMAKE_CXX_COMPILER} -print-file-name=libasan.so
                   OUTPUT_VARIABLE _cli_asan OUTPUT_STRIP_TRAILING_WHITESPACE)
-  set_tests_properties(cli.defaults PROPERTIES ENVIRONMENT "QDM_PYTHON_PRELOAD=${_cli_asan}")
+  set_tests_properties(cli.defaults cli.readme PROPERTIES ENVIRONMENT
+                       "QDM_PYTHON_PRELOAD=${_cli_asan}")
 endif()

@@ -125,7 +125,8 @@ text = open(sys.argv[1], encoding="utf-8").read()
 print(text.split("\n## Python\n", 1)[1].split("```python\n", 1)[1].split("```", 1)[0])
 PY
   lib=$(find "$prefix" -name 'libqdm_api.so.1' | head -1)
-  QDM_LIBRARY=$lib PYTHONPATH=$(dirname "$readme")/python $py example.py 2>err \
+  LD_PRELOAD=${QDM_PYTHON_PRELOAD:-} ASAN_OPTIONS=detect_leaks=0 QDM_LIBRARY=$lib \
+    PYTHONPATH=$(dirname "$readme")/python $py example.py 2>err \
     || fail "README Python example: $(cat err)"
   echo "ok: README Python example"
   ;;
