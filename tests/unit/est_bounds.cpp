@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "estimation/estimation.h"
+#include "numeric/numeric.h"
 
 namespace {
 
@@ -46,3 +47,27 @@ TEST(Bounds, PredictionBlocksAndRootSelectionWriteExactlyTheirCells) {
 }
 
 }  // namespace
+
+// The differences u - v, real and complex, over every count from 0 to 4: each
+// writes exactly its count of cells (a count below 1 writes none), each one
+// the difference of its pair.
+TEST(Bounds, DifferencesWriteTheirCountAndNoMore) {
+  const double u[4] = {5.0, -1.5, 2.25, 8.0}, v[4] = {1.0, 0.5, -0.75, 3.0};
+  const Complex cu[4] = {{5, 1}, {-1.5, 2}, {2.25, -3}, {8, 0.5}};
+  const Complex cv[4] = {{1, -1}, {0.5, 0.5}, {-0.75, 1}, {3, 2}};
+  for (int32_t count = 0; count <= 4; ++count) {
+    double out[5] = {-9, -9, -9, -9, -9};
+    Complex cout[5] = {-9, -9, -9, -9, -9};
+    if (count > 0) {
+      ASSERT_EQ(VecSubReal(u, v, count, out), status::kOk);
+    }
+    ASSERT_EQ(VecSubComplex(cu, cv, count, cout), status::kOk);
+    for (int32_t i = 0; i < 5; ++i) {
+      EXPECT_EQ(out[i], i < count ? u[i] - v[i] : -9.0) << count << " " << i;
+      EXPECT_EQ(cout[i], i < count
+                             ? Complex(cu[i].real() - cv[i].real(), cu[i].imag() - cv[i].imag())
+                             : Complex(-9.0))
+          << count << " " << i;
+    }
+  }
+}
