@@ -14,6 +14,7 @@
 #include "numeric/lapack_boundary.h"
 #include "numeric/work.h"
 #include "qdm_api.h"
+#include "support/fault_sweep.h"
 
 namespace {
 
@@ -204,33 +205,17 @@ TEST(PlainModeErrors, AGrowingModeThatOverflowsIsAnExtremeValue) {
 // left allocated, and otherwise gives the clean result.
 TEST(PlainModeErrors, EveryFaultIsReported) {
   int64_t faulted = 0;
-  for (const bool complex : {false, true}) {
-    Call clean = Valid(complex, 4500);
-    Errors(clean);
-    ASSERT_EQ(clean.status, QDM_OK);
-    for (int fault = 0; fault < 4; ++fault) {
-      for (int64_t k = 1;; ++k) {
-        if (fault < 2) NumAllocFailAt(k, fault == 1);
-        if (fault >= 2) LapackFailAt(k, fault == 3 ? -1 : 1, false);
+  FaultSweep(
+      [](bool complex) {
         Call c = Valid(complex, 4500);
         Errors(c);
-        const bool reached = (fault < 2 ? NumAllocAttempts() : LapackCalls()) >= k;
-        NumAllocFailAt(0, false);
-        LapackFailAt(0, 0, false);
-        const std::string where = std::string(complex ? "complex" : "real") + " fault " +
-                                  std::to_string(fault) + " k " + std::to_string(k);
-        ASSERT_EQ(NumAllocOutstanding(), 0) << where;
-        if (!reached) {
-          EXPECT_EQ(c.status, QDM_OK) << where;
-          for (int q = 0; q < 4; ++q) EXPECT_EQ(c.se[q], clean.se[q]) << where;
-          break;
-        }
-        EXPECT_LT(c.status, 0) << where;
-        EXPECT_TRUE(All(c, 0.0)) << where;
-        ++faulted;
-      }
-    }
-  }
+        return c;
+      },
+      [](const Call& c, const Call& clean, const std::string& where) {
+        EXPECT_EQ(c.status, QDM_OK) << where;
+        for (int q = 0; q < 4; ++q) EXPECT_EQ(c.se[q], clean.se[q]) << where;
+      },
+      [](const Call& c, bool) { return All(c, 0.0); }, &faulted);
   EXPECT_GT(faulted, 20);
 }
 

@@ -16,6 +16,7 @@
 #include "numeric/lapack_boundary.h"
 #include "numeric/work.h"
 #include "qdm_api.h"
+#include "support/fault_sweep.h"
 
 namespace {
 
@@ -285,39 +286,21 @@ bool AllZero(const Call& c) {
 // one the call gives the clean results.
 TEST(PlainStabilization, EveryFaultIsReported) {
   int64_t faulted = 0;
-  for (const bool complex : {false, true}) {
-    Call clean = Valid(complex, 96);
-    clean.max_order = 6;
-    clean.room = qdm_stabilization_rows(1, 6);
-    Fit(clean);
-    ASSERT_EQ(clean.status, QDM_OK);
-    for (int fault = 0; fault < 4; ++fault) {
-      for (int64_t k = 1;; ++k) {
-        if (fault < 2) NumAllocFailAt(k, fault == 1);
-        if (fault >= 2) LapackFailAt(k, fault == 3 ? -1 : 1, false);
+  FaultSweep(
+      [](bool complex) {
         Call c = Valid(complex, 96);
         c.max_order = 6;
-        c.room = clean.room;
+        c.room = qdm_stabilization_rows(1, 6);
         Fit(c);
-        const bool reached = (fault < 2 ? NumAllocAttempts() : LapackCalls()) >= k;
-        NumAllocFailAt(0, false);
-        LapackFailAt(0, 0, false);
-        const std::string where = std::string(complex ? "complex" : "real") + " fault " +
-                                  std::to_string(fault) + " k " + std::to_string(k);
-        ASSERT_EQ(NumAllocOutstanding(), 0) << where;
-        if (!reached) {
-          EXPECT_EQ(c.status, QDM_OK) << where;
-          EXPECT_EQ(c.frequency, clean.frequency) << where;
-          EXPECT_EQ(c.mdl, clean.mdl) << where;
-          break;
-        }
-        EXPECT_LT(c.status, 0) << where;
-        EXPECT_TRUE(AllZero(c)) << where;
-        EXPECT_EQ(LastMessage(), qdm_status_text(c.status)) << where;
-        ++faulted;
-      }
-    }
-  }
+        return c;
+      },
+      [](const Call& c, const Call& clean, const std::string& where) {
+        EXPECT_EQ(c.status, QDM_OK) << where;
+        EXPECT_EQ(c.frequency, clean.frequency) << where;
+        EXPECT_EQ(c.mdl, clean.mdl) << where;
+      },
+      [](const Call& c, bool) { return AllZero(c) && LastMessage() == qdm_status_text(c.status); },
+      &faulted);
   EXPECT_GT(faulted, 50);
 }
 
