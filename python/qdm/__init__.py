@@ -647,6 +647,19 @@ def _order(frequency, sort):
     return _np.argsort(frequency, kind="stable") if sort else slice(None)
 
 
+def _errors_call(a, c, fs, flag, rows, count):
+    """One call of the library's mode errors for `count` modes whose amplitude,
+    phase, damping and frequency arrays start at the addresses `rows`: the
+    status, the 4-by-count errors and the noise variance."""
+    out = _np.empty((4, max(count, 1)))
+    variance = _ct.c_double()
+    args: tuple = (_addr(a), a.shape[0], fs) + (() if c else (flag,))
+    status = _fn["mode_errors", _kind(c)](*args, count, *rows,
+                                          *[_addr(out[q]) for q in range(4)],
+                                          _ct.byref(variance))
+    return status, out[:, :count], variance.value
+
+
 def _stderr(a, c, fs, flag, block, count, function):
     """The standard errors of the modes a fit left in block[:, :count], in the
     same order, for the fit's result: an error computation that cannot be
@@ -654,14 +667,7 @@ def _stderr(a, c, fs, flag, block, count, function):
     with a SingularBoundWarning rather than failing the fit."""
     if count == 0:
         return _np.empty((4, 0))
-    out = _np.empty((4, count))
-    rows = [_addr(block[q]) for q in range(4)]
-    se = [_addr(out[q]) for q in range(4)]
-    variance = _ct.c_double()
-    args: tuple = (_addr(a), a.shape[0], fs)
-    if not c:
-        args += (flag,)
-    status = _fn["mode_errors", _kind(c)](*args, count, *rows, *se, _ct.byref(variance))
+    status, out, _ = _errors_call(a, c, fs, flag, [_addr(block[q]) for q in range(4)], count)
     if status == 0:
         return out
     if status == _BOUND_SINGULAR or -42499 <= status <= -42400 or status in _NO_BOUND:
@@ -1554,19 +1560,13 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
         raise ArgumentError(None, "the four mode arrays must be 1-D and of one length",
                             "mode_errors")
     block = _np.ascontiguousarray(block)
-    M = block.shape[1]
-    out = _np.empty((4, max(M, 1)))
-    variance = _ct.c_double()
-    args: tuple = (_addr(a), a.shape[0], _fs(fs, "mode_errors"))
+    rate = _fs(fs, "mode_errors")
     flag = _real_flag(real_signal, c, "mode_errors")
-    if not c:
-        args += (flag,)
-    rows = [block[q].ctypes.data for q in range(4)]
-    se = [_addr(out[q]) for q in range(4)]
-    _check(_fn["mode_errors", _kind(c)](*args, _int(M, "modes", "mode_errors"), *rows, *se, _ct.byref(variance)),
-           "mode_errors")
-    sa, sp, sd, sf = out[:, :M]
-    return ModeErrors(sa, sp, sd, sf, sd * args[2], variance.value)
+    status, out, variance = _errors_call(a, c, rate, flag, [block[q].ctypes.data for q in range(4)],
+                                         _int(block.shape[1], "modes", "mode_errors"))
+    _check(status, "mode_errors")
+    sa, sp, sd, sf = out
+    return ModeErrors(sa, sp, sd, sf, sd * rate, variance)
 
 
 class Stabilization(NamedTuple):
