@@ -104,14 +104,11 @@ int32_t Run(const T* x, int32_t n, double fs, bool pairs, const double* amplitud
   const T* xs = x;
   StatusCode s = status::kOk;
   if (scale != 0) {
-    copy = AllocWorkUninit<double>(values);
-    amps = AllocWorkUninit<double>(static_cast<size_t>(modes));
+    copy = plain::ScaledCopy(reinterpret_cast<const double*>(x), values, scale);
+    amps = plain::ScaledCopy(amplitude, static_cast<size_t>(modes), scale);
     if (!copy || !amps) {
       s = status::kNoMemory;
     } else {
-      const double* v = reinterpret_cast<const double*>(x);
-      for (size_t i = 0; i < values; ++i) copy[i] = std::ldexp(v[i], scale);
-      for (int32_t i = 0; i < modes; ++i) amps[i] = std::ldexp(amplitude[i], scale);
       xs = reinterpret_cast<const T*>(copy.get());
       set.amplitude = amps.get();
     }

@@ -180,10 +180,8 @@ int32_t RunChecked(const PlainCall& call, const Fit& fit) {
   const void* samples = call.x.data;
   if (scale != 0) {
     const size_t values = static_cast<size_t>(call.x.n) * (call.x.complex ? 2 : 1);
-    scaled = AllocWorkUninit<double>(values);
+    scaled = plain::ScaledCopy(static_cast<const double*>(call.x.data), values, scale);
     if (!scaled) s = status::kNoMemory;
-    const double* v = static_cast<const double*>(call.x.data);
-    for (size_t i = 0; scaled && i < values; ++i) scaled[i] = std::ldexp(v[i], scale);
     samples = scaled.get();
   }
   if (s == status::kOk) {

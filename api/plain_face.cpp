@@ -35,4 +35,10 @@ int RecordScale(double largest) {
   return -std::ilogb(largest);
 }
 
+WorkArray<double> ScaledCopy(const double* v, size_t values, int scale) {
+  WorkArray<double> copy = AllocWorkUninit<double>(values);
+  for (size_t i = 0; copy && i < values; ++i) copy[i] = std::ldexp(v[i], scale);
+  return copy;
+}
+
 }  // namespace plain

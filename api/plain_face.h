@@ -9,6 +9,7 @@
 #include <cstdint>
 
 #include "core/types.h"
+#include "numeric/work.h"
 
 namespace plain {
 
@@ -33,5 +34,9 @@ double Extent(const double* v, int64_t values);
 // 2^-1022 beside a much larger maximum, far under its rounding), every fit is
 // homogeneous in the record, and the results are scaled back exactly.
 int RecordScale(double largest);
+
+// A work block holding `values` doubles of v times 2^scale; empty when memory
+// ran out.
+WorkArray<double> ScaledCopy(const double* v, size_t values, int scale);
 
 }  // namespace plain

@@ -97,11 +97,10 @@ int32_t Run(const T* x, int32_t n, const StabilizationRange& range, Stabilizatio
   const T* xs = x;
   StatusCode s = status::kOk;
   if (scale != 0) {
-    copy = AllocWorkUninit<double>(values);
+    copy = plain::ScaledCopy(v, values, scale);
     if (!copy) {
       s = status::kNoMemory;
     } else {
-      for (size_t i = 0; i < values; ++i) copy[i] = std::ldexp(v[i], scale);
       xs = reinterpret_cast<const T*>(copy.get());
     }
   }
