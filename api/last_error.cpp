@@ -13,6 +13,7 @@ struct LastCall {
   int32_t status = QDM_OK;
   checks::Failure failure;
   int64_t index = -1;  // the sample a non-finite refusal names, or -1
+  char text[384];      // a message written out whole (a batch's), or empty
 };
 
 // One record per thread, constant-initialised (no guard, no destructor), so
@@ -119,6 +120,11 @@ int32_t NotFiniteSample(const double* x, int64_t values, bool complex, const cha
   return QDM_ERR_NON_FINITE;
 }
 
+int32_t Text(int32_t status, const char* text) {
+  std::snprintf(last.text, sizeof last.text, "%s", text);
+  return End(status);
+}
+
 int32_t WorkLimit(double bytes, int32_t n) {
   RefuseAgainst(QDM_ERR_WORK_LIMIT, "work memory", bytes, "is above", "QDM_MAX_WORK_BYTES",
                 static_cast<double>(QDM_MAX_WORK_BYTES));
@@ -132,7 +138,9 @@ int32_t WorkLimit(double bytes, int32_t n) {
 extern "C" QDM_PLAIN_API int32_t qdm_last_error_message(char* buffer, int32_t size) {
   using last_error::last;
   char text[512] = "";
-  if (last.failure.argument != nullptr) {
+  if (last.text[0] != '\0') {
+    std::snprintf(text, sizeof text, "%s", last.text);
+  } else if (last.failure.argument != nullptr) {
     last_error::Describe(last, text, sizeof text);
   } else if (last.status != QDM_OK && last.status != QDM_WARN_RANK_DEFICIENT) {
     std::snprintf(text, sizeof text, "%s", qdm_status_text(last.status));

@@ -28,5 +28,7 @@ int32_t NotFinite(const char* argument, double value);
 // (pairs when complex), which the caller knows to hold one.
 int32_t NotFiniteSample(const double* x, int64_t values, bool complex, const char* argument = "x");
 int32_t WorkLimit(double bytes, int32_t n);
+// Ends the call with `status` and a message written out whole.
+int32_t Text(int32_t status, const char* text);
 
 }  // namespace last_error

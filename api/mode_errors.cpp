@@ -85,11 +85,12 @@ int32_t Run(const T* x, int32_t n, double fs, bool pairs, const double* amplitud
   if (ModeErrorsWork(modes) > static_cast<double>(QDM_MAX_WORK_BYTES)) {
     return last_error::WorkLimit(ModeErrorsWork(modes), n);
   }
+  if (!Finite(fs)) return last_error::NotFinite("fs", fs);
+  if (plain::Admitting()) return last_error::End(QDM_OK);
   const size_t values = static_cast<size_t>(n) * (cx ? 2 : 1);
   const double extent = plain::Extent(reinterpret_cast<const double*>(x), int64_t(values));
   if (extent < 0.0)
     return last_error::NotFiniteSample(reinterpret_cast<const double*>(x), int64_t(values), cx);
-  if (!Finite(fs)) return last_error::NotFinite("fs", fs);
 
   ModeSet set{amplitude, phase, damping, frequency, modes, fs};
   int64_t parameters = 0;

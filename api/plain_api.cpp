@@ -164,14 +164,15 @@ int32_t RunChecked(const PlainCall& call, const Fit& fit) {
   if (call.work_bytes > static_cast<double>(QDM_MAX_WORK_BYTES)) {
     return last_error::WorkLimit(call.work_bytes, call.x.n);
   }
+  if (call.rate != nullptr && !std::isfinite(*call.rate)) {
+    return last_error::NotFinite("fs", *call.rate);
+  }
+  if (plain::Admitting()) return QDM_OK;
   const double largest = Extent(call.x);
   if (largest < 0.0) {
     const int64_t values = int64_t{call.x.n} * (call.x.complex ? 2 : 1);
     return last_error::NotFiniteSample(static_cast<const double*>(call.x.data), values,
                                        call.x.complex);
-  }
-  if (call.rate != nullptr && !std::isfinite(*call.rate)) {
-    return last_error::NotFinite("fs", *call.rate);
   }
 
   const int scale = RecordScale(largest);

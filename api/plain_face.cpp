@@ -41,4 +41,12 @@ WorkArray<double> ScaledCopy(const double* v, size_t values, int scale) {
   return copy;
 }
 
+namespace {
+thread_local bool g_admitting = false;
+}
+
+bool Admitting() { return g_admitting; }
+Admission::Admission() { g_admitting = true; }
+Admission::~Admission() { g_admitting = false; }
+
 }  // namespace plain

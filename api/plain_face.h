@@ -39,4 +39,18 @@ int RecordScale(double largest);
 // ran out.
 WorkArray<double> ScaledCopy(const double* v, size_t values, int scale);
 
+// A batch asks its calls' argument checks once, before any record: while an
+// Admission lives on a thread, a call of this face on that thread makes its
+// checks of the arguments (sizes, pointers, the work bound, fs) and returns
+// QDM_OK when they pass, before it reads a sample or writes anything.
+bool Admitting();
+
+class Admission {
+ public:
+  Admission();
+  ~Admission();
+  Admission(const Admission&) = delete;
+  Admission& operator=(const Admission&) = delete;
+};
+
 }  // namespace plain

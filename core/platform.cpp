@@ -7,6 +7,9 @@
 #else
 #include <dlfcn.h>
 #include <pthread.h>
+#include <unistd.h>
+
+#include <algorithm>
 #include <cstdio>
 #endif
 
@@ -49,6 +52,43 @@ void PlanMutexClose() {
 void PlanMutexLock() { WaitForSingleObject(g_plan_mutex, INFINITE); }
 void PlanMutexUnlock() { ReleaseMutex(g_plan_mutex); }
 
+int Processors() {
+  SYSTEM_INFO info;
+  GetSystemInfo(&info);
+  const DWORD count = info.dwNumberOfProcessors;
+  return count < 1 ? 1 : count > DWORD{kMaxThreads} ? kMaxThreads : static_cast<int>(count);
+}
+
+namespace {
+struct ThreadStart {
+  void (*body)(void*);
+  void* context;
+};
+
+DWORD WINAPI ThreadMain(LPVOID start) {
+  const auto* s = static_cast<const ThreadStart*>(start);
+  s->body(s->context);
+  return 0;
+}
+}  // namespace
+
+int RunOnThreads(int threads, void (*body)(void*), void* context) {
+  ThreadStart start{body, context};
+  HANDLE handles[kMaxThreads];
+  int started = 0;
+  for (int t = 1; t < threads && started < kMaxThreads; ++t) {
+    HANDLE h = CreateThread(nullptr, 0, ThreadMain, &start, 0, nullptr);
+    if (h == nullptr) break;
+    handles[started++] = h;
+  }
+  body(context);
+  for (int t = 0; t < started; ++t) {
+    WaitForSingleObject(handles[t], INFINITE);
+    CloseHandle(handles[t]);
+  }
+  return started + 1;
+}
+
 #else
 // =============================== POSIX ===============================
 // The Windows calls map onto the dynamic loader: a module is a dlopen handle,
@@ -83,6 +123,37 @@ StatusCode PlanMutexCreate() {
 void PlanMutexClose() { pthread_mutex_destroy(&g_plan_mutex); }
 void PlanMutexLock() { pthread_mutex_lock(&g_plan_mutex); }
 void PlanMutexUnlock() { pthread_mutex_unlock(&g_plan_mutex); }
+
+int Processors() {
+  const long online = sysconf(_SC_NPROCESSORS_ONLN);
+  return online > 0 ? static_cast<int>(std::min<long>(online, kMaxThreads)) : 1;
+}
+
+namespace {
+struct ThreadStart {
+  void (*body)(void*);
+  void* context;
+};
+
+void* ThreadMain(void* start) {
+  const auto* s = static_cast<const ThreadStart*>(start);
+  s->body(s->context);
+  return nullptr;
+}
+}  // namespace
+
+int RunOnThreads(int threads, void (*body)(void*), void* context) {
+  ThreadStart start{body, context};
+  pthread_t handles[kMaxThreads];
+  int started = 0;
+  for (int t = 1; t < threads && started < kMaxThreads; ++t) {
+    if (pthread_create(&handles[started], nullptr, ThreadMain, &start) != 0) break;
+    ++started;
+  }
+  body(context);
+  for (int t = 0; t < started; ++t) pthread_join(handles[t], nullptr);
+  return started + 1;
+}
 
 #endif
 

@@ -1,6 +1,7 @@
 // Every call into the operating system lives behind this header: module
-// lookup, the fatal message, process exit, and the one process-wide mutex that
-// guards the FFT plan list. platform.cpp has a Windows and a POSIX branch.
+// lookup, the fatal message, process exit, the one process-wide mutex that
+// guards the FFT plan list, and the threads of a batch. platform.cpp has a
+// Windows and a POSIX branch.
 #pragma once
 
 #include "core/types.h"
@@ -28,5 +29,17 @@ StatusCode PlanMutexCreate();
 void PlanMutexClose();
 void PlanMutexLock();
 void PlanMutexUnlock();
+
+// The most threads one batch runs on.
+constexpr int kMaxThreads = 256;
+
+// Processors the process may run on (at least 1, at most kMaxThreads).
+int Processors();
+
+// Runs body(context) on `threads` threads at once, the calling thread one of
+// them, and returns when every one has returned. A thread the system refuses
+// is simply not started: the bodies share their work, so fewer threads finish
+// it too. Returns the number of threads that ran the body.
+int RunOnThreads(int threads, void (*body)(void*), void* context);
 
 }  // namespace platform

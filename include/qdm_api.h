@@ -656,6 +656,158 @@ QDM_PLAIN_API int32_t qdm_stabilization_complex(const qdm_complex* x, int32_t n,
                                                 int32_t* mdl_order);
 /** @} */
 
+/* ---------------------------------------------------------------------------- */
+/** @name Batches: one fit over many records
+ * Each fit above has a batch twin, `qdm_<fit>_batch_real` /
+ * `qdm_<fit>_batch_complex`, that fits `count` records of n samples each on
+ * up to `threads` threads. Its arguments are the single-record function's,
+ * with two added after n and two at the end:
+ * @param count     records, >= 0
+ * @param distance  elements (doubles, or ::qdm_complex pairs) from the first
+ *                  sample of one record to the first of the next, >= 0: record
+ *                  i is x[i distance .. i distance + n - 1]. distance = n for
+ *                  the rows of a C-contiguous count-by-n array; a larger
+ *                  distance skips padding or other columns; a smaller one
+ *                  fits overlapping windows of one long record
+ *                  (distance = hop), and 0 the same record count times.
+ * @param status    out: count statuses, status[i] that of record i
+ * @param threads   threads to run on, >= 0; 0: one per processor. The
+ *                  calling thread is one of them; fewer run when the system
+ *                  refuses one, or when there are fewer records.
+ * Every output of the single function becomes an array of count rows, packed:
+ * record i's values of an output of R values per record start at
+ * out + i R. R is the room the single function asks for: the order p + 1
+ * coefficients and p poles or roots; `order` values for each mode array of
+ * Prony and the pencil (M); `components` for the PCAR spectrum's modes;
+ * qdm_spectrum_length(points) for a spectrum; 1 for each scalar (a mode
+ * count, mse, noise_variance, f0, df, fit_error, the MDL order).
+ * The pencil and PCAR batches take `solver` as their *_solver functions do.
+ *
+ * Record i's results and status[i] are those of the single-record function
+ * called on record i, bit for bit, whatever the thread count: each record is
+ * fitted by that function on one thread, with the library's BLAS on one
+ * thread. What concerns every record is checked once, before any record is
+ * read: the layout (::QDM_ERR_BATCH for a negative count, distance or
+ * threads, or records beyond the address space; ::QDM_ERR_NULL_POINTER for a
+ * null status), then the single function's argument checks (sizes, pointers,
+ * the work bound, fs). Such an error is returned by the batch call and
+ * nothing is written. Otherwise every record is fitted, and what belongs to
+ * one record (a NaN sample, a degenerate record, a failed solve, no memory)
+ * is that record's status, its outputs zeroed as the single function zeroes
+ * them, while every other record completes. The call then returns ::QDM_OK
+ * when no status is an error (warnings included), or
+ * ::QDM_WARN_RECORD_FAILED when some record failed; qdm_last_error_message()
+ * then names the first, as "record 17: x[3] is not finite: nan".
+ *
+ * Why this shape. A caller's records are most often rows of one array: a
+ * matrix of pulses, a voxel grid, a NumPy array whose last axis is time. So,
+ * as in FFTW's advanced interface (howmany, idist) and LAPACK's strided
+ * batches (batch count, stride between matrices, one info per problem), the
+ * records are one pointer, a count and a distance, rather than an array of
+ * pointers: nothing to build per record, and any row-major view of a larger
+ * array is described without a copy. The samples of a record stay contiguous,
+ * as every fit reads them; a record with a stride of its own (a column of a
+ * row-major array) is copied by the caller, which NumPy's `ascontiguousarray`
+ * does at memory speed. Outputs are the caller's fresh arrays, so they are
+ * packed and need no distances of their own. One status per record, as
+ * LAPACK's batched `info` arrays, because a batch of measured records holds
+ * the odd bad one, and one bad record must not cost the others their fits.
+ * The threads are the library's so that every face (C, Python, the tool)
+ * runs the same scheduler: records are handed out one at a time from a
+ * shared counter, so uneven records even out.
+ * @{ */
+QDM_PLAIN_API int32_t qdm_covariance_batch_real(const double* x, int32_t n, int64_t count,
+                                                int64_t distance, int32_t order,
+                                                double* coefficients, qdm_complex* poles,
+                                                double* noise_variance, int32_t* status,
+                                                int32_t threads);
+QDM_PLAIN_API int32_t qdm_covariance_batch_complex(const qdm_complex* x, int32_t n, int64_t count,
+                                                   int64_t distance, int32_t order,
+                                                   qdm_complex* coefficients, qdm_complex* poles,
+                                                   double* noise_variance, int32_t* status,
+                                                   int32_t threads);
+QDM_PLAIN_API int32_t qdm_pcar_batch_real(const double* x, int32_t n, int64_t count,
+                                          int64_t distance, int32_t order, int32_t components,
+                                          int32_t solver, double* coefficients, qdm_complex* roots,
+                                          int32_t* status, int32_t threads);
+QDM_PLAIN_API int32_t qdm_pcar_batch_complex(const qdm_complex* x, int32_t n, int64_t count,
+                                             int64_t distance, int32_t order, int32_t components,
+                                             int32_t solver, qdm_complex* coefficients,
+                                             qdm_complex* roots, int32_t* status,
+                                             int32_t threads);
+QDM_PLAIN_API int32_t qdm_prony_batch_real(const double* x, int32_t n, int64_t count,
+                                           int64_t distance, int32_t order, double fs,
+                                           int32_t real_signal, double* amplitude, double* phase,
+                                           double* damping, double* frequency, int32_t* modes,
+                                           int32_t* status, int32_t threads);
+QDM_PLAIN_API int32_t qdm_prony_batch_complex(const qdm_complex* x, int32_t n, int64_t count,
+                                              int64_t distance, int32_t order, double fs,
+                                              double* amplitude, double* phase, double* damping,
+                                              double* frequency, int32_t* modes, int32_t* status,
+                                              int32_t threads);
+QDM_PLAIN_API int32_t qdm_matrix_pencil_batch_real(const double* x, int32_t n, int64_t count,
+                                                   int64_t distance, int32_t pencil, int32_t order,
+                                                   double fs, int32_t real_signal, int32_t solver,
+                                                   double* amplitude, double* phase,
+                                                   double* damping, double* frequency,
+                                                   int32_t* modes, double* mse, int32_t* status,
+                                                   int32_t threads);
+QDM_PLAIN_API int32_t qdm_matrix_pencil_batch_complex(
+    const qdm_complex* x, int32_t n, int64_t count, int64_t distance, int32_t pencil,
+    int32_t order, double fs, int32_t solver, double* amplitude, double* phase, double* damping,
+    double* frequency, int32_t* modes, double* mse, int32_t* status, int32_t threads);
+QDM_PLAIN_API int32_t qdm_mdl_order_batch_real(const double* x, int32_t n, int64_t count,
+                                               int64_t distance, int32_t pencil, int32_t min_order,
+                                               int32_t* order, int32_t* status, int32_t threads);
+QDM_PLAIN_API int32_t qdm_mdl_order_batch_complex(const qdm_complex* x, int32_t n, int64_t count,
+                                                  int64_t distance, int32_t pencil,
+                                                  int32_t min_order, int32_t* order,
+                                                  int32_t* status, int32_t threads);
+QDM_PLAIN_API int32_t qdm_covariance_psd_batch_real(const double* x, int32_t n, int64_t count,
+                                                    int64_t distance, int32_t order, int32_t points,
+                                                    double fs, double* spectrum, double* f0,
+                                                    double* df, double* noise_variance,
+                                                    int32_t* status, int32_t threads);
+QDM_PLAIN_API int32_t qdm_covariance_psd_batch_complex(const qdm_complex* x, int32_t n,
+                                                       int64_t count, int64_t distance,
+                                                       int32_t order, int32_t points, double fs,
+                                                       double* spectrum, double* f0, double* df,
+                                                       double* noise_variance, int32_t* status,
+                                                       int32_t threads);
+QDM_PLAIN_API int32_t qdm_pcar_psd_batch_real(const double* x, int32_t n, int64_t count,
+                                              int64_t distance, int32_t order, int32_t points,
+                                              int32_t components, double fs, int32_t real_signal,
+                                              double* amplitude, double* phase, double* frequency,
+                                              int32_t* modes, double* spectrum, double* f0,
+                                              double* df, double* fit_error, int32_t* status,
+                                              int32_t threads);
+QDM_PLAIN_API int32_t qdm_pcar_psd_batch_complex(const qdm_complex* x, int32_t n, int64_t count,
+                                                 int64_t distance, int32_t order, int32_t points,
+                                                 int32_t components, double fs, double* amplitude,
+                                                 double* phase, double* frequency, int32_t* modes,
+                                                 double* spectrum, double* f0, double* df,
+                                                 double* fit_error, int32_t* status,
+                                                 int32_t threads);
+
+/** The error bars of a batch of fits. `room` (>= 1, else ::QDM_ERR_NO_MODES)
+ *  is the row length of the eight mode arrays, and `modes` holds count mode
+ *  counts: record i's modes are the first modes[i] values of row i, as a
+ *  Prony or pencil batch with order = room leaves them. A count above room
+ *  is that record's ::QDM_ERR_ROOM; a count of 0 (a record whose fit failed)
+ *  its ::QDM_ERR_NO_MODES, as the single function gives it. */
+QDM_PLAIN_API int32_t qdm_mode_errors_batch_real(
+    const double* x, int32_t n, int64_t count, int64_t distance, double fs, int32_t real_signal,
+    int32_t room, const int32_t* modes, const double* amplitude, const double* phase,
+    const double* damping, const double* frequency, double* amplitude_se, double* phase_se,
+    double* damping_se, double* frequency_se, double* noise_variance, int32_t* status,
+    int32_t threads);
+QDM_PLAIN_API int32_t qdm_mode_errors_batch_complex(
+    const qdm_complex* x, int32_t n, int64_t count, int64_t distance, double fs, int32_t room,
+    const int32_t* modes, const double* amplitude, const double* phase, const double* damping,
+    const double* frequency, double* amplitude_se, double* phase_se, double* damping_se,
+    double* frequency_se, double* noise_variance, int32_t* status, int32_t threads);
+/** @} */
+
 #ifdef __cplusplus
 }
 #endif

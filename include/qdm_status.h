@@ -4,8 +4,9 @@
  *
  * 0 is success. 20001 is a warning (the plain face only: the results are
  * complete and valid); 20002 the error bars' warning (NaN errors for the
- * modes whose bound is singular, every other value complete). Codes from
- * -42401 down to -42427 are argument errors, -424xx in the host's numbering;
+ * modes whose bound is singular, every other value complete); 20003 a batch's
+ * (some records failed, each with its own status). Codes from
+ * -42401 down to -42428 are argument errors, -424xx in the host's numbering;
  * the plain face writes nothing when it returns one. -30001 is the plain
  * face's screen of its own results: a fit ran, but a number it was about to
  * hand back is NaN or infinite. The other negative codes are numeric and FFT
@@ -23,6 +24,8 @@
   X(QDM_WARN_BOUND_SINGULAR, 20002,                                                            \
     "success, but the error bound is singular or badly conditioned for some modes (their "     \
     "errors are NaN)")                                                                         \
+  X(QDM_WARN_RECORD_FAILED, 20003,                                                             \
+    "the batch ran, but one or more of its records failed (see their statuses)")              \
   X(QDM_ERR_EMPTY_INPUT, -42401, "input array has no elements (n < 1)")                        \
   X(QDM_ERR_ORDER, -42411, "order or pencil parameter negative or above floor(2n/3)")          \
   X(QDM_ERR_COUNT, -42412,                                                                     \
@@ -51,6 +54,9 @@
   X(QDM_ERR_TOLERANCE, -42426, "a stabilization tolerance (frequency or damping) is negative") \
   X(QDM_ERR_ROOM, -42427,                                                                      \
     "the caller's table has fewer rows than the call may write (qdm_stabilization_rows)")      \
+  X(QDM_ERR_BATCH, -42428,                                                                     \
+    "a batch's count, distance or threads is negative, or its records lie beyond the address " \
+    "space")                                                                                   \
   X(QDM_ERR_NON_FINITE_RESULT, -30001,                                                         \
     "a result of the fit is NaN or infinite (a degenerate record: zero, constant, a spike, a " \
     "ramp, or values beyond the range of double)")                                             \

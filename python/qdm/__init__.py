@@ -138,7 +138,7 @@ class Error(Exception):
 class ArgumentError(Error, ValueError):
     """A bad argument, refused before the fit ran; also a `ValueError`.
 
-    The library's argument codes -42401 to -42427 (empty input, an order,
+    The library's argument codes -42401 to -42428 (empty input, an order,
     count, size or sampling rate out of range, a NaN or infinite sample, a
     fit that would exceed the library's work-memory bound, ...), or, with
     `code` None, what the binding refuses itself: an input that is not 1-D,

@@ -165,10 +165,11 @@ TEST(PlainApi, NoFailureIsReportedAsSuccess) {
 // own refusals and failures. The table must hold exactly these, each with a
 // text of its own, none of them the text of an unknown code.
 TEST(PlainApi, EveryDocumentedStatusHasItsOwnText) {
-  const std::set<int32_t> documented = {
-      0,      20001,  -42401, -42411, -42412, -42413, -42414, -42415, -42416, -42417, -42418,
-      -20001, -20003, -20004, -20061, -20062, -20063, -20068, -20116, -20999, -1,     -42419,
-      -42420, -42421, -42422, -42423, -30001, -20070, 20002,  -42424, -42425, -42426, -42427};
+  const std::set<int32_t> documented = {0,      20001,  -42401, -42411, -42412, -42413, -42414,
+                                        -42415, -42416, -42417, -42418, -20001, -20003, -20004,
+                                        -20061, -20062, -20063, -20068, -20116, -20999, -1,
+                                        -42419, -42420, -42421, -42422, -42423, -30001, -20070,
+                                        20002,  -42424, -42425, -42426, -42427, 20003,  -42428};
   std::set<int32_t> table;
 #define QDM_TEST_STATUS(name, code, text) table.insert(code);
   QDM_STATUS_TABLE(QDM_TEST_STATUS)
