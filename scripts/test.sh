@@ -17,6 +17,7 @@ cd "$(dirname "$0")/.."
 scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
   libopenblas0-pthread libopenblas-pthread-dev libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev \
   python3-numpy python3-pytest python3-matplotlib python3-venv python3-pip \
+  python3-dask python3-distributed python3-xarray \
   pkg-config doxygen dpkg-dev libcli11-dev nlohmann-json3-dev gnuplot-nox \
   clang-14 libclang-rt-14-dev clang-format-14 clang-tidy-14 valgrind || exit 1
 
