@@ -75,9 +75,12 @@ def _probe_record(n, dtype):
         return noise.astype(dtype)
 
 
-def _records(block, fit, kwargs):
+def _records(block, fit_name, kwargs):
     """The block function: fits every record of a block (samples on the last
-    axis) in one qdm call on one thread, and returns the per-record fields."""
+    axis) in one qdm call on one thread, and returns the per-record fields.
+    The fit goes into the graph by name, so a task pickles to a few bytes and
+    each worker calls its own qdm."""
+    fit = getattr(_qdm, fit_name)
     one = block.ndim == 1
     with _warnings.catch_warnings():
         # Rank deficiency is a per-record status (20001) in the result.
@@ -109,7 +112,7 @@ def _over(fit, x, axis, kwargs):
     sizes = {f"{k}{j}": s for k, c in zip(names, cores) for j, s in enumerate(c)}
     signature = "(qdm_samples)->" + ",".join(f"({d})" for d in dims)
     x = x.rechunk({x.ndim - 1: -1})
-    out = _da.apply_gufunc(_records, signature, x, fit=fit, kwargs=kwargs, meta=metas,
+    out = _da.apply_gufunc(_records, signature, x, fit_name=fit.__name__, kwargs=kwargs, meta=metas,
                            output_sizes=sizes, vectorize=False)
     if len(names) == 1:
         out = (out,)
