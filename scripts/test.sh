@@ -76,9 +76,9 @@ suite release "${release[@]}" || failed=1
 tsan() {
   cmake -S . -B build/tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_TSAN=ON -DQDM_BLAS=reference \
     -DQDM_BUILD_EXAMPLE=OFF -DQDM_WERROR=ON "${launcher[@]}" >/dev/null || return 1
-  cmake --build build/tsan -j"$jobs" --target e2e_concurrency api_plain_threads >/dev/null || return 1
+  cmake --build build/tsan -j"$jobs" --target e2e_concurrency api_plain_threads api_plain_batch >/dev/null || return 1
   TSAN_OPTIONS="halt_on_error=1 suppressions=$PWD/tests/tsan.supp" ctest --test-dir build/tsan \
-    -R '^(e2e\.Concurrency|api\.PlainThreads)' \
+    -R '^(e2e\.Concurrency|api\.PlainThreads|api\.PlainBatch)' \
     --output-on-failure --timeout 900 | tail -n 3
 }
 # The fuzzer: every corpus and regression input once, then a minute of fuzzing
