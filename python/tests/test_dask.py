@@ -3,6 +3,7 @@ same records bit for bit, statuses included, on the threaded scheduler, with
 any chunking, and on a local cluster of two worker processes; building the
 graph reads nothing of x."""
 import doctest
+import faulthandler
 import os
 import subprocess
 import sys
@@ -161,6 +162,9 @@ def test_xarray_apply_ufunc_runs_a_fit_per_chunk():
 def test_a_cluster_of_two_worker_processes_equals_the_serial_call():
     distributed = pytest.importorskip("distributed")
     started = time.monotonic()
+    # A cluster that hangs while starting or stopping ends the run, with every
+    # thread's traceback, rather than holding the suite.
+    faulthandler.dump_traceback_later(180, exit=True)
     # The workers are new processes: they find qdm and its library through the
     # environment (PYTHONPATH, QDM_LIBRARY), which they inherit.
     cluster = distributed.LocalCluster(n_workers=2, threads_per_worker=1, processes=True,
@@ -183,4 +187,5 @@ def test_a_cluster_of_two_worker_processes_equals_the_serial_call():
             _same(type(lazy)(*got), _serial("covariance_psd", z, -1, dict(order=4)))
     finally:
         cluster.close(timeout=60)
+        faulthandler.cancel_dump_traceback_later()
     assert time.monotonic() - started < 120
