@@ -11,7 +11,9 @@ front, each record's values behind it, as the qdm fit gives them for an N-D
 numpy array (mode fields padded with NaN past a record's mode count, a
 per-record ``status``; `mdl_order` gives ``(order, status)``). A record that
 fails (a NaN sample, an all-zero record) gets its status and NaN outputs; the
-other records complete. Spectra share one ``frequencies`` axis.
+other records complete. A chunk with a rank-deficient record (status 20001)
+gives a `qdm.RankDeficientWarning` where it runs. Spectra share one
+``frequencies`` axis.
 
 Nothing is fitted until the result is computed. The samples' axis is
 rechunked to one chunk; the other axes keep their chunks, and each chunk of
@@ -82,10 +84,9 @@ def _records(block, fit_name, kwargs):
     each worker calls its own qdm."""
     fit = getattr(_qdm, fit_name)
     one = block.ndim == 1
-    with _warnings.catch_warnings():
-        # Rank deficiency is a per-record status (20001) in the result.
-        _warnings.simplefilter("ignore", _qdm.RankDeficientWarning)
-        result = fit(block[None] if one else block, axis=-1, workers=1, **kwargs)
+    # A rank-deficient record warns here as in the batch call; it is not
+    # silenced, since warnings.catch_warnings is not safe in Dask's threads.
+    result = fit(block[None] if one else block, axis=-1, workers=1, **kwargs)
     fields = [_np.asarray(v) for k, v in zip(result._fields, result) if k not in _SHARED]
     return tuple(v[0] for v in fields) if one else tuple(fields)
 
