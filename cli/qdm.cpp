@@ -1,7 +1,8 @@
 // qdm: the command-line tool over the plain C API (libqdm_api). One method per run on a CSV
 // file, standard input or the built-in example; a table, JSON or CSV on standard output, and a
-// plot drawn with gnuplot. With several files (or --jobs) the files are fitted on a pool of
-// threads and printed as JSON lines, in input order. Exit status: 0 success, 1 bad usage,
+// plot drawn with gnuplot. With several files (or --jobs) the records of each length and
+// type go to the library's batch call on --jobs threads, a chunk of files at a time, and
+// are printed as JSON lines, in input order. Exit status: 0 success, 1 bad usage,
 // input or value (a -424xx library status included), 2 the fit failed (any other library
 // status, or no memory; several files: any record failed), 3 an output not written.
 #include <algorithm>
@@ -1436,7 +1437,10 @@ int Main(int argc, char** argv) {
     sub->add_flag("--csv", o.csv, "print the main table as CSV")->excludes(json);
     sub->add_option("--plot", o.plot, "draw the results to FILE.png with gnuplot")
         ->check(kNonEmpty);
-    sub->add_option("--jobs", o.jobs, "fit the files on N threads (0: one per core), JSON lines")
+    sub->add_option("--jobs", o.jobs,
+                    "fit the files on N threads (0: one per core), one JSON line each: the "
+                    "records of each length and type in one batch call (stabilization: file "
+                    "by file, N at a time) [1]")
         ->check(kNonEmpty)
         ->check(CLI::Range(0, 1024));
     sub->footer("An option of another method is an error, or ignored with --ignore-unknown.");
