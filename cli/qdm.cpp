@@ -410,12 +410,12 @@ struct Buffer {
 // A group's fits as the batch functions leave them: row i of every output is
 // the group's record i.
 struct Rows {
-  const char* function = "";        // the single-record function each record went through
-  std::optional<Failure> refused;   // an argument error: that of every record
-  int64_t firstFailed = -1;         // the first record that failed, and its words
+  const char* function = "";       // the single-record function each record went through
+  std::optional<Failure> refused;  // an argument error: that of every record
+  int64_t firstFailed = -1;        // the first record that failed, and its words
   std::string firstWords;
   std::vector<int32_t> status, count, order, errorStatus;
-  int32_t errorsRefused = QDM_OK;   // the error bars' argument error, every record's
+  int32_t errorsRefused = QDM_OK;                 // the error bars' argument error, every record's
   int64_t coefRow = 0, poleRow = 0, modeRow = 0;  // doubles per record
   Buffer a, z, amp, phase, damping, freq, seAmp, sePhase, seDamping, seFreq, spectrum;
   std::vector<double> variance, mse, f0, df, fitError, modeNoise;
@@ -449,11 +449,10 @@ Rows Call(const Plan& q, const double* x, int64_t count, int32_t threads) {
     for (Buffer* b : {&w.amp, &w.phase, &w.damping, &w.freq}) b->Make(count, w.modeRow);
   if (q.m == kCovSpectrum) {
     // Null outputs: the library checks the sizes before room is made for them.
-    const int32_t sizes =
-        q.complex ? qdm_ar_psd_complex(nullptr, p, 0.0, q.points, q.rate, 0, nullptr, nullptr,
-                                       nullptr, nullptr)
-                  : qdm_ar_psd_real(nullptr, p, 0.0, q.points, q.rate, q.oneSided, nullptr,
-                                    nullptr, nullptr, nullptr);
+    const int32_t sizes = q.complex ? qdm_ar_psd_complex(nullptr, p, 0.0, q.points, q.rate, 0,
+                                                         nullptr, nullptr, nullptr, nullptr)
+                                    : qdm_ar_psd_real(nullptr, p, 0.0, q.points, q.rate, q.oneSided,
+                                                      nullptr, nullptr, nullptr, nullptr);
     if (sizes != QDM_ERR_NULL_POINTER && sizes < 0) {
       char words[256];
       qdm_last_error_message(words, sizeof words);
@@ -480,15 +479,14 @@ Rows Call(const Plan& q, const double* x, int64_t count, int32_t threads) {
       w.function = "qdm_covariance";
       status = q.complex ? qdm_covariance_batch_complex(cx, n, count, n, p, w.a, w.z,
                                                         w.variance.data(), st, threads)
-                         : qdm_covariance_batch_real(x, n, count, n, p, w.a, w.z,
-                                                     w.variance.data(), st, threads);
+                         : qdm_covariance_batch_real(x, n, count, n, p, w.a, w.z, w.variance.data(),
+                                                     st, threads);
       break;
     case kPcar:
       w.function = "qdm_pcar_solver";
-      status = q.complex ? qdm_pcar_batch_complex(cx, n, count, n, p, k, q.solver, w.a, w.z, st,
-                                                  threads)
-                         : qdm_pcar_batch_real(x, n, count, n, p, k, q.solver, w.a, w.z, st,
-                                               threads);
+      status = q.complex
+                   ? qdm_pcar_batch_complex(cx, n, count, n, p, k, q.solver, w.a, w.z, st, threads)
+                   : qdm_pcar_batch_real(x, n, count, n, p, k, q.solver, w.a, w.z, st, threads);
       break;
     case kMdl:
       w.function = "qdm_mdl_order";
@@ -506,13 +504,12 @@ Rows Call(const Plan& q, const double* x, int64_t count, int32_t threads) {
       break;
     case kPencil:
       w.function = "qdm_matrix_pencil_solver";
-      status = q.complex
-                   ? qdm_matrix_pencil_batch_complex(cx, n, count, n, L, M, q.rate, q.solver,
-                                                     w.amp, w.phase, w.damping, w.freq, found,
-                                                     w.mse.data(), st, threads)
-                   : qdm_matrix_pencil_batch_real(x, n, count, n, L, M, q.rate, q.flag, q.solver,
-                                                  w.amp, w.phase, w.damping, w.freq, found,
-                                                  w.mse.data(), st, threads);
+      status = q.complex ? qdm_matrix_pencil_batch_complex(cx, n, count, n, L, M, q.rate, q.solver,
+                                                           w.amp, w.phase, w.damping, w.freq, found,
+                                                           w.mse.data(), st, threads)
+                         : qdm_matrix_pencil_batch_real(x, n, count, n, L, M, q.rate, q.flag,
+                                                        q.solver, w.amp, w.phase, w.damping, w.freq,
+                                                        found, w.mse.data(), st, threads);
       break;
     case kPcarSpectrum:
       w.function = "qdm_pcar_psd";
@@ -520,10 +517,9 @@ Rows Call(const Plan& q, const double* x, int64_t count, int32_t threads) {
                    ? qdm_pcar_psd_batch_complex(cx, n, count, n, p, q.points, k, q.rate, w.amp,
                                                 w.phase, w.freq, found, w.spectrum, w.f0.data(),
                                                 w.df.data(), w.fitError.data(), st, threads)
-                   : qdm_pcar_psd_batch_real(x, n, count, n, p, q.points, k, q.rate, q.flag,
-                                             w.amp, w.phase, w.freq, found, w.spectrum,
-                                             w.f0.data(), w.df.data(), w.fitError.data(), st,
-                                             threads);
+                   : qdm_pcar_psd_batch_real(x, n, count, n, p, q.points, k, q.rate, q.flag, w.amp,
+                                             w.phase, w.freq, found, w.spectrum, w.f0.data(),
+                                             w.df.data(), w.fitError.data(), st, threads);
       break;
     case kStabilization:  // no batch: one record at a time
       break;
@@ -559,9 +555,8 @@ Rows Call(const Plan& q, const double* x, int64_t count, int32_t threads) {
                                           w.seDamping, w.seFreq, w.modeNoise.data(),
                                           w.errorStatus.data(), threads)
           : qdm_mode_errors_batch_real(x, n, count, n, q.rate, q.flag, room, fitted.data(), w.amp,
-                                       w.phase, w.damping, w.freq, w.seAmp, w.sePhase,
-                                       w.seDamping, w.seFreq, w.modeNoise.data(),
-                                       w.errorStatus.data(), threads);
+                                       w.phase, w.damping, w.freq, w.seAmp, w.sePhase, w.seDamping,
+                                       w.seFreq, w.modeNoise.data(), w.errorStatus.data(), threads);
   if (errors != QDM_OK && errors != QDM_WARN_RECORD_FAILED) w.errorsRefused = errors;
   return w;
 }
@@ -589,8 +584,7 @@ Record StabilizationRecord(const Plan& q, const std::string& input, const Signal
 
 // Record i of a group fitted by Call, as its JSON record and spectrum; x holds
 // its samples. A failure throws, worded as the single-record call words it.
-Record Present(const Plan& q, const std::string& input, const Rows& w, int64_t i,
-               const double* x) {
+Record Present(const Plan& q, const std::string& input, const Rows& w, int64_t i, const double* x) {
   if (w.refused) throw *w.refused;
   Record r;
   const Method m = q.m;
@@ -613,8 +607,8 @@ Record Present(const Plan& q, const std::string& input, const Rows& w, int64_t i
     copy(w.z, w.poleRow, w.poleRow, z);
   }
   if (kModal & Bit(m))
-    for (auto [from, to] : {std::pair{&w.amp, &amp}, {&w.phase, &phase}, {&w.damping, &damping},
-                            {&w.freq, &freq}})
+    for (auto [from, to] :
+         {std::pair{&w.amp, &amp}, {&w.phase, &phase}, {&w.damping, &damping}, {&w.freq, &freq}})
       if (m != kPcarSpectrum || from != &w.damping) copy(*from, w.modeRow, count, *to);
   const double variance = w.variance[at], mse = w.mse[at], fitError = w.fitError[at];
   std::unique_ptr<double[]> db = (kSpectra & Bit(m)) ? SpectrumOutput(length) : nullptr;
@@ -622,11 +616,11 @@ Record Present(const Plan& q, const std::string& input, const Rows& w, int64_t i
   std::unique_ptr<double[]> psd = m == kCovSpectrum ? SpectrumOutput(length) : nullptr;
   int32_t laid = 0;
   if (m == kCovSpectrum) {
-    CheckFailure(q.complex ? qdm_ar_psd_complex(static_cast<const qdm_complex*>(a), p, variance,
-                                                points, rate, 0, axis.get(), db.get(), psd.get(),
-                                                &laid)
-                           : qdm_ar_psd_real(a.v.data(), p, variance, points, rate, q.oneSided,
-                                             axis.get(), db.get(), psd.get(), &laid),
+    CheckFailure(q.complex
+                     ? qdm_ar_psd_complex(static_cast<const qdm_complex*>(a), p, variance, points,
+                                          rate, 0, axis.get(), db.get(), psd.get(), &laid)
+                     : qdm_ar_psd_real(a.v.data(), p, variance, points, rate, q.oneSided,
+                                       axis.get(), db.get(), psd.get(), &laid),
                  "qdm_ar_psd", q.complex, r);
   }
   if (m == kPcarSpectrum) {
@@ -656,8 +650,10 @@ Record Present(const Plan& q, const std::string& input, const Rows& w, int64_t i
         std::fill(e->v.begin(), e->v.end(), NAN);
       modeNoise = NAN;
     } else {
-      for (auto [from, to] : {std::pair{&w.seAmp, &seAmp}, {&w.sePhase, &sePhase},
-                              {&w.seDamping, &seDamping}, {&w.seFreq, &seFreq}})
+      for (auto [from, to] : {std::pair{&w.seAmp, &seAmp},
+                              {&w.sePhase, &sePhase},
+                              {&w.seDamping, &seDamping},
+                              {&w.seFreq, &seFreq}})
         copy(*from, w.modeRow, count, *to);
       modeNoise = w.modeNoise[at];
     }
@@ -1176,9 +1172,9 @@ struct Group {
   double defaultRate = 1.0;
   std::vector<size_t> members;  // entries, in input order
   std::optional<Plan> plan;
-  std::exception_ptr error;        // what the plan or the call threw, every member's
-  std::vector<double> samples;     // the members' records one after another
-  const double* x = nullptr;       // those records (a lone member's own samples)
+  std::exception_ptr error;     // what the plan or the call threw, every member's
+  std::vector<double> samples;  // the members' records one after another
+  const double* x = nullptr;    // those records (a lone member's own samples)
   Rows rows;
 };
 
@@ -1209,8 +1205,7 @@ void FitGroup(Method m, const Options& o, std::vector<Entry>& chunk, Group& g) {
 // file, in input order. The stabilization diagram has no batch: its records
 // are fitted one by one on --jobs threads.
 int RunBatch(Method m, const Options& o) {
-  const int32_t spectrumValues =
-      m == kPcarSpectrum ? qdm_spectrum_length(o.nfft.value_or(512)) : 0;
+  const int32_t spectrumValues = m == kPcarSpectrum ? qdm_spectrum_length(o.nfft.value_or(512)) : 0;
   int exit = kOk;
   for (size_t next = 0; next < o.files.size();) {
     std::vector<Entry> chunk;
