@@ -1,15 +1,18 @@
 #!/usr/bin/env bash
 # Throughput of `qdm METHOD --jobs N FILE...`: writes RECORDS CSV records of
 # SAMPLES real samples (two damped sinusoids in noise, fixed seed) and times one
-# run over all of them for each job count, best of REPEATS runs.
+# run over all of them for each job count, best of REPEATS runs. The run reads
+# the files, fits them with the library's batch call on N threads (all records
+# have one length: one call per chunk of files) and prints their JSON lines, so
+# the figure is the whole tool's, reading and printing included.
 #
 #   bench/cli_jobs.sh [QDM] [RECORDS] [SAMPLES] [METHOD] [JOBS...]
-#   defaults: build/release/cli/qdm 1000 512 pencil, jobs 1 2
+#   defaults: build/release/cli/qdm 2000 256 pencil, jobs 1 2
 #
 # Prints records per second for each job count and the speed-up over one job.
 set -euo pipefail
 qdm=$(realpath "${1:-build/release/cli/qdm}")
-records=${2:-1000} samples=${3:-512} method=${4:-pencil}
+records=${2:-2000} samples=${3:-256} method=${4:-pencil}
 shift $(($# < 4 ? $# : 4))
 jobs=("${@:-1}")
 [ $# -eq 0 ] && jobs=(1 2)

@@ -1,23 +1,26 @@
 // qdm: the command-line tool over the plain C API (libqdm_api). One method per run on a CSV
 // file, standard input or the built-in example; a table, JSON or CSV on standard output, and a
-// plot drawn with gnuplot. With several files (or --jobs) the files are fitted on a pool of
-// threads and printed as JSON lines, in input order. Exit status: 0 success, 1 bad usage,
+// plot drawn with gnuplot. With several files (or --jobs) the records of each length and
+// type go to the library's batch call on --jobs threads, a chunk of files at a time, and
+// are printed as JSON lines, in input order. Exit status: 0 success, 1 bad usage,
 // input or value (a -424xx library status included), 2 the fit failed (any other library
 // status, or no memory; several files: any record failed), 3 an output not written.
 #include <algorithm>
 #include <atomic>
 #include <charconv>
 #include <cmath>
-#include <condition_variable>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <exception>
+#include <functional>
+#include <map>
 #include <memory>
-#include <mutex>
 #include <new>
 #include <optional>
 #include <string>
 #include <thread>
+#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -148,19 +151,30 @@ constexpr const char* kSpectrumColumns[] = {"frequency_hz", "power_db", "psd_per
 // A value the library refuses (an argument error, -424xx) is bad input, exit 1;
 // any other error status is a failed fit, exit 2. The message carries the status
 // and, for a refusal, the library's words for it: the argument (as the C header
-// names it), its value and the limit it broke. It is read on the thread that
-// made the call, right after it.
-void Check(int32_t status, const char* function, bool complex, Record& r) {
+// names it), its value and the limit it broke.
+bool Refused(int32_t status) { return status <= -42401 && status >= -42499; }
+
+Failure Refusal(int32_t status, const char* function, bool complex, const char* words) {
+  const bool refused = Refused(status);
+  return Failure{refused ? kUsage : kFailed, status,
+                 function + std::string(complex ? "_complex" : "_real") + " returned " +
+                     std::to_string(status) + ": " +
+                     (refused && words[0] != '\0' ? words : qdm_status_text(status))};
+}
+
+// Records a call's status; an error throws. The words, when not given, are read
+// on the thread that made the call, right after it.
+void Check(int32_t status, const char* function, bool complex, Record& r,
+           const char* words = nullptr) {
   r.status = status;
   if (status == QDM_WARN_RANK_DEFICIENT) r.warning = qdm_status_text(status);
   if (status == QDM_OK || status == QDM_WARN_RANK_DEFICIENT) return;
-  const bool refused = status <= -42401 && status >= -42499;
-  char words[256];
-  qdm_last_error_message(words, sizeof words);
-  throw Failure{refused ? kUsage : kFailed, status,
-                function + std::string(complex ? "_complex" : "_real") + " returned " +
-                    std::to_string(status) + ": " +
-                    (refused && words[0] != '\0' ? words : qdm_status_text(status))};
+  char last[256];
+  if (words == nullptr) {
+    qdm_last_error_message(last, sizeof last);
+    words = last;
+  }
+  throw Refusal(status, function, complex, words);
 }
 
 // A second call of the same fit: only a failure replaces the first call's status.
@@ -319,12 +333,29 @@ void Stabilize(const Signal& s, double rate, int32_t flag, int32_t L, int32_t mi
   r.spectrumLength = size_t(laid);
 }
 
-Record Fit(Method m, const Options& o, const std::string& input, const Signal& s) {
-  Record r;
-  const double* re = s.values.data();
-  const auto* cx = reinterpret_cast<const qdm_complex*>(s.values.data());
-  const double rate = o.rate.value_or(s.defaultRate);
-  const int32_t flag = o.realSignal ? 1 : 0, n = s.n;
+// What the records of one group (one length, one type, one default rate)
+// share: the method and every parameter resolved for them.
+struct Plan {
+  Method m;
+  int32_t n;
+  bool complex;
+  double rate;
+  int32_t flag, oneSided, solver;
+  bool sort;  // modes by frequency
+  int32_t p, k, L, M, minOrder, points, maxOrder;
+  int32_t length;  // spectrum values, for the spectra
+  Json par;
+};
+
+Plan MakePlan(Method m, const Options& o, int32_t n, bool complex, double defaultRate) {
+  Plan q{};
+  q.m = m;
+  q.n = n;
+  q.complex = complex;
+  q.rate = o.rate.value_or(defaultRate);
+  q.flag = o.realSignal ? 1 : 0;
+  q.solver = SolverOf(o);
+  q.sort = !o.noSort;
   int32_t resolved[std::size(kIntOptions)];
   for (size_t i = 0; i < std::size(kIntOptions); ++i)
     resolved[i] = (o.*kIntOptions[i].field).value_or(kIntOptions[i].fallback);
@@ -337,91 +368,266 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   }
   if (!o.pencil && m == kStabilization)
     resolved[2] = std::max(resolved[2], std::min(resolved[7], n / 2));
-  const auto [p, k, L, M, upper, minOrder, points, maxOrder] = resolved;
-  if (o.realSignal && s.complex && ((kModal | Bit(kStabilization)) & Bit(m)))
+  q.p = resolved[0], q.k = resolved[1], q.L = resolved[2], q.M = resolved[3];
+  q.minOrder = resolved[5], q.points = resolved[6], q.maxOrder = resolved[7];
+  if (o.realSignal && complex && ((kModal | Bit(kStabilization)) & Bit(m)))
     throw Failure{kUsage, {}, "--real-signal applies to real data only, not to complex samples"};
-  if (o.oneSided && s.complex)
+  if (o.oneSided && complex)
     throw Failure{kUsage,
                   {},
                   "--one-sided applies to real data only: complex samples have a "
                   "two-sided spectrum"};
-  const int32_t oneSided = !s.complex && !o.twoSided ? 1 : 0;
-  Json par = Json::object(), res = Json::object();
+  q.oneSided = !complex && !o.twoSided ? 1 : 0;
+  q.length = (kSpectra & Bit(m)) ? qdm_spectrum_length(q.points) : 0;
+  Json& par = q.par = Json::object();
   for (size_t i = 0; i < std::size(kIntOptions); ++i)
     if ((kIntOptions[i].methods & Bit(m)) && kIntOptions[i].field != &Options::upper)
       par[kIntOptions[i].key] = resolved[i];
-  if (m != kMdl) par["rate_hz"] = rate;
-  if ((kModal & Bit(m)) && !s.complex) par["real_signal"] = flag;
+  if (m != kMdl) par["rate_hz"] = q.rate;
+  if ((kModal & Bit(m)) && !complex) par["real_signal"] = q.flag;
   if (kModal & Bit(m)) par["sorted"] = o.noSort ? 0 : 1;
-  if (kSpectra & Bit(m)) par["one_sided"] = oneSided;
+  if (kSpectra & Bit(m)) par["one_sided"] = q.oneSided;
   if (m == kPencil || m == kPcar) par["solver"] = o.solver;
   if (m == kStabilization) {
-    if (!s.complex) par["real_signal"] = flag;
+    if (!complex) par["real_signal"] = q.flag;
     par["freq_tol"] = o.freqTol.value_or(0.01);
     par["damping_tol"] = o.dampingTol.value_or(0.05);
-    Stabilize(s, rate, flag, L, minOrder, maxOrder, par, res, r, !o.plot.empty());
   }
-  // Outputs are sized by the library's own room for the size arguments and,
-  // for a spectrum, its own length for the points asked.
-  const size_t room = size_t(qdm_output_room(n, std::max({p, k, M}))) + 1;
-  Array a(2 * room), z(2 * room), amp(room), phase(room), damping(room), freq(room);
-  const int32_t length = (kSpectra & Bit(m)) ? qdm_spectrum_length(points) : 0;
-  if (m == kCovSpectrum) {
+  return q;
+}
+
+// Output rows the library fills: not initialized, so a size it refuses
+// touches no memory.
+struct Buffer {
+  std::unique_ptr<double[]> v;
+  void Make(int64_t count, int64_t row) {
+    v.reset(new double[size_t(std::max<int64_t>(count * std::max<int64_t>(row, 0), 2))]);
+  }
+  operator double*() const { return v.get(); }
+  operator qdm_complex*() const { return reinterpret_cast<qdm_complex*>(v.get()); }
+};
+
+// A group's fits as the batch functions leave them: row i of every output is
+// the group's record i.
+struct Rows {
+  const char* function = "";       // the single-record function each record went through
+  std::optional<Failure> refused;  // an argument error: that of every record
+  int64_t firstFailed = -1;        // the first record that failed, and its words
+  std::string firstWords;
+  std::vector<int32_t> status, count, order, errorStatus;
+  int32_t errorsRefused = QDM_OK;                 // the error bars' argument error, every record's
+  int64_t coefRow = 0, poleRow = 0, modeRow = 0;  // doubles per record
+  Buffer a, z, amp, phase, damping, freq, seAmp, sePhase, seDamping, seFreq, spectrum;
+  std::vector<double> variance, mse, f0, df, fitError, modeNoise;
+};
+
+// Fits `count` records of q.n samples, one after another from x, with the
+// method's batch function on `threads` threads (0: one per processor), and
+// the modes' error bars with theirs.
+Rows Call(const Plan& q, const double* x, int64_t count, int32_t threads) {
+  Rows w;
+  const int32_t n = q.n, p = q.p, k = q.k, L = q.L, M = q.M;
+  const auto* cx = reinterpret_cast<const qdm_complex*>(x);
+  const size_t records = size_t(count);
+  // A size above floor(2n/3) is refused before anything is written: no rows for it.
+  const auto fits = [&](int32_t size) { return qdm_output_room(n, size) == size; };
+  const int64_t elements = q.complex ? 2 : 1;
+  const bool model = q.m == kCovariance || q.m == kCovSpectrum || q.m == kPcar;
+  w.coefRow = model && fits(p) ? elements * (int64_t(p) + 1) : 0;
+  w.poleRow = model && fits(p) ? 2 * int64_t(std::max(p, 0)) : 0;
+  const int32_t modes = q.m == kProny ? p : q.m == kPencil ? M : q.m == kPcarSpectrum ? k : 0;
+  w.modeRow = fits(modes) ? std::max(modes, 0) : 0;
+  w.status.assign(records, QDM_OK);
+  w.count.assign(records, 0);
+  w.order.assign(records, 0);
+  for (auto* s : {&w.variance, &w.mse, &w.f0, &w.df, &w.fitError}) s->assign(records, 0.0);
+  if (model) {
+    w.a.Make(count, w.coefRow);
+    w.z.Make(count, w.poleRow);
+  }
+  if (kModal & Bit(q.m))
+    for (Buffer* b : {&w.amp, &w.phase, &w.damping, &w.freq}) b->Make(count, w.modeRow);
+  if (q.m == kCovSpectrum) {
     // Null outputs: the library checks the sizes before room is made for them.
-    const int32_t sizes = s.complex ? qdm_ar_psd_complex(nullptr, p, 0.0, points, rate, 0, nullptr,
-                                                         nullptr, nullptr, nullptr)
-                                    : qdm_ar_psd_real(nullptr, p, 0.0, points, rate, oneSided,
+    const int32_t sizes = q.complex ? qdm_ar_psd_complex(nullptr, p, 0.0, q.points, q.rate, 0,
+                                                         nullptr, nullptr, nullptr, nullptr)
+                                    : qdm_ar_psd_real(nullptr, p, 0.0, q.points, q.rate, q.oneSided,
                                                       nullptr, nullptr, nullptr, nullptr);
-    if (sizes != QDM_ERR_NULL_POINTER) Check(sizes, "qdm_ar_psd", s.complex, r);
+    if (sizes != QDM_ERR_NULL_POINTER && sizes < 0) {
+      char words[256];
+      qdm_last_error_message(words, sizeof words);
+      w.refused = Refusal(sizes, "qdm_ar_psd", q.complex, words);
+      return w;
+    }
   }
+  if (q.m == kPcarSpectrum) {
+    try {
+      w.spectrum.Make(count, q.length);
+    } catch (const std::bad_alloc&) {
+      throw Failure{kFailed,
+                    {},
+                    "no memory for a spectrum of " + std::to_string(q.length) + " values (" +
+                        std::to_string((uint64_t(q.length) * sizeof(double)) >> 20) + " MiB)"};
+    }
+  }
+  int32_t* st = w.status.data();
+  int32_t* found = w.count.data();
+  int32_t status = QDM_OK;
+  switch (q.m) {
+    case kCovariance:
+    case kCovSpectrum:  // the model here, its density laid out record by record
+      w.function = "qdm_covariance";
+      status = q.complex ? qdm_covariance_batch_complex(cx, n, count, n, p, w.a, w.z,
+                                                        w.variance.data(), st, threads)
+                         : qdm_covariance_batch_real(x, n, count, n, p, w.a, w.z, w.variance.data(),
+                                                     st, threads);
+      break;
+    case kPcar:
+      w.function = "qdm_pcar_solver";
+      status = q.complex
+                   ? qdm_pcar_batch_complex(cx, n, count, n, p, k, q.solver, w.a, w.z, st, threads)
+                   : qdm_pcar_batch_real(x, n, count, n, p, k, q.solver, w.a, w.z, st, threads);
+      break;
+    case kMdl:
+      w.function = "qdm_mdl_order";
+      status = q.complex ? qdm_mdl_order_batch_complex(cx, n, count, n, L, q.minOrder,
+                                                       w.order.data(), st, threads)
+                         : qdm_mdl_order_batch_real(x, n, count, n, L, q.minOrder, w.order.data(),
+                                                    st, threads);
+      break;
+    case kProny:  // the real twins of these three take the real-signal flag
+      w.function = "qdm_prony";
+      status = q.complex ? qdm_prony_batch_complex(cx, n, count, n, p, q.rate, w.amp, w.phase,
+                                                   w.damping, w.freq, found, st, threads)
+                         : qdm_prony_batch_real(x, n, count, n, p, q.rate, q.flag, w.amp, w.phase,
+                                                w.damping, w.freq, found, st, threads);
+      break;
+    case kPencil:
+      w.function = "qdm_matrix_pencil_solver";
+      status = q.complex ? qdm_matrix_pencil_batch_complex(cx, n, count, n, L, M, q.rate, q.solver,
+                                                           w.amp, w.phase, w.damping, w.freq, found,
+                                                           w.mse.data(), st, threads)
+                         : qdm_matrix_pencil_batch_real(x, n, count, n, L, M, q.rate, q.flag,
+                                                        q.solver, w.amp, w.phase, w.damping, w.freq,
+                                                        found, w.mse.data(), st, threads);
+      break;
+    case kPcarSpectrum:
+      w.function = "qdm_pcar_psd";
+      status = q.complex
+                   ? qdm_pcar_psd_batch_complex(cx, n, count, n, p, q.points, k, q.rate, w.amp,
+                                                w.phase, w.freq, found, w.spectrum, w.f0.data(),
+                                                w.df.data(), w.fitError.data(), st, threads)
+                   : qdm_pcar_psd_batch_real(x, n, count, n, p, q.points, k, q.rate, q.flag, w.amp,
+                                             w.phase, w.freq, found, w.spectrum, w.f0.data(),
+                                             w.df.data(), w.fitError.data(), st, threads);
+      break;
+    case kStabilization:  // no batch: one record at a time
+      break;
+  }
+  if (status != QDM_OK && status != QDM_WARN_RECORD_FAILED) {
+    char words[256];
+    qdm_last_error_message(words, sizeof words);
+    w.refused = Refusal(status, w.function, q.complex, words);
+    return w;
+  }
+  if (status == QDM_WARN_RECORD_FAILED) {
+    // The batch's message names its first failed record: "record 17: x[3] is not finite: nan".
+    w.firstFailed = std::find_if(st, st + count, [](int32_t s) { return s < 0; }) - st;
+    char words[384];
+    qdm_last_error_message(words, sizeof words);
+    const std::string prefix = "record " + std::to_string(w.firstFailed) + ": ";
+    if (std::strncmp(words, prefix.c_str(), prefix.size()) == 0)
+      w.firstWords = words + prefix.size();
+  }
+  // Prony's and the pencil's modes carry standard errors, for each record fitted.
+  if (q.m != kProny && q.m != kPencil) return w;
+  std::vector<int32_t> fitted(records);
+  for (size_t i = 0; i < records; ++i) fitted[i] = st[i] >= 0 ? found[i] : 0;
+  if (std::all_of(fitted.begin(), fitted.end(), [](int32_t c) { return c == 0; })) return w;
+  for (Buffer* b : {&w.seAmp, &w.sePhase, &w.seDamping, &w.seFreq}) b->Make(count, w.modeRow);
+  w.modeNoise.assign(records, 0.0);
+  w.errorStatus.assign(records, QDM_OK);
+  const int32_t room = int32_t(w.modeRow);
+  const int32_t errors =
+      q.complex
+          ? qdm_mode_errors_batch_complex(cx, n, count, n, q.rate, room, fitted.data(), w.amp,
+                                          w.phase, w.damping, w.freq, w.seAmp, w.sePhase,
+                                          w.seDamping, w.seFreq, w.modeNoise.data(),
+                                          w.errorStatus.data(), threads)
+          : qdm_mode_errors_batch_real(x, n, count, n, q.rate, q.flag, room, fitted.data(), w.amp,
+                                       w.phase, w.damping, w.freq, w.seAmp, w.sePhase, w.seDamping,
+                                       w.seFreq, w.modeNoise.data(), w.errorStatus.data(), threads);
+  if (errors != QDM_OK && errors != QDM_WARN_RECORD_FAILED) w.errorsRefused = errors;
+  return w;
+}
+
+// The record's JSON: what was fitted, with what, its status and results.
+void Describe(const Plan& q, const std::string& input, Json res, Record& r) {
+  r.json = {{"input", input},
+            {"method", kMethods[q.m][0]},
+            {"signal", {{"type", q.complex ? "complex" : "real"}, {"samples", q.n}}},
+            {"parameters", q.par},
+            {"status", r.status}};
+  if (!r.warning.empty()) r.json["warning"] = r.warning;
+  r.json["results"] = std::move(res);
+}
+
+// The stabilization diagram of one record (it has no batch: its row count varies).
+Record StabilizationRecord(const Plan& q, const std::string& input, const Signal& s,
+                           bool spectrum) {
+  Record r;
+  Json res = Json::object();
+  Stabilize(s, q.rate, q.flag, q.L, q.minOrder, q.maxOrder, q.par, res, r, spectrum);
+  Describe(q, input, std::move(res), r);
+  return r;
+}
+
+// Record i of a group fitted by Call, as its JSON record and spectrum; x holds
+// its samples. A failure throws, worded as the single-record call words it.
+Record Present(const Plan& q, const std::string& input, const Rows& w, int64_t i, const double* x) {
+  if (w.refused) throw *w.refused;
+  Record r;
+  const Method m = q.m;
+  const int32_t n = q.n, p = q.p, points = q.points, length = q.length;
+  const double rate = q.rate;
+  const size_t at = size_t(i);
+  const int32_t status = w.status[at];
+  std::string words;  // a refusal's: the batch words its first, another is asked of its record
+  if (Refused(status)) words = i == w.firstFailed ? w.firstWords : Call(q, x, 1, 1).firstWords;
+  Check(status, w.function, q.complex, r, words.c_str());
+  // Every output has the room the library has for the size arguments.
+  const size_t room = size_t(qdm_output_room(n, std::max({p, q.k, q.M}))) + 1;
+  Array a(2 * room), z(2 * room), amp(room), phase(room), damping(room), freq(room);
+  const auto copy = [&](const Buffer& from, int64_t row, int64_t values, Array& to) {
+    std::copy_n(from.v.get() + i * row, size_t(values), to.v.begin());
+  };
+  const int32_t count = w.count[at];
+  if (w.coefRow > 0) {
+    copy(w.a, w.coefRow, w.coefRow, a);
+    copy(w.z, w.poleRow, w.poleRow, z);
+  }
+  if (kModal & Bit(m))
+    for (auto [from, to] :
+         {std::pair{&w.amp, &amp}, {&w.phase, &phase}, {&w.damping, &damping}, {&w.freq, &freq}})
+      if (m != kPcarSpectrum || from != &w.damping) copy(*from, w.modeRow, count, *to);
+  const double variance = w.variance[at], mse = w.mse[at], fitError = w.fitError[at];
   std::unique_ptr<double[]> db = (kSpectra & Bit(m)) ? SpectrumOutput(length) : nullptr;
   std::unique_ptr<double[]> axis = (kSpectra & Bit(m)) ? SpectrumOutput(length) : nullptr;
   std::unique_ptr<double[]> psd = m == kCovSpectrum ? SpectrumOutput(length) : nullptr;
-  double variance = 0.0, mse = 0.0, f0 = 0.0, df = 0.0, fitError = 0.0;
-  int32_t count = 0, order = 0, laid = 0;
-  switch (m) {
-    case kCovariance:
-      QDM_TWIN(qdm_covariance, n, p, a, z, &variance);
-      break;
-    case kPcar:
-      QDM_TWIN(qdm_pcar_solver, n, p, k, SolverOf(o), a, z);
-      break;
-    case kMdl:
-      QDM_TWIN(qdm_mdl_order, n, L, minOrder, &order);
-      break;
-    case kCovSpectrum:  // the model, then its density laid out
-      QDM_TWIN(qdm_covariance, n, p, a, z, &variance);
-      CheckFailure(s.complex ? qdm_ar_psd_complex(reinterpret_cast<const qdm_complex*>(a.v.data()),
-                                                  p, variance, points, rate, 0, axis.get(),
-                                                  db.get(), psd.get(), &laid)
-                             : qdm_ar_psd_real(a.v.data(), p, variance, points, rate, oneSided,
-                                               axis.get(), db.get(), psd.get(), &laid),
-                   "qdm_ar_psd", s.complex, r);
-      break;
-    case kProny:  // the real twins of these three take the real-signal flag
-      Check(s.complex ? qdm_prony_complex(cx, n, p, rate, amp, phase, damping, freq, &count)
-                      : qdm_prony_real(re, n, p, rate, flag, amp, phase, damping, freq, &count),
-            "qdm_prony", s.complex, r);
-      break;
-    case kPencil:
-      Check(s.complex ? qdm_matrix_pencil_solver_complex(cx, n, L, M, rate, SolverOf(o), amp, phase,
-                                                         damping, freq, &count, &mse)
-                      : qdm_matrix_pencil_solver_real(re, n, L, M, rate, flag, SolverOf(o), amp,
-                                                      phase, damping, freq, &count, &mse),
-            "qdm_matrix_pencil_solver", s.complex, r);
-      break;
-    case kStabilization:
-      break;
-    case kPcarSpectrum:
-      Check(s.complex ? qdm_pcar_psd_complex(cx, n, p, points, k, rate, amp, phase, freq, &count,
-                                             db.get(), &f0, &df, &fitError)
-                      : qdm_pcar_psd_real(re, n, p, points, k, rate, flag, amp, phase, freq, &count,
-                                          db.get(), &f0, &df, &fitError),
-            "qdm_pcar_psd", s.complex, r);
-      CheckFailure(
-          qdm_spectrum_layout(db.get(), nullptr, length, rate, oneSided, axis.get(), &laid),
-          "qdm_spectrum_layout", s.complex, r);
-      break;
+  int32_t laid = 0;
+  if (m == kCovSpectrum) {
+    CheckFailure(q.complex
+                     ? qdm_ar_psd_complex(static_cast<const qdm_complex*>(a), p, variance, points,
+                                          rate, 0, axis.get(), db.get(), psd.get(), &laid)
+                     : qdm_ar_psd_real(a.v.data(), p, variance, points, rate, q.oneSided,
+                                       axis.get(), db.get(), psd.get(), &laid),
+                 "qdm_ar_psd", q.complex, r);
+  }
+  if (m == kPcarSpectrum) {
+    std::copy_n(w.spectrum.v.get() + i * length, size_t(length), db.get());
+    CheckFailure(
+        qdm_spectrum_layout(db.get(), nullptr, length, rate, q.oneSided, axis.get(), &laid),
+        "qdm_spectrum_layout", q.complex, r);
   }
   // Prony's and the pencil's modes carry standard errors. When they cannot be
   // had (too few samples for the noise, a singular bound) the fit stands, the
@@ -430,15 +636,10 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   Array seAmp(room), sePhase(room), seDamping(room), seFreq(room);
   double modeNoise = 0.0;
   if (withErrors && count > 0) {
-    const int32_t st =
-        s.complex ? qdm_mode_errors_complex(cx, n, rate, count, amp, phase, damping, freq, seAmp,
-                                            sePhase, seDamping, seFreq, &modeNoise)
-                  : qdm_mode_errors_real(re, n, rate, flag, count, amp, phase, damping, freq, seAmp,
-                                         sePhase, seDamping, seFreq, &modeNoise);
-    const bool refused = st <= -42401 && st >= -42499;
-    if (st != QDM_OK && st != QDM_WARN_BOUND_SINGULAR && !refused &&
+    const int32_t st = w.errorsRefused != QDM_OK ? w.errorsRefused : w.errorStatus[at];
+    if (st != QDM_OK && st != QDM_WARN_BOUND_SINGULAR && !Refused(st) &&
         st != QDM_ERR_NON_FINITE_RESULT && st != QDM_ERR_EXTREME_VALUE) {
-      Check(st, "qdm_mode_errors", s.complex, r);
+      Check(st, "qdm_mode_errors", q.complex, r, "");
     }
     if (st != QDM_OK) {
       r.warning +=
@@ -448,24 +649,32 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
       for (Array* e : {&seAmp, &sePhase, &seDamping, &seFreq})
         std::fill(e->v.begin(), e->v.end(), NAN);
       modeNoise = NAN;
+    } else {
+      for (auto [from, to] : {std::pair{&w.seAmp, &seAmp},
+                              {&w.sePhase, &sePhase},
+                              {&w.seDamping, &seDamping},
+                              {&w.seFreq, &seFreq}})
+        copy(*from, w.modeRow, count, *to);
+      modeNoise = w.modeNoise[at];
     }
   }
-  if ((kModal & Bit(m)) && !o.noSort)
+  if ((kModal & Bit(m)) && q.sort)
     SortModes(count, {amp, phase, damping, seAmp, sePhase, seDamping, seFreq, freq}, freq);
   std::vector<double> perSecond(size_t(std::max(count, 0)));
   std::vector<double> perSecondSe(perSecond.size());
-  for (size_t i = 0; i < perSecond.size(); ++i) {
-    perSecond[i] = damping.v[i] * rate;
-    perSecondSe[i] = seDamping.v[i] * rate;
+  for (size_t j = 0; j < perSecond.size(); ++j) {
+    perSecond[j] = damping.v[j] * rate;
+    perSecondSe[j] = seDamping.v[j] * rate;
   }
+  Json res = Json::object();
   if (m == kCovariance || m == kCovSpectrum) res["noise_variance"] = variance;
   if (m == kCovariance || m == kPcar) {
     const double* c = a;
     res["coefficients"] =
-        s.complex ? Columns({"re", "im"}, {c, c + 1}, p + 1, 2) : Column(c, p + 1);
+        q.complex ? Columns({"re", "im"}, {c, c + 1}, p + 1, 2) : Column(c, p + 1);
     res[m == kPcar ? "roots" : "poles"] = Poles(z, p, rate);
   }
-  if (m == kMdl) res["order"] = order;
+  if (m == kMdl) res["order"] = w.order[at];
   if (m == kPcarSpectrum) res["fit_error"] = fitError;
   if (m == kPencil) res["mse"] = mse;
   if (withErrors) res["noise_variance"] = modeNoise;
@@ -483,7 +692,7 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
   }
   if (kSpectra & Bit(m)) {
     // The columns are filled in from the record's arrays as it is written.
-    res["spectrum"] = {{"one_sided", oneSided == 1}, {"length", laid}};
+    res["spectrum"] = {{"one_sided", q.oneSided == 1}, {"length", laid}};
     for (const char* key : kSpectrumColumns)
       if (key != kSpectrumColumns[2] || psd) res["spectrum"][key] = Json::array();
     r.frequency = std::move(axis);
@@ -491,15 +700,15 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
     r.psd = std::move(psd);
     r.spectrumLength = size_t(laid);
   }
-  (void)f0, (void)df;
-  r.json = {{"input", input},
-            {"method", kMethods[m][0]},
-            {"signal", {{"type", s.complex ? "complex" : "real"}, {"samples", n}}},
-            {"parameters", par},
-            {"status", r.status}};
-  if (!r.warning.empty()) r.json["warning"] = r.warning;
-  r.json["results"] = res;
+  Describe(q, input, std::move(res), r);
   return r;
+}
+
+// One file's fit: a batch of one record.
+Record Fit(Method m, const Options& o, const std::string& input, const Signal& s) {
+  const Plan q = MakePlan(m, o, s.n, s.complex, s.defaultRate);
+  if (m == kStabilization) return StabilizationRecord(q, input, s, !o.plot.empty());
+  return Present(q, input, Call(q, s.values.data(), 1, 1), 0, s.values.data());
 }
 
 // ---- output ---------------------------------------------------------------------------
@@ -896,12 +1105,13 @@ bool Plot(const std::string& png, const Record& r) {
 
 // ---- runs -----------------------------------------------------------------------------
 
-// Fits one input; the record, or the error record, and the exit code it gives.
-Record RunOne(Method m, const Options& o, const std::string& path, int* exitCode) {
+// Makes one input's record; the record, or the error record, and the exit code it gives.
+template <typename Make>
+Record Guarded(Method m, const std::string& path, int* exitCode, Make make) {
   Failure f{kOk, {}, {}};
   try {
     *exitCode = kOk;
-    return Fit(m, o, path, Load(path, o));
+    return make();
   } catch (const Failure& failure) {
     f = failure;
     if (f.exit != kUsage || f.status)  // read errors name the file already
@@ -922,50 +1132,154 @@ Record RunOne(Method m, const Options& o, const std::string& path, int* exitCode
   return r;
 }
 
-// Each file on a pool of threads; one JSON line per file, printed in input order.
-int RunBatch(Method m, const Options& o) {
-  const size_t n = o.files.size();
-  std::vector<std::optional<Record>> records(n);
-  std::vector<int> codes(n, kOk);
-  std::mutex mutex;
-  std::condition_variable ready;
+// Fits one input; the record, or the error record, and the exit code it gives.
+Record RunOne(Method m, const Options& o, const std::string& path, int* exitCode) {
+  return Guarded(m, path, exitCode, [&] { return Fit(m, o, path, Load(path, o)); });
+}
+
+// Runs body(0 .. count - 1) on `threads` threads (0: one per core), the calling one included.
+void OnThreads(size_t count, int threads, const std::function<void(size_t)>& body) {
+  const unsigned wanted =
+      threads > 0 ? unsigned(threads) : std::max(1u, std::thread::hardware_concurrency());
   std::atomic<size_t> next{0};
-  auto worker = [&] {
-    for (size_t i; (i = next++) < n;) {
+  const auto work = [&] {
+    for (size_t i; (i = next++) < count;) body(i);
+  };
+  std::vector<std::jthread> pool;
+  for (size_t t = 1; t < std::min<size_t>(wanted, count); ++t) pool.emplace_back(work);
+  work();
+}
+
+// Several files are read, fitted and printed a chunk at a time, so the
+// samples and outputs held stay bounded: at most kChunkRecords files, or
+// about kChunkBytes of samples and output rows (one file at least).
+constexpr size_t kChunkRecords = 4096;
+constexpr uint64_t kChunkBytes = uint64_t{256} << 20;
+
+// A file of a chunk: its samples, or what reading them threw, and its row in its group.
+struct Entry {
+  size_t file = 0;
+  Signal signal;
+  std::exception_ptr error;
+  size_t group = 0;
+  int64_t row = 0;
+};
+
+// The chunk's records of one length, type and default rate: one batch call.
+struct Group {
+  int32_t n = 0;
+  bool complex = false;
+  double defaultRate = 1.0;
+  std::vector<size_t> members;  // entries, in input order
+  std::optional<Plan> plan;
+  std::exception_ptr error;     // what the plan or the call threw, every member's
+  std::vector<double> samples;  // the members' records one after another
+  const double* x = nullptr;    // those records (a lone member's own samples)
+  Rows rows;
+};
+
+// Resolves the group's parameters and fits its records with one batch call.
+void FitGroup(Method m, const Options& o, std::vector<Entry>& chunk, Group& g) {
+  try {
+    g.plan = MakePlan(m, o, g.n, g.complex, g.defaultRate);
+    if (m == kStabilization) return;  // no batch: each record by itself
+    g.x = chunk[g.members[0]].signal.values.data();
+    if (g.members.size() > 1) {
+      const size_t values = size_t(g.n) * (g.complex ? 2 : 1);
+      g.samples.resize(values * g.members.size());
+      for (size_t j = 0; j < g.members.size(); ++j) {
+        std::vector<double>& own = chunk[g.members[j]].signal.values;
+        std::copy(own.begin(), own.end(), g.samples.begin() + std::ptrdiff_t(j * values));
+        std::vector<double>().swap(own);
+      }
+      g.x = g.samples.data();
+    }
+    g.rows = Call(*g.plan, g.x, int64_t(g.members.size()), o.jobs);
+  } catch (...) {
+    g.error = std::current_exception();
+  }
+}
+
+// The files in chunks: each chunk's records grouped by length and type, each
+// group fitted by one batch call on --jobs threads, then one JSON line per
+// file, in input order. The stabilization diagram has no batch: its records
+// are fitted one by one on --jobs threads.
+int RunBatch(Method m, const Options& o) {
+  const int32_t spectrumValues = m == kPcarSpectrum ? qdm_spectrum_length(o.nfft.value_or(512)) : 0;
+  int exit = kOk;
+  for (size_t next = 0; next < o.files.size();) {
+    std::vector<Entry> chunk;
+    std::vector<Group> groups;
+    std::map<std::tuple<int32_t, bool, double>, size_t> groupOf;
+    for (uint64_t bytes = 0;
+         next < o.files.size() && chunk.size() < kChunkRecords && bytes < kChunkBytes;) {
+      Entry& e = chunk.emplace_back();
+      e.file = next++;
+      try {
+        e.signal = Load(o.files[e.file], o);
+      } catch (...) {
+        e.error = std::current_exception();
+        continue;
+      }
+      const Signal& s = e.signal;
+      bytes += sizeof(double) * (s.values.size() + 12 * (uint64_t(s.n) + 1) + spectrumValues);
+      const auto [it, added] = groupOf.try_emplace({s.n, s.complex, s.defaultRate}, groups.size());
+      if (added) {
+        Group& g = groups.emplace_back();
+        g.n = s.n, g.complex = s.complex, g.defaultRate = s.defaultRate;
+      }
+      e.group = it->second;
+      e.row = int64_t(groups[e.group].members.size());
+      groups[e.group].members.push_back(chunk.size() - 1);
+    }
+    for (Group& g : groups) FitGroup(m, o, chunk, g);
+    // The diagrams of the chunk, made ahead of the lines.
+    std::vector<std::optional<Record>> made(chunk.size());
+    std::vector<int> codes(chunk.size(), kOk);
+    const auto make = [&](size_t c) {
+      const Entry& e = chunk[c];
+      const std::string& path = o.files[e.file];
+      return Guarded(m, path, &codes[c], [&] {
+        if (e.error) std::rethrow_exception(e.error);
+        const Group& g = groups[e.group];
+        if (g.error) std::rethrow_exception(g.error);
+        if (m == kStabilization) return StabilizationRecord(*g.plan, path, e.signal, false);
+        const size_t values = size_t(g.n) * (g.complex ? 2 : 1);
+        return Present(*g.plan, path, g.rows, e.row, g.x + size_t(e.row) * values);
+      });
+    };
+    if (m == kStabilization) {
+      OnThreads(chunk.size(), o.jobs, [&](size_t c) {
+        try {
+          made[c] = make(c);
+        } catch (...) {  // no memory even for the error record: written below
+          codes[c] = kFailed;
+        }
+      });
+    }
+    for (size_t c = 0; c < chunk.size(); ++c) {
+      const std::string& path = o.files[chunk[c].file];
       Record r;
       try {
-        r = RunOne(m, o, o.files[i], &codes[i]);
-      } catch (...) {  // no memory even for the error record: it is written below
-        codes[i] = kFailed;
+        r = made[c] ? std::move(*made[c]) : make(c);
+      } catch (...) {
+        codes[c] = kFailed;
       }
-      std::lock_guard<std::mutex> lock(mutex);
-      records[i] = std::move(r);
-      ready.notify_all();
-    }
-  };
-  const unsigned threads = o.jobs > 0 ? o.jobs : std::max(1u, std::thread::hardware_concurrency());
-  std::vector<std::jthread> pool;
-  for (unsigned t = 0; t < std::min<size_t>(threads, n); ++t) pool.emplace_back(worker);
-  int exit = kOk;
-  for (size_t i = 0; i < n; ++i) {
-    std::unique_lock<std::mutex> lock(mutex);
-    ready.wait(lock, [&] { return records[i].has_value(); });
-    Record r = std::move(*records[i]);
-    records[i].reset();
-    lock.unlock();
-    if (r.json.is_null())
-      r.json = {{"input", o.files[i]},
-                {"method", kMethods[m][0]},
-                {"status", nullptr},
-                {"exit", kFailed},
-                {"error", Shown(o.files[i], kNameShown) + ": out of memory"}};
-    WriteJson(stdout, r, -1);
-    if (!r.warning.empty())
-      std::fprintf(stderr, "qdm: %s: warning: %s\n", Shown(o.files[i], kNameShown).c_str(),
-                   r.warning.c_str());
-    if (codes[i] != kOk) {
-      exit = kFailed;
-      std::fprintf(stderr, "qdm: %s\n", r.json["error"].get<std::string>().c_str());
+      made[c].reset();
+      if (r.json.is_null())
+        r.json = {{"input", path},
+                  {"method", kMethods[m][0]},
+                  {"status", nullptr},
+                  {"exit", kFailed},
+                  {"error", Shown(path, kNameShown) + ": out of memory"}};
+      WriteJson(stdout, r, -1);
+      if (!r.warning.empty())
+        std::fprintf(stderr, "qdm: %s: warning: %s\n", Shown(path, kNameShown).c_str(),
+                     r.warning.c_str());
+      if (codes[c] != kOk) {
+        exit = kFailed;
+        std::fprintf(stderr, "qdm: %s\n", r.json["error"].get<std::string>().c_str());
+      }
     }
   }
   return exit;
@@ -1118,7 +1432,10 @@ int Main(int argc, char** argv) {
     sub->add_flag("--csv", o.csv, "print the main table as CSV")->excludes(json);
     sub->add_option("--plot", o.plot, "draw the results to FILE.png with gnuplot")
         ->check(kNonEmpty);
-    sub->add_option("--jobs", o.jobs, "fit the files on N threads (0: one per core), JSON lines")
+    sub->add_option("--jobs", o.jobs,
+                    "fit the files on N threads (0: one per core), one JSON line each: the "
+                    "records of each length and type in one batch call (stabilization: file "
+                    "by file, N at a time) [1]")
         ->check(kNonEmpty)
         ->check(CLI::Range(0, 1024));
     sub->footer("An option of another method is an error, or ignored with --ignore-unknown.");

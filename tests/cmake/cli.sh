@@ -101,6 +101,111 @@ PY
   grep -q "standard input" err || fail "no reason given: $(cat err)"
   expect 0 covariance - a.csv --jobs 2 <"$data"
   [ "$(wc -l <out)" = 2 ] || fail "two lines expected"
+  # Files of two lengths and both types, interleaved: each line is the record a
+  # run on that file alone prints, double for double, whatever the thread count.
+  $py - <<'PY'
+import math, random
+rng = random.Random(3)
+for n in (48, 90):
+    for k in range(2):
+        w = 0.3 + 0.1 * k
+        with open(f"r{n}_{k}.csv", "w") as f:
+            for t in range(n):
+                v = math.exp(-0.01 * t) * math.cos(w * t) + 0.4 * math.cos(2.2 * t + k)
+                f.write("%r\n" % (v + 0.05 * rng.gauss(0, 1)))
+        with open(f"c{n}_{k}.csv", "w") as f:
+            for t in range(n):
+                z = complex(math.cos(w * t), math.sin(w * t)) * math.exp(-0.005 * t)
+                z += 0.3 * complex(math.cos(1.4 * t), -math.sin(1.4 * t))
+                f.write("%r,%r\n" % (z.real + 0.05 * rng.gauss(0, 1), z.imag))
+PY
+  mixed=(r48_0.csv c90_0.csv r90_0.csv c48_0.csv r48_1.csv c90_1.csv r90_1.csv c48_1.csv)
+  for method in covariance pcar prony pencil mdl covspectrum pcarspectrum stabilization; do
+    "$qdm" $method --order 8 --components 4 --modes 4 --nfft 64 --max-order 8 --ignore-unknown \
+      --jobs 2 "${mixed[@]}" >batch2.jsonl 2>err || fail "$method --jobs 2: $(cat err)"
+    "$qdm" $method --order 8 --components 4 --modes 4 --nfft 64 --max-order 8 --ignore-unknown \
+      --jobs 1 "${mixed[@]}" >batch1.jsonl 2>err || fail "$method --jobs 1: $(cat err)"
+    cmp -s batch1.jsonl batch2.jsonl || fail "$method: --jobs 1 and --jobs 2 differ"
+    for f in "${mixed[@]}"; do
+      "$qdm" $method --order 8 --components 4 --modes 4 --nfft 64 --max-order 8 \
+        --ignore-unknown --json "$f" >"one_$f.json" 2>err || fail "$method $f: $(cat err)"
+    done
+    $py - "${mixed[@]}" <<'PY' || fail "$method: the batch lines differ from one-file runs"
+import json, sys
+lines = open("batch2.jsonl").read().splitlines()
+assert len(lines) == len(sys.argv) - 1, len(lines)
+for line, name in zip(lines, sys.argv[1:]):
+    one = json.load(open(f"one_{name}.json"))
+    # repr of every double (and -0.0) survives dumps: equal text is equal bits.
+    assert json.dumps(json.loads(line)) == json.dumps(one), (name, line[:200])
+    assert one["status"] == 0 and one["input"] == name, one
+PY
+    echo "ok: $method: --jobs 1, --jobs 2 and one-file runs agree on ${#mixed[@]} files"
+  done
+  # A NaN, an infinity and an all-zero file among good ones of the same length:
+  # their own error lines, each naming its sample, exit 2; the others complete.
+  $py - <<'PY'
+import math
+for name, bad in (("nan1.csv", {7: "nan"}), ("nan2.csv", {30: "nan"}), ("inf.csv", {12: "-inf"})):
+    with open(name, "w") as f:
+        for t in range(48):
+            f.write(bad.get(t, "%r" % math.cos(0.5 * t)) + "\n")
+open("zeros48.csv", "w").write("0\n" * 48)
+PY
+  "$qdm" pencil --modes 4 --jobs 2 r48_0.csv nan1.csv zeros48.csv r48_1.csv inf.csv nan2.csv \
+    c48_0.csv >out 2>err; rc=$?
+  [ $rc = 2 ] && [ "$(wc -l <err)" = 4 ] || fail "bad records: exit $rc, $(cat err)"
+  $py - out <<'PY' || fail "bad records: $(cat out)"
+import json, sys
+lines = [json.loads(l) for l in open(sys.argv[1])]
+got = [(l["input"], l["status"], l.get("exit", 0)) for l in lines]
+assert [g[0] for g in got] == ["r48_0.csv", "nan1.csv", "zeros48.csv", "r48_1.csv", "inf.csv",
+                               "nan2.csv", "c48_0.csv"], got
+assert [g[2] for g in got] == [0, 1, 2, 0, 1, 1, 0], got
+assert got[1][1] == got[4][1] == got[5][1] == -42419 and got[2][1] < 0, got
+for i, words in ((1, "x[7] is not finite: nan"), (4, "x[12] is not finite: -inf"),
+                 (5, "x[30] is not finite: nan")):
+    assert lines[i]["error"] == (lines[i]["input"] + ": qdm_matrix_pencil_solver_real returned "
+                                 "-42419: " + words), lines[i]
+assert "x[" not in lines[2]["error"] and lines[2]["error"].startswith("zeros48.csv: "), lines[2]
+assert all(len(lines[i]["results"]["modes"]["frequency_hz"]) == 4 for i in (0, 3, 6)), lines
+PY
+  for f in nan1.csv zeros48.csv inf.csv nan2.csv; do
+    "$qdm" pencil --modes 4 "$f" 2>one.err >/dev/null
+    grep -qxF "$(cat one.err)" err || fail "$f: the batch words it otherwise: $(cat one.err)"
+  done
+  echo "ok: NaN, infinite and all-zero records fail alone, worded as one-file runs"
+  # An order too large for one group's length: each file of that group names
+  # it (exit 1 in its line), the other group is fitted.
+  "$qdm" covariance --order 40 --jobs 2 r48_0.csv r90_0.csv c48_1.csv r48_1.csv >out 2>err; rc=$?
+  [ $rc = 2 ] && [ "$(wc -l <err)" = 3 ] || fail "group refusal: exit $rc, $(cat err)"
+  $py - out <<'PY' || fail "group refusal: $(cat out)"
+import json, sys
+lines = [json.loads(l) for l in open(sys.argv[1])]
+assert [l.get("exit", 0) for l in lines] == [1, 0, 1, 1], lines
+words = "order 40 is above floor(2n/3) = 32 (n = 48)"
+assert lines[0]["error"] == "r48_0.csv: qdm_covariance_real returned -42412: " + words, lines[0]
+assert lines[2]["error"] == "c48_1.csv: qdm_covariance_complex returned -42412: " + words
+assert lines[3]["status"] == -42412 and words in lines[3]["error"], lines[3]
+assert len(lines[1]["results"]["coefficients"]) == 41, lines[1]
+PY
+  echo "ok: an order too large for n = 48 refused on each of its files"
+  # More files than one chunk holds: every line, in input order.
+  $py - <<'PY'
+import math, os
+os.makedirs("many", exist_ok=True)
+for i in range(4200):
+    with open(f"many/{i:04d}.csv", "w") as f:
+        f.write("".join("%.6f\n" % math.sin(0.7 * t + i) for t in range(8 + i % 3)))
+PY
+  "$qdm" covariance --order 2 --jobs 2 many/*.csv >out 2>err || fail "many files: $(head -3 err)"
+  $py - out <<'PY' || fail "many files: $(head -c 300 out)"
+import json, sys
+lines = [json.loads(l) for l in open(sys.argv[1])]
+assert [l["input"] for l in lines] == [f"many/{i:04d}.csv" for i in range(4200)]
+assert [l["signal"]["samples"] for l in lines] == [8 + i % 3 for i in range(4200)]
+PY
+  echo "ok: 4200 files in input order"
   ;;
 readme)
   # The first screen's tool commands and Python example run as written, from a
