@@ -733,8 +733,7 @@ QDM_PLAIN_API int32_t qdm_pcar_batch_real(const double* x, int32_t n, int64_t co
 QDM_PLAIN_API int32_t qdm_pcar_batch_complex(const qdm_complex* x, int32_t n, int64_t count,
                                              int64_t distance, int32_t order, int32_t components,
                                              int32_t solver, qdm_complex* coefficients,
-                                             qdm_complex* roots, int32_t* status,
-                                             int32_t threads);
+                                             qdm_complex* roots, int32_t* status, int32_t threads);
 QDM_PLAIN_API int32_t qdm_prony_batch_real(const double* x, int32_t n, int64_t count,
                                            int64_t distance, int32_t order, double fs,
                                            int32_t real_signal, double* amplitude, double* phase,
@@ -753,9 +752,9 @@ QDM_PLAIN_API int32_t qdm_matrix_pencil_batch_real(const double* x, int32_t n, i
                                                    int32_t* modes, double* mse, int32_t* status,
                                                    int32_t threads);
 QDM_PLAIN_API int32_t qdm_matrix_pencil_batch_complex(
-    const qdm_complex* x, int32_t n, int64_t count, int64_t distance, int32_t pencil,
-    int32_t order, double fs, int32_t solver, double* amplitude, double* phase, double* damping,
-    double* frequency, int32_t* modes, double* mse, int32_t* status, int32_t threads);
+    const qdm_complex* x, int32_t n, int64_t count, int64_t distance, int32_t pencil, int32_t order,
+    double fs, int32_t solver, double* amplitude, double* phase, double* damping, double* frequency,
+    int32_t* modes, double* mse, int32_t* status, int32_t threads);
 QDM_PLAIN_API int32_t qdm_mdl_order_batch_real(const double* x, int32_t n, int64_t count,
                                                int64_t distance, int32_t pencil, int32_t min_order,
                                                int32_t* order, int32_t* status, int32_t threads);

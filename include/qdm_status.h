@@ -25,7 +25,7 @@
     "success, but the error bound is singular or badly conditioned for some modes (their "     \
     "errors are NaN)")                                                                         \
   X(QDM_WARN_RECORD_FAILED, 20003,                                                             \
-    "the batch ran, but one or more of its records failed (see their statuses)")              \
+    "the batch ran, but one or more of its records failed (see their statuses)")               \
   X(QDM_ERR_EMPTY_INPUT, -42401, "input array has no elements (n < 1)")                        \
   X(QDM_ERR_ORDER, -42411, "order or pencil parameter negative or above floor(2n/3)")          \
   X(QDM_ERR_COUNT, -42412,                                                                     \
