@@ -417,6 +417,61 @@ _Status = Union[int, NDArray[_np.int32]]
 _Scalar = Union[float, NDArray[_np.float64]]
 
 
+# Texts several docstrings share, written once: a docstring names one by a
+# line holding only "%(name)s", and _shared_doc puts the text in its place.
+_DOC_TEXTS = {
+    "batch parameters": (
+        '    axis : int, default -1\n'
+        '        The axis of x along which the samples of a record run, for an N-D x:\n'
+        '        each 1-D slice along it is a record, fitted by one library call for\n'
+        '        the whole batch (see "Batches" above).\n'
+        '    workers : int or None, default None\n'
+        "        Threads a batch's records are fitted on: None one, a positive count\n"
+        '        that many, -1 one per processor (-2 all but one, ...); 0 is an\n'
+        '        ArgumentError. The results are the same for every count.\n'
+    ),
+    "stderr fields": (
+        '    amplitude_stderr : ndarray\n'
+        '        Standard error of amplitude, in the units of x: the square root of\n'
+        '        its diagonal entry of the Cramer-Rao bound at the fitted modes, the\n'
+        '        noise variance taken from their residual (see `mode_errors`). Every\n'
+        '        ``*_stderr`` field is NaN for a mode whose bound is singular, and\n'
+        '        for all modes when n is too small to estimate the noise (both with\n'
+        '        a `SingularBoundWarning`).\n'
+        '    phase_stderr : ndarray\n'
+        '        Standard error of phase, in radians.\n'
+        '    damping_stderr : ndarray\n'
+        '        Standard error of damping, per sample.\n'
+        '    frequency_stderr : ndarray\n'
+        '        Standard error of frequency, in Hz when fs is given, else in cycles\n'
+        '        per sample.\n'
+        '    damping_per_s_stderr : ndarray\n'
+        '        damping_stderr * fs, the standard error of `damping_per_s`.\n'
+    ),
+    "mode_count field": (
+        '    mode_count : int, or ndarray of int32\n'
+        '        The number of modes reported (the length of the mode arrays); for a\n'
+        '        batch, one per record, 0 for a record that failed.\n'
+    ),
+    "status field": (
+        '    status : int, or ndarray of int32\n'
+        "        The fit's status: 0, or 20001 when a least-squares system was rank\n"
+        '        deficient (the results are complete). For a batch, one per record\n'
+        "        (the batch's shape): also a record's error code, its values then\n"
+        '        NaN (see "Batches" in the package\'s documentation).\n'
+    ),
+}
+
+
+def _shared_doc(documented):
+    doc = documented.__doc__
+    for name, text in _DOC_TEXTS.items():
+        doc = doc.replace("    %%(%s)s\n" % name, text)
+    documented.__doc__ = doc
+    return documented
+
+
+@_shared_doc
 class CovarianceFit(NamedTuple):
     """The covariance-method AR model, as `covariance` returns it.
 
@@ -431,11 +486,7 @@ class CovarianceFit(NamedTuple):
     noise_variance : float
         Mean squared forward prediction error over the n - p equations, in
         the units of x squared.
-    status : int, or ndarray of int32
-        The fit's status: 0, or 20001 when a least-squares system was rank
-        deficient (the results are complete). For a batch, one per record
-        (the batch's shape): also a record's error code, its values then
-        NaN (see "Batches" in the package's documentation).
+    %(status field)s
 
     For a batch every field gains the batch's shape in front: coefficients
     (*batch, order + 1), poles (*batch, order), noise_variance and status
@@ -447,6 +498,7 @@ class CovarianceFit(NamedTuple):
     status: _Status
 
 
+@_shared_doc
 class PcarFit(NamedTuple):
     """The principal-component AR model, as `pcar` returns it.
 
@@ -458,11 +510,7 @@ class PcarFit(NamedTuple):
     roots : ndarray of complex128, shape (order,)
         The p zeros of the AR polynomial, in the order the root finder found
         them (not sorted, not paired).
-    status : int, or ndarray of int32
-        The fit's status: 0, or 20001 when a least-squares system was rank
-        deficient (the results are complete). For a batch, one per record
-        (the batch's shape): also a record's error code, its values then
-        NaN (see "Batches" in the package's documentation).
+    %(status field)s
 
     For a batch every field gains the batch's shape in front.
     """
@@ -471,6 +519,7 @@ class PcarFit(NamedTuple):
     status: _Status
 
 
+@_shared_doc
 class PronyFit(NamedTuple):
     """Damped exponentials x[t] = sum_i A_i z_i**t, as `prony` returns them.
 
@@ -494,30 +543,9 @@ class PronyFit(NamedTuple):
         damping * fs: the decay rate in 1/s when fs is given (-10.0 is a
         mode whose envelope falls by e every 0.1 s); per sample with the
         default fs = 1.
-    amplitude_stderr : ndarray
-        Standard error of amplitude, in the units of x: the square root of
-        its diagonal entry of the Cramer-Rao bound at the fitted modes, the
-        noise variance taken from their residual (see `mode_errors`). Every
-        ``*_stderr`` field is NaN for a mode whose bound is singular, and
-        for all modes when n is too small to estimate the noise (both with
-        a `SingularBoundWarning`).
-    phase_stderr : ndarray
-        Standard error of phase, in radians.
-    damping_stderr : ndarray
-        Standard error of damping, per sample.
-    frequency_stderr : ndarray
-        Standard error of frequency, in Hz when fs is given, else in cycles
-        per sample.
-    damping_per_s_stderr : ndarray
-        damping_stderr * fs, the standard error of `damping_per_s`.
-    mode_count : int, or ndarray of int32
-        The number of modes reported (the length of the mode arrays); for a
-        batch, one per record, 0 for a record that failed.
-    status : int, or ndarray of int32
-        The fit's status: 0, or 20001 when a least-squares system was rank
-        deficient (the results are complete). For a batch, one per record
-        (the batch's shape): also a record's error code, its values then
-        NaN (see "Batches" in the package's documentation).
+    %(stderr fields)s
+    %(mode_count field)s
+    %(status field)s
 
     For a batch the mode fields are (*batch, order) arrays (the room for
     every mode asked for), each record's modes first and sorted as the 1-D
@@ -537,6 +565,7 @@ class PronyFit(NamedTuple):
     status: _Status
 
 
+@_shared_doc
 class PencilFit(NamedTuple):
     """Damped exponentials x[t] = sum_i A_i z_i**t, as `matrix_pencil` returns them.
 
@@ -562,30 +591,9 @@ class PencilFit(NamedTuple):
     damping_per_s : ndarray
         damping * fs: the decay rate in 1/s when fs is given; per sample
         with the default fs = 1.
-    amplitude_stderr : ndarray
-        Standard error of amplitude, in the units of x: the square root of
-        its diagonal entry of the Cramer-Rao bound at the fitted modes, the
-        noise variance taken from their residual (see `mode_errors`). Every
-        ``*_stderr`` field is NaN for a mode whose bound is singular, and
-        for all modes when n is too small to estimate the noise (both with
-        a `SingularBoundWarning`).
-    phase_stderr : ndarray
-        Standard error of phase, in radians.
-    damping_stderr : ndarray
-        Standard error of damping, per sample.
-    frequency_stderr : ndarray
-        Standard error of frequency, in Hz when fs is given, else in cycles
-        per sample.
-    damping_per_s_stderr : ndarray
-        damping_stderr * fs, the standard error of `damping_per_s`.
-    mode_count : int, or ndarray of int32
-        The number of modes reported (the length of the mode arrays); for a
-        batch, one per record, 0 for a record that failed.
-    status : int, or ndarray of int32
-        The fit's status: 0, or 20001 when a least-squares system was rank
-        deficient (the results are complete). For a batch, one per record
-        (the batch's shape): also a record's error code, its values then
-        NaN (see "Batches" in the package's documentation).
+    %(stderr fields)s
+    %(mode_count field)s
+    %(status field)s
 
     For a batch the mode fields are (*batch, modes) arrays (the room for
     every mode asked for), each record's modes first and sorted as the 1-D
@@ -606,6 +614,7 @@ class PencilFit(NamedTuple):
     status: _Status
 
 
+@_shared_doc
 class CovarianceSpectrum(NamedTuple):
     """The covariance AR model's power spectrum, as `covariance_psd` returns it.
 
@@ -631,11 +640,7 @@ class CovarianceSpectrum(NamedTuple):
     noise_variance : float
         The AR model's prediction-error variance (`CovarianceFit.noise_variance`),
         in the units of x squared.
-    status : int, or ndarray of int32
-        The fit's status: 0, or 20001 when a least-squares system was rank
-        deficient (the results are complete). For a batch, one per record
-        (the batch's shape): also a record's error code, its values then
-        NaN (see "Batches" in the package's documentation).
+    %(status field)s
 
     For a batch the axis stays 1-D, shared by every record; psd and
     spectrum are (*batch, len(frequencies)), noise_variance and status
@@ -648,6 +653,7 @@ class CovarianceSpectrum(NamedTuple):
     status: _Status
 
 
+@_shared_doc
 class PcarSpectrum(NamedTuple):
     """The principal-component AR spectrum and modes, as `pcar_psd` returns them.
 
@@ -671,14 +677,8 @@ class PcarSpectrum(NamedTuple):
         arg(z_i) fs / (2 pi): in Hz when fs is given, else cycles per sample.
     fit_error : float
         Mean squared error of the amplitude fit, in the units of x squared.
-    mode_count : int, or ndarray of int32
-        The number of modes reported (the length of the mode arrays); for a
-        batch, one per record, 0 for a record that failed.
-    status : int, or ndarray of int32
-        The fit's status: 0, or 20001 when a least-squares system was rank
-        deficient (the results are complete). For a batch, one per record
-        (the batch's shape): also a record's error code, its values then
-        NaN (see "Batches" in the package's documentation).
+    %(mode_count field)s
+    %(status field)s
 
     For a batch the axis stays 1-D and shared; spectrum is (*batch,
     len(frequencies)), the mode fields (*batch, components), each record's
@@ -991,6 +991,7 @@ def _batch_modes(status, counts, fields, sort):
 
 
 # ---- the fits ------------------------------------------------------------------------
+@_shared_doc
 def covariance(x: "ArrayLike", *, order: int, axis: int = -1,
                workers: Optional[int] = None) -> CovarianceFit:
     """Covariance-method AR model: forward linear prediction by least squares.
@@ -1007,14 +1008,7 @@ def covariance(x: "ArrayLike", *, order: int, axis: int = -1,
         casts safely to one of them are converted.
     order : int, 1 <= order <= floor(2n/3)
         The model order p.
-    axis : int, default -1
-        The axis of x along which the samples of a record run, for an N-D x:
-        each 1-D slice along it is a record, fitted by one library call for
-        the whole batch (see "Batches" above).
-    workers : int or None, default None
-        Threads a batch's records are fitted on: None one, a positive count
-        that many, -1 one per processor (-2 all but one, ...); 0 is an
-        ArgumentError. The results are the same for every count.
+    %(batch parameters)s
 
     Returns
     -------
@@ -1115,6 +1109,7 @@ def _solver(solver, where):
                             where)
 
 
+@_shared_doc
 def pcar(x: "ArrayLike", *, order: int, components: int,
          solver: Literal["auto", "dense", "krylov"] = "auto", axis: int = -1,
          workers: Optional[int] = None) -> PcarFit:
@@ -1147,14 +1142,7 @@ def pcar(x: "ArrayLike", *, order: int, components: int,
         at large orders. "auto" takes whichever is estimated to be faster.
         Both routes give the same coefficients to rounding wherever the kept
         components stand clear of the next.
-    axis : int, default -1
-        The axis of x along which the samples of a record run, for an N-D x:
-        each 1-D slice along it is a record, fitted by one library call for
-        the whole batch (see "Batches" above).
-    workers : int or None, default None
-        Threads a batch's records are fitted on: None one, a positive count
-        that many, -1 one per processor (-2 all but one, ...); 0 is an
-        ArgumentError. The results are the same for every count.
+    %(batch parameters)s
 
     Returns
     -------
@@ -1232,6 +1220,7 @@ def pcar(x: "ArrayLike", *, order: int, components: int,
     return PcarFit(coef, roots[:m], status)
 
 
+@_shared_doc
 def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
           real_signal: bool = False, sort: bool = True, axis: int = -1,
           workers: Optional[int] = None) -> PronyFit:
@@ -1259,14 +1248,7 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
     sort : bool, default True
         Sort the modes by frequency, every field alike. False keeps the
         order of the poles, as the C API gives them.
-    axis : int, default -1
-        The axis of x along which the samples of a record run, for an N-D x:
-        each 1-D slice along it is a record, fitted by one library call for
-        the whole batch (see "Batches" above).
-    workers : int or None, default None
-        Threads a batch's records are fitted on: None one, a positive count
-        that many, -1 one per processor (-2 all but one, ...); 0 is an
-        ArgumentError. The results are the same for every count.
+    %(batch parameters)s
 
     Returns
     -------
@@ -1356,6 +1338,7 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
                     sa[i], sp[i], sd[i], sf[i], sd[i] * rate, count.value, status)
 
 
+@_shared_doc
 def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
                   fs: float = 1.0, real_signal: bool = False,
                   solver: Literal["auto", "dense", "krylov"] = "auto",
@@ -1399,14 +1382,7 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
     sort : bool, default True
         Sort the modes by frequency, every field alike. False keeps the
         order of the poles, as the C API gives them.
-    axis : int, default -1
-        The axis of x along which the samples of a record run, for an N-D x:
-        each 1-D slice along it is a record, fitted by one library call for
-        the whole batch (see "Batches" above).
-    workers : int or None, default None
-        Threads a batch's records are fitted on: None one, a positive count
-        that many, -1 one per processor (-2 all but one, ...); 0 is an
-        ArgumentError. The results are the same for every count.
+    %(batch parameters)s
 
     Returns
     -------
@@ -1535,6 +1511,7 @@ def _batch_fits(r, rate, flag, block, counts, status, sort, function, threads):
     return [_stack(r, v) for v in fields] + [_stack(r, counts)]
 
 
+@_shared_doc
 def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 1,
               max_order: Optional[int] = None, axis: int = -1,
               workers: Optional[int] = None) -> "Union[int, MdlOrder]":
@@ -1560,14 +1537,7 @@ def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 
         The smallest order tried.
     max_order : int or None, default None
         The old name of `pencil`: still accepted, with a DeprecationWarning.
-    axis : int, default -1
-        The axis of x along which the samples of a record run, for an N-D x:
-        each 1-D slice along it is a record, fitted by one library call for
-        the whole batch (see "Batches" above).
-    workers : int or None, default None
-        Threads a batch's records are fitted on: None one, a positive count
-        that many, -1 one per processor (-2 all but one, ...); 0 is an
-        ArgumentError. The results are the same for every count.
+    %(batch parameters)s
 
     Returns
     -------
@@ -1651,6 +1621,7 @@ def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 
     return order.value
 
 
+@_shared_doc
 def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
                    fs: float = 1.0, return_onesided: Optional[bool] = None,
                    points: Optional[int] = None, axis: int = -1,
@@ -1683,14 +1654,7 @@ def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
         fs/2 - fs/N. None: one-sided for real data, two-sided for complex.
     points : int or None, default None
         The old name of `nfft`: still accepted, with a DeprecationWarning.
-    axis : int, default -1
-        The axis of x along which the samples of a record run, for an N-D x:
-        each 1-D slice along it is a record, fitted by one library call for
-        the whole batch (see "Batches" above).
-    workers : int or None, default None
-        Threads a batch's records are fitted on: None one, a positive count
-        that many, -1 one per processor (-2 all but one, ...); 0 is an
-        ArgumentError. The results are the same for every count.
+    %(batch parameters)s
 
     Returns
     -------
@@ -1818,6 +1782,7 @@ def _covariance_psd_batch(r, p, pts, rate, flag, given, threads):
                               _stack(r, nv), _stack(r, status))
 
 
+@_shared_doc
 def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int] = None,
              fs: float = 1.0, real_signal: bool = False, return_onesided: Optional[bool] = None,
              sort: bool = True, points: Optional[int] = None, axis: int = -1,
@@ -1859,14 +1824,7 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
         library's order, nearest the unit circle first.
     points : int or None, default None
         The old name of `nfft`: still accepted, with a DeprecationWarning.
-    axis : int, default -1
-        The axis of x along which the samples of a record run, for an N-D x:
-        each 1-D slice along it is a record, fitted by one library call for
-        the whole batch (see "Batches" above).
-    workers : int or None, default None
-        Threads a batch's records are fitted on: None one, a positive count
-        that many, -1 one per processor (-2 all but one, ...); 0 is an
-        ArgumentError. The results are the same for every count.
+    %(batch parameters)s
 
     Returns
     -------
@@ -1974,6 +1932,7 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
                         frequency[i], err.value, count.value, status)
 
 
+@_shared_doc
 def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[ArrayLike]]", *,
                 fs: float = 1.0, real_signal: bool = False, axis: int = -1,
                 workers: Optional[int] = None) -> ModeErrors:
@@ -2007,14 +1966,7 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
         Real data only: the modes are one per conjugate pair, as a fit with
         real_signal=True reports them. False (real data): every pole of the
         real record, each off 0 and fs/2 with its conjugate partner.
-    axis : int, default -1
-        The axis of x along which the samples of a record run, for an N-D x:
-        each 1-D slice along it is a record, fitted by one library call for
-        the whole batch (see "Batches" above).
-    workers : int or None, default None
-        Threads a batch's records are fitted on: None one, a positive count
-        that many, -1 one per processor (-2 all but one, ...); 0 is an
-        ArgumentError. The results are the same for every count.
+    %(batch parameters)s
 
     Returns
     -------
