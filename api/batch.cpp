@@ -8,7 +8,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstdio>
-#include <memory>
 
 #include "api/last_error.h"
 #include "api/plain_face.h"
@@ -26,21 +25,33 @@ struct Layout {
   int32_t threads;
 };
 
-// What one thread keeps of its records: the first that failed (it takes them
-// in increasing order) and that record's message.
-struct Worker {
-  int64_t failed = -1;
+// The first record that failed, and its message, read on the thread that
+// fitted it right after the call. Failures are rare: the short spin that
+// guards the message costs nothing beside a fit.
+struct FirstFailure {
+  std::atomic<int64_t> record{INT64_MAX};
+  std::atomic_flag busy = ATOMIC_FLAG_INIT;
   char message[256] = "";
+
+  void Offer(int64_t i) {
+    if (i >= record.load()) return;
+    while (busy.test_and_set(std::memory_order_acquire)) {
+    }
+    if (i < record.load(std::memory_order_relaxed)) {
+      record = i;
+      qdm_last_error_message(message, sizeof message);
+    }
+    busy.clear(std::memory_order_release);
+  }
 };
 
 template <typename Record>
 struct Run {
-  const Record* record;
-  int64_t count;
-  int32_t* status;
+  const Record* record = nullptr;
+  int64_t count = 0;
+  int32_t* status = nullptr;
   std::atomic<int64_t> next{0};
-  std::atomic<int> slots{0};
-  Worker workers[platform::kMaxThreads];
+  FirstFailure first;
 };
 
 // Records are handed out one at a time: a fit costs far more than the atomic
@@ -48,14 +59,10 @@ struct Run {
 template <typename Record>
 void Work(void* context) {
   auto& run = *static_cast<Run<Record>*>(context);
-  Worker& w = run.workers[run.slots++];
   for (int64_t i; (i = run.next++) < run.count;) {
     const int32_t s = (*run.record)(i);
     run.status[i] = s;
-    if (s < 0 && w.failed < 0) {
-      w.failed = i;
-      qdm_last_error_message(w.message, sizeof w.message);
-    }
+    if (s < 0) run.first.Offer(i);
   }
 }
 
@@ -92,24 +99,21 @@ int32_t RunBatch(const Layout& b, size_t element, int64_t values, const Record& 
     const plain::Admission admission;
     if (const int32_t s = record(0); s != QDM_OK) return s;  // its message is recorded
   }
-  auto run = std::make_unique<Run<Record>>();
-  run->record = &record;
-  run->count = b.count;
-  run->status = b.status;
+  Run<Record> run;
+  run.record = &record;
+  run.count = b.count;
+  run.status = b.status;
   const int64_t wanted = b.threads == 0 ? platform::Processors() : b.threads;
   const int threads = static_cast<int>(std::min<int64_t>({wanted, b.count, platform::kMaxThreads}));
-  platform::RunOnThreads(std::max(threads, 1), Work<Record>, run.get());
+  platform::RunOnThreads(std::max(threads, 1), Work<Record>, &run);
 
-  const Worker* first = nullptr;
-  for (const Worker& w : run->workers) {
-    if (w.failed >= 0 && (first == nullptr || w.failed < first->failed)) first = &w;
-  }
   last_error::Begin();
-  if (first == nullptr) return last_error::End(QDM_OK);
+  const int64_t first = run.first.record;
+  if (first == INT64_MAX) return last_error::End(QDM_OK);
   char text[384];
   std::snprintf(
-      text, sizeof text, "record %lld: %s", static_cast<long long>(first->failed),
-      first->message[0] != '\0' ? first->message : qdm_status_text(b.status[first->failed]));
+      text, sizeof text, "record %lld: %s", static_cast<long long>(first),
+      run.first.message[0] != '\0' ? run.first.message : qdm_status_text(b.status[first]));
   return last_error::Text(QDM_WARN_RECORD_FAILED, text);
 }
 
