@@ -74,8 +74,8 @@ int32_t CheckLayout(const Layout& b, size_t element, int64_t values) {
                        double(values) * 2.0 * sizeof(double);
   const double most = std::floor(double(PTRDIFF_MAX) / bytes);
   if (double(b.count) > most) {
-    return last_error::RefuseAgainst(QDM_ERR_BATCH, "count", double(b.count),
-                                     "is above the records the address space holds,", "max", most);
+    return last_error::RefuseAgainst(QDM_ERR_BATCH, "count", double(b.count), "is above",
+                                     "the records of this size the address space holds", most);
   }
   return QDM_OK;
 }

@@ -17,6 +17,7 @@ cd "$(dirname "$0")/.."
 scripts/deps.sh cmake make g++ python3 liblapack-dev libblas-dev liblapacke-dev \
   libopenblas0-pthread libopenblas-pthread-dev libgtest-dev libgmock-dev libfftw3-dev libbenchmark-dev \
   python3-numpy python3-pytest python3-matplotlib python3-venv python3-pip \
+  python3-dask python3-distributed python3-xarray \
   pkg-config doxygen dpkg-dev libcli11-dev nlohmann-json3-dev gnuplot-nox \
   clang-14 libclang-rt-14-dev clang-format-14 clang-tidy-14 valgrind || exit 1
 
@@ -75,9 +76,9 @@ suite release "${release[@]}" || failed=1
 tsan() {
   cmake -S . -B build/tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DQDM_TSAN=ON -DQDM_BLAS=reference \
     -DQDM_BUILD_EXAMPLE=OFF -DQDM_WERROR=ON "${launcher[@]}" >/dev/null || return 1
-  cmake --build build/tsan -j"$jobs" --target e2e_concurrency api_plain_threads >/dev/null || return 1
+  cmake --build build/tsan -j"$jobs" --target e2e_concurrency api_plain_threads api_plain_batch >/dev/null || return 1
   TSAN_OPTIONS="halt_on_error=1 suppressions=$PWD/tests/tsan.supp" ctest --test-dir build/tsan \
-    -R '^(e2e\.Concurrency|api\.PlainThreads)' \
+    -R '^(e2e\.Concurrency|api\.PlainThreads|api\.PlainBatch)' \
     --output-on-failure --timeout 900 | tail -n 3
 }
 # The fuzzer: every corpus and regression input once, then a minute of fuzzing

@@ -143,4 +143,8 @@ ctest --test-dir "$build" -j"$jobs" --output-on-failure --timeout 600 >"$build/c
 rc=$?
 say "tests finished (full log: build/windows/ctest.log)"
 grep -v -E '^ *Start +[0-9]+:|Test +#[0-9]+: .* Passed' "$build/ctest.log"
+# The README's command for the example host under wine, as written, from here.
+say "the README's wine command"
+/usr/bin/python3 tests/readme/readme_blocks.py run-for scripts/windows.sh README.md >"$build/readme.log" 2>&1 ||
+  { cat "$build/readme.log"; rc=1; }
 exit $rc

@@ -11,7 +11,7 @@ covariance_psd  power spectrum of the covariance AR model
 pcar_psd        power spectrum of the principal-component AR model, and its modes
 stabilization   pencil modes across model orders, the stable ones marked
 
-Every fit takes one 1-D array ``x``; every other argument is keyword-only.
+Every fit takes an array ``x``; every other argument is keyword-only.
 Its dtype picks the real (float64) or the complex (complex128) fit; other
 numeric dtypes that numpy casts safely to one of them (bool, integers,
 float16/32, complex64) are converted, anything else raises DTypeError.
@@ -34,12 +34,31 @@ values) and complex data two-sided ones (-fs/2 + arange(N) fs/N), N the power
 of two not below ``nfft``; ``return_onesided=False`` asks real data for the
 two-sided form.
 
+Batches
+-------
+An N-D ``x`` is a batch of records, the 1-D slices along ``axis`` (default
+the last), all fitted by one library call on ``workers`` threads (default
+one; -1 one per processor). Record i's results are those of the 1-D call on
+it, bit for bit, for any thread count; every field gets the batch's shape
+in front (a spectrum's frequency axis stays 1-D, shared), mode arrays are
+padded with NaN past each record's ``mode_count``. A failure that belongs
+to one record (a NaN sample -42419, a degenerate record -30001 or -20068,
+a solve that did not converge, no memory -20001) does not raise: it is that
+record's entry in the result's ``status`` array (`status_text` reads it),
+its values NaN, while the other records complete; 0 and 20001 (rank
+deficient, complete; one RankDeficientWarning per batch) are successes. An
+argument that is wrong for every record still raises. Rows of a row-strided
+float64 or complex128 view are read in place; other layouts are copied.
+`stabilization` takes one record only.
+
 Errors are `Error` subclasses carrying the library's status code; a
 rank-deficient least-squares solve inside a fit is a `RankDeficientWarning`,
 and modes whose error bound is singular a `SingularBoundWarning`.
 """
 import ctypes as _ct
+import math as _math
 import operator as _op
+import os as _os
 import warnings as _warnings
 from typing import Literal, NamedTuple, Optional, Sequence, Union
 
@@ -54,7 +73,7 @@ __all__ = ["covariance", "pcar", "prony", "matrix_pencil", "mdl_order", "covaria
            "NumericError", "NonFiniteResultError", "RankDeficientWarning", "SingularBoundWarning",
            "status_text", "__version__",
            "CovarianceFit", "PcarFit", "PronyFit", "PencilFit", "CovarianceSpectrum",
-           "PcarSpectrum", "ModeErrors", "Stabilization"]
+           "PcarSpectrum", "ModeErrors", "MdlOrder", "Stabilization"]
 
 __version__: str = _clib.qdm_version().decode()
 
@@ -254,19 +273,19 @@ _NULL_POINTER = -42421
 
 
 def _check(status, function, names=(), *given):
-    """Raises the error a library status stands for. For an argument error,
+    """Raises the error a library status stands for, or warns and returns it. For an argument error,
     `names` pairs the library's argument names with this package's, and
     `given` holds the caller's values in the same order (None: the library's
     value is the caller's): the library's message is told in the caller's terms."""
     if status == 0:
-        return
+        return 0
     text = status_text(status)
     if status == _RANK_DEFICIENT:
         _warnings.warn(RankDeficientWarning(status, text, function), stacklevel=3)
-        return
+        return status
     if status == _BOUND_SINGULAR:
         _warnings.warn(SingularBoundWarning(status, text, function), stacklevel=3)
-        return
+        return status
     if -42499 <= status <= -42400:
         raise ArgumentError(status, text, function, _detail(names, given))
     if status == _NO_MEMORY:
@@ -333,7 +352,8 @@ def _signal(x, function):
                                "complex128", function)
     if a.ndim != 1:
         raise ArgumentError(None, f"x must be one-dimensional, not {a.ndim}-D "
-                                  f"of shape {a.shape}", function)
+                                  f"of shape {a.shape}" if a.ndim else
+                                  "x must have at least one dimension, not 0-D", function)
     if a.shape[0] > _INT32_MAX:
         raise ArgumentError(None, "x has more than 2^31 - 1 samples", function)
     return _np.ascontiguousarray(a, dtype=dt), dt is _C128
@@ -393,6 +413,8 @@ def _kind(c):
 
 # ---- results -------------------------------------------------------------------------
 _Coefficients = Union[NDArray[_np.float64], NDArray[_np.complex128]]
+_Status = Union[int, NDArray[_np.int32]]
+_Scalar = Union[float, NDArray[_np.float64]]
 
 
 class CovarianceFit(NamedTuple):
@@ -409,10 +431,20 @@ class CovarianceFit(NamedTuple):
     noise_variance : float
         Mean squared forward prediction error over the n - p equations, in
         the units of x squared.
+    status : int, or ndarray of int32
+        The fit's status: 0, or 20001 when a least-squares system was rank
+        deficient (the results are complete). For a batch, one per record
+        (the batch's shape): also a record's error code, its values then
+        NaN (see "Batches" in the package's documentation).
+
+    For a batch every field gains the batch's shape in front: coefficients
+    (*batch, order + 1), poles (*batch, order), noise_variance and status
+    (*batch).
     """
     coefficients: _Coefficients
     poles: NDArray[_np.complex128]
-    noise_variance: float
+    noise_variance: _Scalar
+    status: _Status
 
 
 class PcarFit(NamedTuple):
@@ -426,9 +458,17 @@ class PcarFit(NamedTuple):
     roots : ndarray of complex128, shape (order,)
         The p zeros of the AR polynomial, in the order the root finder found
         them (not sorted, not paired).
+    status : int, or ndarray of int32
+        The fit's status: 0, or 20001 when a least-squares system was rank
+        deficient (the results are complete). For a batch, one per record
+        (the batch's shape): also a record's error code, its values then
+        NaN (see "Batches" in the package's documentation).
+
+    For a batch every field gains the batch's shape in front.
     """
     coefficients: _Coefficients
     roots: NDArray[_np.complex128]
+    status: _Status
 
 
 class PronyFit(NamedTuple):
@@ -470,6 +510,18 @@ class PronyFit(NamedTuple):
         per sample.
     damping_per_s_stderr : ndarray
         damping_stderr * fs, the standard error of `damping_per_s`.
+    mode_count : int, or ndarray of int32
+        The number of modes reported (the length of the mode arrays); for a
+        batch, one per record, 0 for a record that failed.
+    status : int, or ndarray of int32
+        The fit's status: 0, or 20001 when a least-squares system was rank
+        deficient (the results are complete). For a batch, one per record
+        (the batch's shape): also a record's error code, its values then
+        NaN (see "Batches" in the package's documentation).
+
+    For a batch the mode fields are (*batch, order) arrays (the room for
+    every mode asked for), each record's modes first and sorted as the 1-D
+    call sorts them, NaN after its `mode_count`; the scalars are (*batch).
     """
     amplitude: NDArray[_np.float64]
     phase: NDArray[_np.float64]
@@ -481,6 +533,8 @@ class PronyFit(NamedTuple):
     damping_stderr: NDArray[_np.float64]
     frequency_stderr: NDArray[_np.float64]
     damping_per_s_stderr: NDArray[_np.float64]
+    mode_count: _Status
+    status: _Status
 
 
 class PencilFit(NamedTuple):
@@ -524,24 +578,38 @@ class PencilFit(NamedTuple):
         per sample.
     damping_per_s_stderr : ndarray
         damping_stderr * fs, the standard error of `damping_per_s`.
+    mode_count : int, or ndarray of int32
+        The number of modes reported (the length of the mode arrays); for a
+        batch, one per record, 0 for a record that failed.
+    status : int, or ndarray of int32
+        The fit's status: 0, or 20001 when a least-squares system was rank
+        deficient (the results are complete). For a batch, one per record
+        (the batch's shape): also a record's error code, its values then
+        NaN (see "Batches" in the package's documentation).
+
+    For a batch the mode fields are (*batch, modes) arrays (the room for
+    every mode asked for), each record's modes first and sorted as the 1-D
+    call sorts them, NaN after its `mode_count`; the scalars are (*batch).
     """
     amplitude: NDArray[_np.float64]
     phase: NDArray[_np.float64]
     damping: NDArray[_np.float64]
     frequency: NDArray[_np.float64]
-    mse: float
+    mse: _Scalar
     damping_per_s: NDArray[_np.float64]
     amplitude_stderr: NDArray[_np.float64]
     phase_stderr: NDArray[_np.float64]
     damping_stderr: NDArray[_np.float64]
     frequency_stderr: NDArray[_np.float64]
     damping_per_s_stderr: NDArray[_np.float64]
+    mode_count: _Status
+    status: _Status
 
 
 class CovarianceSpectrum(NamedTuple):
     """The covariance AR model's power spectrum, as `covariance_psd` returns it.
 
-    Unpacks as ``f, Pxx, db, noise_variance``, the first two as
+    Unpacks as ``f, Pxx, db, noise_variance, status``, the first two as
     scipy.signal.welch(x, fs, scaling="density") returns them.
 
     Attributes
@@ -563,11 +631,21 @@ class CovarianceSpectrum(NamedTuple):
     noise_variance : float
         The AR model's prediction-error variance (`CovarianceFit.noise_variance`),
         in the units of x squared.
+    status : int, or ndarray of int32
+        The fit's status: 0, or 20001 when a least-squares system was rank
+        deficient (the results are complete). For a batch, one per record
+        (the batch's shape): also a record's error code, its values then
+        NaN (see "Batches" in the package's documentation).
+
+    For a batch the axis stays 1-D, shared by every record; psd and
+    spectrum are (*batch, len(frequencies)), noise_variance and status
+    (*batch), as scipy.signal.welch lays out the spectra of N-D data.
     """
     frequencies: NDArray[_np.float64]
     psd: NDArray[_np.float64]
     spectrum: NDArray[_np.float64]
-    noise_variance: float
+    noise_variance: _Scalar
+    status: _Status
 
 
 class PcarSpectrum(NamedTuple):
@@ -593,13 +671,28 @@ class PcarSpectrum(NamedTuple):
         arg(z_i) fs / (2 pi): in Hz when fs is given, else cycles per sample.
     fit_error : float
         Mean squared error of the amplitude fit, in the units of x squared.
+    mode_count : int, or ndarray of int32
+        The number of modes reported (the length of the mode arrays); for a
+        batch, one per record, 0 for a record that failed.
+    status : int, or ndarray of int32
+        The fit's status: 0, or 20001 when a least-squares system was rank
+        deficient (the results are complete). For a batch, one per record
+        (the batch's shape): also a record's error code, its values then
+        NaN (see "Batches" in the package's documentation).
+
+    For a batch the axis stays 1-D and shared; spectrum is (*batch,
+    len(frequencies)), the mode fields (*batch, components), each record's
+    modes first, sorted as the 1-D call sorts them, NaN after its
+    `mode_count`; fit_error and the counts (*batch).
     """
     frequencies: NDArray[_np.float64]
     spectrum: NDArray[_np.float64]
     amplitude: NDArray[_np.float64]
     phase: NDArray[_np.float64]
     frequency: NDArray[_np.float64]
-    fit_error: float
+    fit_error: _Scalar
+    mode_count: _Status
+    status: _Status
 
 
 class ModeErrors(NamedTuple):
@@ -625,13 +718,38 @@ class ModeErrors(NamedTuple):
         The noise variance the errors rest on, in the units of x squared:
         ||x - model||**2 / (n - 2M) per complex sample for complex data,
         ||x - model||**2 / (n - P) for real data (P real parameters).
+    status : int, or ndarray of int32
+        0, or 20002 when some modes' bound is singular (their errors NaN).
+        For a batch, one per record: also a record's error code (-42425 for
+        a NaN or infinite mode value, -42416 for a record without modes,
+        ...), its values then NaN.
+
+    For a batch the arrays are (*batch, M) like the modes given, NaN past
+    each record's modes; noise_variance and status are (*batch).
     """
     amplitude_stderr: NDArray[_np.float64]
     phase_stderr: NDArray[_np.float64]
     damping_stderr: NDArray[_np.float64]
     frequency_stderr: NDArray[_np.float64]
     damping_per_s_stderr: NDArray[_np.float64]
-    noise_variance: float
+    noise_variance: _Scalar
+    status: _Status
+
+
+class MdlOrder(NamedTuple):
+    """The orders `mdl_order` chooses for a batch of records.
+
+    Attributes
+    ----------
+    order : ndarray of int32, the batch's shape
+        Each record's order, as the 1-D call gives it; 0 for a record that
+        failed.
+    status : ndarray of int32, the batch's shape
+        Each record's status: 0, 20001 (a rank-deficient fit, the order
+        complete), or the record's error code.
+    """
+    order: NDArray[_np.int32]
+    status: NDArray[_np.int32]
 
 
 def _modes(rows, k):
@@ -701,8 +819,180 @@ def _onesided(return_onesided, is_complex, function):
 
 
 
+# ---- batches -------------------------------------------------------------------------
+# An N-D x is a batch of records, the 1-D slices along `axis`, fitted by the
+# library's batch twin of the fit in one call: one status per record, the
+# records spread over `workers` threads, each record's results those of the
+# 1-D call on it, bit for bit.
+_RECORD_FAILED = 20003
+
+
+class _Records(NamedTuple):
+    a: _np.ndarray   # count rows of n samples: row i at element i * distance
+    c: bool
+    shape: tuple     # the batch shape, x's shape without the axis
+    n: int
+    count: int
+    distance: int
+
+
+def _axis(axis, ndim, function):
+    """axis as an index into x's dimensions; out of range is an ArgumentError naming it."""
+    try:
+        v = _op.index(axis)
+    except TypeError:
+        raise TypeError(f"{function}: axis must be an integer, not {axis!r}") from None
+    if not -ndim <= v < ndim:
+        raise ArgumentError(None, f"axis {v} is out of range for x of {ndim} dimension"
+                                  f"{'s' if ndim > 1 else ''}", function)
+    return v % ndim
+
+
+def _input(x, axis, function):
+    """x for a fit: (a, c, None) for one 1-D record, as `_signal` gives it, or
+    (None, c, records) for a batch."""
+    a = x if type(x) is _np.ndarray else _np.asarray(x)
+    if a.ndim < 2:
+        if axis != -1 and a.ndim == 1:
+            _axis(axis, 1, function)
+        a, c = _signal(a, function)
+        return a, c, None
+    dt = a.dtype
+    if dt != _F64 and dt != _C128:
+        if _np.can_cast(dt, _F64, "safe"):
+            dt = _F64
+        elif _np.can_cast(dt, _C128, "safe"):
+            dt = _C128
+        else:
+            raise DTypeError(None, f"x of dtype {dt} has no lossless conversion to float64 or "
+                                   "complex128", function)
+    m = _np.moveaxis(a, _axis(axis, a.ndim, function), -1)
+    shape, n = m.shape[:-1], m.shape[-1]
+    if n > _INT32_MAX:
+        raise ArgumentError(None, "x has more than 2^31 - 1 samples along axis", function)
+    count = _math.prod(shape)
+    r = m.reshape(count, n)  # a view wherever the rows have one stride
+    if r.dtype != dt:
+        r = r.astype(dt, order="C")
+    size, (s0, s1) = r.itemsize, r.strides
+    # Rows of contiguous samples one stride apart go in as they are, the stride
+    # as the distance; anything else is copied into packed rows.
+    if not (r.flags.aligned and (n < 2 or s1 == size)
+            and (count < 2 or (s0 >= 0 and s0 % size == 0))):
+        r = _np.ascontiguousarray(r)
+        s0 = n * size
+    return None, dt == _C128, _Records(r, dt == _C128, shape, n, count,
+                                       s0 // size if count > 1 else n)
+
+
+def _workers(workers, function):
+    """The library's thread count for `workers`: None 1, a positive count
+    itself, -1 every processor (0 to the library), -2 all but one, ..."""
+    if workers is None:
+        return 1
+    try:
+        w = _op.index(workers)
+    except TypeError:
+        raise TypeError(f"{function}: workers must be an integer or None, "
+                        f"not {workers!r}") from None
+    if w > 0:
+        return min(w, _INT32_MAX)
+    if w == -1:
+        return 0
+    if w < 0 and w + (_os.cpu_count() or 1) + 1 > 0:
+        return w + (_os.cpu_count() or 1) + 1
+    raise ArgumentError(None, f"workers {w} " + (
+        "is not allowed: None or 1 runs one thread, -1 one per processor" if w == 0 else
+        f"leaves no thread on {_os.cpu_count() or 1} processors"), function)
+
+
+def _batch(name, r, args, outputs, threads, function, names=(), given=(), count=None):
+    """The library's batch twin of `name` over the records r (the first
+    `count` of them): the call's own status and the records' statuses. An
+    error that concerns every record raises here, as the 1-D call raises it."""
+    k = r.count if count is None else count
+    status = _np.zeros(max(k, 1), _np.int32)
+    s = _fn[name + "_batch", _kind(r.c)](_addr(r.a), r.n, k, r.distance, *args, *outputs,
+                                        _addr(status), threads)
+    if s != 0 and s != _RECORD_FAILED:
+        _check(s, function, names, *given)
+        raise NumericError(s, status_text(s), function)
+    return status[:k]
+
+
+def _warn_records(status, code, category, function, stacklevel=4):
+    """One warning for the records whose status is `code` (a mask may stand for it)."""
+    hit = status == code if not isinstance(code, _np.ndarray) else code
+    k = int(_np.count_nonzero(hit))
+    if k:
+        first = int(status[_np.argmax(hit)]) if isinstance(code, _np.ndarray) else code
+        _warnings.warn(category(first, f"{status_text(first)} ({k} of {status.size} records)",
+                                function), stacklevel=stacklevel)
+
+
+def _stack(r, array):
+    """Packed rows as the batch's shape followed by the row's own."""
+    return array[:r.count].reshape(r.shape + array.shape[1:])
+
+
+def _fill_failed(status, *arrays):
+    """NaN in every output row of a record that failed."""
+    bad = status < 0
+    if bad.any():
+        for v in arrays:
+            v[:status.size][bad] = _np.nan
+
+
+def _batch_stderr(r, fs, flag, block, counts, status, function, threads):
+    """The standard errors of the modes a Prony or pencil batch left in
+    block[:, i, :counts[i]], by the mode errors' batch, as `_stderr` gives
+    them record by record: NaN with one SingularBoundWarning where they
+    cannot be made, and a record whose computation failed otherwise (no
+    memory, LAPACK) takes that status."""
+    k, room = r.count, block.shape[2]
+    out = _np.full((4, max(k, 1), room), _np.nan)
+    fitted = (status >= 0) & (counts > 0)
+    if not fitted.any():
+        return out[:, :k]
+    nv = _np.empty(max(k, 1))
+    es = _np.zeros(max(k, 1), _np.int32)
+    args: tuple = (fs,) + (() if r.c else (flag,)) + (room, _addr(counts))
+    s = _fn["mode_errors_batch", _kind(r.c)](
+        _addr(r.a), r.n, k, r.distance, *args, *[_addr(block[q]) for q in range(4)],
+        *[_addr(out[q]) for q in range(4)], _addr(nv), _addr(es), threads)
+    es = es[:k]
+    if s != 0 and s != _RECORD_FAILED:
+        if not (-42499 <= s <= -42400 or s in _NO_BOUND):
+            _check(s, function)
+        es = _np.full(k, s, _np.int32)
+    cannot = fitted & ((es == _BOUND_SINGULAR) | ((es <= -42400) & (es >= -42499))
+                       | _np.isin(es, _NO_BOUND))
+    _warn_records(es, cannot, SingularBoundWarning, function, stacklevel=5)
+    broken = fitted & (es < 0) & ~cannot
+    status[broken] = es[broken]
+    out[:, :k][:, cannot & (es != _BOUND_SINGULAR)] = _np.nan
+    return out[:, :k]
+
+
+def _batch_modes(status, counts, fields, sort):
+    """Mode rows of a batch as the 1-D calls give them: entries past a record's
+    count (all of a failed record's) NaN, each record sorted by frequency
+    (fields[3]) as `_order` sorts it. `fields` is a list of (count, room) arrays."""
+    counts[status < 0] = 0
+    room = fields[0].shape[1]
+    pad = _np.arange(room) >= counts[:, None]
+    for v in fields:
+        v[pad] = _np.nan
+    if not sort or room == 0:
+        return fields
+    # Padding sorts last; a record's own frequencies are finite.
+    i = _np.argsort(_np.where(pad, _np.inf, fields[3]), axis=1, kind="stable")
+    return [_np.take_along_axis(v, i, axis=1) for v in fields]
+
+
 # ---- the fits ------------------------------------------------------------------------
-def covariance(x: "ArrayLike", *, order: int) -> CovarianceFit:
+def covariance(x: "ArrayLike", *, order: int, axis: int = -1,
+               workers: Optional[int] = None) -> CovarianceFit:
     """Covariance-method AR model: forward linear prediction by least squares.
 
     Fits x[t] + a[1] x[t-1] + ... + a[p] x[t-p] = e[t] over the n - p
@@ -711,11 +1001,20 @@ def covariance(x: "ArrayLike", *, order: int) -> CovarianceFit:
 
     Parameters
     ----------
-    x : array_like, 1-D, n >= 1 samples
-        The record. float64 runs the real fit, complex128 the complex one;
-        other dtypes numpy casts safely to one of them are converted.
+    x : array_like, n >= 1 samples along axis
+        The record, or for N-D x a batch of records along `axis`. float64
+        runs the real fit, complex128 the complex one; other dtypes numpy
+        casts safely to one of them are converted.
     order : int, 1 <= order <= floor(2n/3)
         The model order p.
+    axis : int, default -1
+        The axis of x along which the samples of a record run, for an N-D x:
+        each 1-D slice along it is a record, fitted by one library call for
+        the whole batch (see "Batches" above).
+    workers : int or None, default None
+        Threads a batch's records are fitted on: None one, a positive count
+        that many, -1 one per processor (-2 all but one, ...); 0 is an
+        ArgumentError. The results are the same for every count.
 
     Returns
     -------
@@ -724,6 +1023,9 @@ def covariance(x: "ArrayLike", *, order: int) -> CovarianceFit:
         coefficients a[0..p] with a[0] = 1 (float64 for real data, complex128
         for complex), the p complex poles, and the mean squared prediction
         error over the n - p equations (units of x squared).
+        Then ``status``: 0, or 20001 for the warning. For an N-D x a batch:
+        every field but a spectrum's axis gains the batch's shape in front,
+        and status holds each record's status (see the result's class).
 
     Raises
     ------
@@ -773,15 +1075,35 @@ def covariance(x: "ArrayLike", *, order: int) -> CovarianceFit:
     >>> fit.noise_variance < 1e-20
     True
     """
-    a, c = _signal(x, "covariance")
+    threads = _workers(workers, "covariance")
+    a, c, r = _input(x, axis, "covariance")
+    if r is not None:
+        coef, poles, nv, status = _covariance_batch(r, order, threads, "covariance")
+        _warn_records(status, _RANK_DEFICIENT, RankDeficientWarning, "covariance", 3)
+        return CovarianceFit(_stack(r, coef), _stack(r, poles), _stack(r, nv), _stack(r, status))
     n, p = a.shape[0], _int(order, "order", "covariance")
     m = _room(p, n)
     coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
     poles = _np.empty(max(m, 1), _C128)
     nv = _ct.c_double()
-    _check(_fn["covariance", _kind(c)](_addr(a), n, p, _addr(coef), _addr(poles),
-                                       _ct.byref(nv)), "covariance", _COVARIANCE, None, order)
-    return CovarianceFit(coef, poles[:m], nv.value)
+    status = _check(_fn["covariance", _kind(c)](_addr(a), n, p, _addr(coef), _addr(poles),
+                                                _ct.byref(nv)), "covariance", _COVARIANCE, None,
+                    order)
+    return CovarianceFit(coef, poles[:m], nv.value, status)
+
+
+def _covariance_batch(r, order, threads, function, names=_COVARIANCE, given=None, count=None):
+    """The covariance fits of a batch: coefficients, poles and noise variances
+    as packed rows (NaN for a failed record), and the statuses."""
+    p = _int(order, "order", function)
+    m, rows = _room(p, r.n), max(r.count, 1)
+    coef = _np.empty((rows, m + 1), _C128 if r.c else _F64)
+    poles = _np.empty((rows, max(m, 1)), _C128)
+    nv = _np.empty(rows)
+    status = _batch("covariance", r, (p,), (_addr(coef), _addr(poles), _addr(nv)), threads,
+                    function, names, (None, order) if given is None else given, count)
+    _fill_failed(status, coef, poles, nv)
+    return coef[:r.count], poles[:r.count, :m], nv[:r.count], status
 
 
 _SOLVERS = {"auto": 0, "dense": 1, "krylov": 2}
@@ -794,7 +1116,8 @@ def _solver(solver, where):
 
 
 def pcar(x: "ArrayLike", *, order: int, components: int,
-         solver: Literal["auto", "dense", "krylov"] = "auto") -> PcarFit:
+         solver: Literal["auto", "dense", "krylov"] = "auto", axis: int = -1,
+         workers: Optional[int] = None) -> PcarFit:
     """Principal-component AR model: prediction through a truncated pseudo-inverse.
 
     Fits the AR model of order p to the forward and the backward linear
@@ -806,9 +1129,10 @@ def pcar(x: "ArrayLike", *, order: int, components: int,
 
     Parameters
     ----------
-    x : array_like, 1-D, n >= 1 samples
-        The record. float64 runs the real fit, complex128 the complex one;
-        other dtypes numpy casts safely to one of them are converted.
+    x : array_like, n >= 1 samples along axis
+        The record, or for N-D x a batch of records along `axis`. float64
+        runs the real fit, complex128 the complex one; other dtypes numpy
+        casts safely to one of them are converted.
     order : int, 1 <= order <= floor(2n/3)
         The model order p (0 passes the order check, but no `components`
         value is then valid).
@@ -823,6 +1147,14 @@ def pcar(x: "ArrayLike", *, order: int, components: int,
         at large orders. "auto" takes whichever is estimated to be faster.
         Both routes give the same coefficients to rounding wherever the kept
         components stand clear of the next.
+    axis : int, default -1
+        The axis of x along which the samples of a record run, for an N-D x:
+        each 1-D slice along it is a record, fitted by one library call for
+        the whole batch (see "Batches" above).
+    workers : int or None, default None
+        Threads a batch's records are fitted on: None one, a positive count
+        that many, -1 one per processor (-2 all but one, ...); 0 is an
+        ArgumentError. The results are the same for every count.
 
     Returns
     -------
@@ -830,6 +1162,9 @@ def pcar(x: "ArrayLike", *, order: int, components: int,
         Named tuple ``(coefficients, roots)``: a[0..p] with a[0] = 1
         (float64 for real data, complex128 for complex) and the p complex
         roots of the AR polynomial.
+        Then ``status``: 0, or 20001 for the warning. For an N-D x a batch:
+        every field but a spectrum's axis gains the batch's shape in front,
+        and status holds each record's status (see the result's class).
 
     Raises
     ------
@@ -874,19 +1209,32 @@ def pcar(x: "ArrayLike", *, order: int, components: int,
     >>> print(np.sort(np.angle(z[:4]) / (2 * np.pi)).round(6))    # cycles per sample
     [-0.3 -0.1  0.1  0.3]
     """
-    a, c = _signal(x, "pcar")
+    threads = _workers(workers, "pcar")
+    a, c, r = _input(x, axis, "pcar")
     _solver(solver, "pcar")
-    n, p, k = a.shape[0], _int(order, "order", "pcar"), _int(components, "components", "pcar")
+    n = a.shape[0] if r is None else r.n
+    p, k = _int(order, "order", "pcar"), _int(components, "components", "pcar")
     m = _room(p, n)
+    if r is not None:
+        rows = max(r.count, 1)
+        coef = _np.empty((rows, m + 1), _C128 if c else _F64)
+        roots = _np.empty((rows, max(m, 1)), _C128)
+        status = _batch("pcar", r, (p, k, _SOLVERS[solver]), (_addr(coef), _addr(roots)),
+                        threads, "pcar", _PCAR, (None, order, components))
+        _fill_failed(status, coef, roots)
+        _warn_records(status, _RANK_DEFICIENT, RankDeficientWarning, "pcar", 3)
+        return PcarFit(_stack(r, coef), _stack(r, roots[:, :m]), _stack(r, status))
     coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
     roots = _np.empty(max(m, 1), _C128)
-    _check(_fn["pcar_solver", _kind(c)](_addr(a), n, p, k, _SOLVERS[solver], _addr(coef),
-                                        _addr(roots)), "pcar", _PCAR, None, order, components)
-    return PcarFit(coef, roots[:m])
+    status = _check(_fn["pcar_solver", _kind(c)](_addr(a), n, p, k, _SOLVERS[solver],
+                                                 _addr(coef), _addr(roots)), "pcar", _PCAR,
+                    None, order, components)
+    return PcarFit(coef, roots[:m], status)
 
 
 def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
-          real_signal: bool = False, sort: bool = True) -> PronyFit:
+          real_signal: bool = False, sort: bool = True, axis: int = -1,
+          workers: Optional[int] = None) -> PronyFit:
     """Damped exponentials by Prony's method.
 
     Fits x[t] = sum_i A_i z_i**t with p = `order` poles z_i, the roots of a
@@ -895,9 +1243,10 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
 
     Parameters
     ----------
-    x : array_like, 1-D, n >= 1 samples
-        The record. float64 runs the real fit, complex128 the complex one;
-        other dtypes numpy casts safely to one of them are converted.
+    x : array_like, n >= 1 samples along axis
+        The record, or for N-D x a batch of records along `axis`. float64
+        runs the real fit, complex128 the complex one; other dtypes numpy
+        casts safely to one of them are converted.
     order : int, 1 <= order <= floor(2n/3)
         The number of exponentials p (a real sinusoid takes two).
     fs : float, fs > 0, default 1.0
@@ -910,6 +1259,14 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
     sort : bool, default True
         Sort the modes by frequency, every field alike. False keeps the
         order of the poles, as the C API gives them.
+    axis : int, default -1
+        The axis of x along which the samples of a record run, for an N-D x:
+        each 1-D slice along it is a record, fitted by one library call for
+        the whole batch (see "Batches" above).
+    workers : int or None, default None
+        Threads a batch's records are fitted on: None one, a positive count
+        that many, -1 one per processor (-2 all but one, ...); 0 is an
+        ArgumentError. The results are the same for every count.
 
     Returns
     -------
@@ -920,6 +1277,9 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
         ln|z_i| per sample (negative when decaying), frequency arg(z_i) fs /
         (2 pi) (Hz when fs is given, else cycles per sample), damping_per_s
         = damping * fs (1/s). p modes, or fewer with real_signal.
+        Then the standard errors, ``mode_count`` and ``status``: 0, or 20001 for the warning. For an N-D x a batch:
+        every field but a spectrum's axis gains the batch's shape in front,
+        and status holds each record's status (see the result's class).
 
     Raises
     ------
@@ -970,26 +1330,37 @@ def prony(x: "ArrayLike", *, order: int, fs: float = 1.0,
     >>> print(fit.amplitude.round(6), fit.phase.round(6))
     [0.5  0.25] [ 0.5 -1. ]
     """
-    a, c = _signal(x, "prony")
-    n, p = a.shape[0], _int(order, "order", "prony")
+    threads = _workers(workers, "prony")
+    a, c, r = _input(x, axis, "prony")
+    n = a.shape[0] if r is None else r.n
+    p, rate = _int(order, "order", "prony"), _fs(fs, "prony")
+    flag = _real_flag(real_signal, c, "prony")
+    if r is not None:
+        block, counts = _np.empty((4, max(r.count, 1), max(_room(p, n), 1))), \
+            _np.zeros(max(r.count, 1), _np.int32)
+        status = _batch("prony", r, (p, rate) + (() if c else (flag,)),
+                        [_addr(block[q]) for q in range(4)] + [_addr(counts)], threads,
+                        "prony", _PRONY, (None, order))
+        fit = _batch_fits(r, rate, flag, block, counts, status, sort, "prony", threads)
+        return PronyFit(*fit[:4], fit[2] * rate, *fit[4:8], fit[6] * rate, fit[8],
+                        _stack(r, status))
     block, rows = _modes(4, _room(p, n))
     count = _ct.c_int32()
-    args: tuple = (_addr(a), n, p, _fs(fs, "prony"))
-    flag = _real_flag(real_signal, c, "prony")
-    if not c:
-        args += (flag,)
-    _check(_fn["prony", _kind(c)](*args, *rows, _ct.byref(count)), "prony", _PRONY, None, order)
+    args: tuple = (_addr(a), n, p, rate) + (() if c else (flag,))
+    status = _check(_fn["prony", _kind(c)](*args, *rows, _ct.byref(count)), "prony", _PRONY,
+                    None, order)
     amplitude, phase, damping, frequency = block[:, :count.value]
-    sa, sp, sd, sf = _stderr(a, c, args[3], flag, block, count.value, "prony")
+    sa, sp, sd, sf = _stderr(a, c, rate, flag, block, count.value, "prony")
     i = _order(frequency, sort)
-    return PronyFit(amplitude[i], phase[i], damping[i], frequency[i], damping[i] * args[3],
-                    sa[i], sp[i], sd[i], sf[i], sd[i] * args[3])
+    return PronyFit(amplitude[i], phase[i], damping[i], frequency[i], damping[i] * rate,
+                    sa[i], sp[i], sd[i], sf[i], sd[i] * rate, count.value, status)
 
 
 def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
                   fs: float = 1.0, real_signal: bool = False,
                   solver: Literal["auto", "dense", "krylov"] = "auto",
-                  sort: bool = True) -> PencilFit:
+                  sort: bool = True, axis: int = -1,
+                  workers: Optional[int] = None) -> PencilFit:
     """Damped exponentials by the matrix pencil method.
 
     Fits x[t] = sum_i A_i z_i**t: the poles z_i are the eigenvalues of the
@@ -1000,9 +1371,10 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
 
     Parameters
     ----------
-    x : array_like, 1-D, n >= 1 samples
-        The record. float64 runs the real fit, complex128 the complex one;
-        other dtypes numpy casts safely to one of them are converted.
+    x : array_like, n >= 1 samples along axis
+        The record, or for N-D x a batch of records along `axis`. float64
+        runs the real fit, complex128 the complex one; other dtypes numpy
+        casts safely to one of them are converted.
     modes : int, 1 <= modes <= pencil
         The number of exponentials M (a real sinusoid takes two). Fewer come
         back when M > n - L: see Notes.
@@ -1027,6 +1399,14 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
     sort : bool, default True
         Sort the modes by frequency, every field alike. False keeps the
         order of the poles, as the C API gives them.
+    axis : int, default -1
+        The axis of x along which the samples of a record run, for an N-D x:
+        each 1-D slice along it is a record, fitted by one library call for
+        the whole batch (see "Batches" above).
+    workers : int or None, default None
+        Threads a batch's records are fitted on: None one, a positive count
+        that many, -1 one per processor (-2 all but one, ...); 0 is an
+        ArgumentError. The results are the same for every count.
 
     Returns
     -------
@@ -1039,6 +1419,9 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
         cycles per sample), damping_per_s = damping * fs (1/s). mse is the
         mean squared error of the fitted modes against the record (units of
         x squared).
+        Then the standard errors, ``mode_count`` and ``status``: 0, or 20001 for the warning. For an N-D x a batch:
+        every field but a spectrum's axis gains the batch's shape in front,
+        and status holds each record's status (see the result's class).
 
     Raises
     ------
@@ -1106,30 +1489,55 @@ def matrix_pencil(x: "ArrayLike", *, modes: int, pencil: Optional[int] = None,
         ...
     qdm.ArgumentError: matrix_pencil: modes 41 is above pencil = 40
     """
-    a, c = _signal(x, "matrix_pencil")
+    threads = _workers(workers, "matrix_pencil")
+    a, c, r = _input(x, axis, "matrix_pencil")
     _solver(solver, "matrix_pencil")
-    n = a.shape[0]
+    n = a.shape[0] if r is None else r.n
     L = _clib.qdm_default_pencil(n) if pencil is None else _int(pencil, "pencil", "matrix_pencil")
     M = _int(modes, "modes", "matrix_pencil")
+    rate = _fs(fs, "matrix_pencil")
+    flag = _real_flag(real_signal, c, "matrix_pencil")
+    settings: tuple = (L, M, rate) + (() if c else (flag,)) + (_SOLVERS[solver],)
+    if r is not None:
+        rows = max(r.count, 1)
+        block, counts = _np.empty((4, rows, max(_room(M, n), 1))), _np.zeros(rows, _np.int32)
+        mse = _np.empty(rows)
+        status = _batch("matrix_pencil", r, settings,
+                        [_addr(block[q]) for q in range(4)] + [_addr(counts), _addr(mse)],
+                        threads, "matrix_pencil", _PENCIL, (None, pencil, modes))
+        fit = _batch_fits(r, rate, flag, block, counts, status, sort, "matrix_pencil", threads)
+        _fill_failed(status, mse)
+        return PencilFit(*fit[:4], _stack(r, mse), fit[2] * rate, *fit[4:8], fit[6] * rate,
+                         fit[8], _stack(r, status))
     block, rows = _modes(4, _room(M, n))
     count, mse = _ct.c_int32(), _ct.c_double()
-    args: tuple = (_addr(a), n, L, M, _fs(fs, "matrix_pencil"))
-    flag = _real_flag(real_signal, c, "matrix_pencil")
-    if not c:
-        args += (flag,)
-    args += (_SOLVERS[solver],)
-    _check(_fn["matrix_pencil_solver", _kind(c)](*args, *rows, _ct.byref(count),
-                                                  _ct.byref(mse)), "matrix_pencil", _PENCIL,
-           None, pencil, modes)
+    status = _check(_fn["matrix_pencil_solver", _kind(c)](_addr(a), n, *settings, *rows,
+                                                           _ct.byref(count), _ct.byref(mse)),
+                    "matrix_pencil", _PENCIL, None, pencil, modes)
     amplitude, phase, damping, frequency = block[:, :count.value]
-    sa, sp, sd, sf = _stderr(a, c, args[4], flag, block, count.value, "matrix_pencil")
+    sa, sp, sd, sf = _stderr(a, c, rate, flag, block, count.value, "matrix_pencil")
     i = _order(frequency, sort)
     return PencilFit(amplitude[i], phase[i], damping[i], frequency[i], mse.value,
-                     damping[i] * args[4], sa[i], sp[i], sd[i], sf[i], sd[i] * args[4])
+                     damping[i] * rate, sa[i], sp[i], sd[i], sf[i], sd[i] * rate, count.value,
+                     status)
+
+
+def _batch_fits(r, rate, flag, block, counts, status, sort, function, threads):
+    """A Prony or pencil batch's modes and their error bars, each record sorted
+    as the 1-D call sorts it: amplitude, phase, damping, frequency, their four
+    standard errors, all of the batch's shape followed by the room, and the
+    mode counts. The status of a record whose error bars failed is updated."""
+    k = r.count
+    block, counts = block[:, :k], counts[:k]
+    errors = _batch_stderr(r, rate, flag, block, counts, status, function, threads)
+    fields = _batch_modes(status, counts, list(block) + list(errors), sort)
+    _warn_records(status, _RANK_DEFICIENT, RankDeficientWarning, function, 4)
+    return [_stack(r, v) for v in fields] + [_stack(r, counts)]
 
 
 def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 1,
-              max_order: Optional[int] = None) -> int:
+              max_order: Optional[int] = None, axis: int = -1,
+              workers: Optional[int] = None) -> "Union[int, MdlOrder]":
     """Model order by the minimum description length of matrix-pencil fits.
 
     Scores each order m from `min_order` to r = min(n - L', L') by
@@ -1139,9 +1547,10 @@ def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 
 
     Parameters
     ----------
-    x : array_like, 1-D, n >= 1 samples
-        The record. float64 runs the real fit, complex128 the complex one;
-        other dtypes numpy casts safely to one of them are converted.
+    x : array_like, n >= 1 samples along axis
+        The record, or for N-D x a batch of records along `axis`. float64
+        runs the real fit, complex128 the complex one; other dtypes numpy
+        casts safely to one of them are converted.
     pencil : int or None, min_order < pencil <= floor(2n/3), default None
         The pencil parameter L of the scored fits; the largest order tried
         is min(n - L', L'). None takes the library's default, min(n // 3, 64)
@@ -1151,6 +1560,14 @@ def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 
         The smallest order tried.
     max_order : int or None, default None
         The old name of `pencil`: still accepted, with a DeprecationWarning.
+    axis : int, default -1
+        The axis of x along which the samples of a record run, for an N-D x:
+        each 1-D slice along it is a record, fitted by one library call for
+        the whole batch (see "Batches" above).
+    workers : int or None, default None
+        Threads a batch's records are fitted on: None one, a positive count
+        that many, -1 one per processor (-2 all but one, ...); 0 is an
+        ArgumentError. The results are the same for every count.
 
     Returns
     -------
@@ -1159,6 +1576,9 @@ def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 
         sinusoid counts two), usable as `modes` of `matrix_pencil`. 0 when no
         order scores below 10000. A fit with E below 2.2e-16 (a noise-free
         record) ends the search at once.
+    MdlOrder
+        For an N-D x: named tuple ``(order, status)`` of int32 arrays of the
+        batch's shape, each record's order (0 when it failed) and status.
 
     Raises
     ------
@@ -1205,8 +1625,9 @@ def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 
     >>> qdm.mdl_order(x, pencil=20, min_order=2)
     4
     """
-    a, c = _signal(x, "mdl_order")
-    n = a.shape[0]
+    threads = _workers(workers, "mdl_order")
+    a, c, r = _input(x, axis, "mdl_order")
+    n = a.shape[0] if r is None else r.n
     if max_order is not None:
         if pencil is not None:
             raise ArgumentError(None, "give pencil only (max_order is its old name)", "mdl_order")
@@ -1217,6 +1638,13 @@ def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 
     upper = (_clib.qdm_default_mdl_upper(n) if pencil is None
              else _int(pencil, "pencil", "mdl_order"))
     lower = _int(min_order, "min_order", "mdl_order")
+    if r is not None:
+        orders = _np.zeros(max(r.count, 1), _np.int32)
+        status = _batch("mdl_order", r, (upper, lower), (_addr(orders),), threads, "mdl_order",
+                        _MDL, (None, pencil, min_order))
+        orders[:r.count][status < 0] = 0
+        _warn_records(status, _RANK_DEFICIENT, RankDeficientWarning, "mdl_order", 3)
+        return MdlOrder(_stack(r, orders), _stack(r, status))
     order = _ct.c_int32(0)
     _check(_fn["mdl_order", _kind(c)](_addr(a), n, upper, lower, _ct.byref(order)), "mdl_order",
            _MDL, None, pencil, min_order)
@@ -1225,7 +1653,8 @@ def mdl_order(x: "ArrayLike", *, pencil: Optional[int] = None, min_order: int = 
 
 def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
                    fs: float = 1.0, return_onesided: Optional[bool] = None,
-                   points: Optional[int] = None) -> CovarianceSpectrum:
+                   points: Optional[int] = None, axis: int = -1,
+                   workers: Optional[int] = None) -> CovarianceSpectrum:
     """Power spectral density of the covariance-method AR model.
 
     Fits the order-p model of `covariance` (coefficients A, noise variance
@@ -1236,9 +1665,10 @@ def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
 
     Parameters
     ----------
-    x : array_like, 1-D, n >= 1 samples
-        The record. float64 runs the real fit, complex128 the complex one;
-        other dtypes numpy casts safely to one of them are converted.
+    x : array_like, n >= 1 samples along axis
+        The record, or for N-D x a batch of records along `axis`. float64
+        runs the real fit, complex128 the complex one; other dtypes numpy
+        casts safely to one of them are converted.
     order : int, 1 <= order <= floor(2n/3), order + 1 <= N
         The model order p.
     nfft : int or None, 2 <= nfft <= 2**30, default None (512)
@@ -1253,6 +1683,14 @@ def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
         fs/2 - fs/N. None: one-sided for real data, two-sided for complex.
     points : int or None, default None
         The old name of `nfft`: still accepted, with a DeprecationWarning.
+    axis : int, default -1
+        The axis of x along which the samples of a record run, for an N-D x:
+        each 1-D slice along it is a record, fitted by one library call for
+        the whole batch (see "Batches" above).
+    workers : int or None, default None
+        Threads a batch's records are fitted on: None one, a positive count
+        that many, -1 one per processor (-2 all but one, ...); 0 is an
+        ArgumentError. The results are the same for every count.
 
     Returns
     -------
@@ -1262,6 +1700,9 @@ def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
         units of x squared per Hz, the shape in dB (peak 0 dB), float64
         arrays of one length; and the model's prediction-error variance
         sigma**2 (units of x squared).
+        Then ``status``: 0, or 20001 for the warning. For an N-D x a batch:
+        every field but a spectrum's axis gains the batch's shape in front,
+        and status holds each record's status (see the result's class).
 
     Raises
     ------
@@ -1302,7 +1743,7 @@ def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
     >>> t = np.arange(64)
     >>> x = (np.exp(-0.01 * t) * np.cos(2 * np.pi * 0.1 * t + 0.5)
     ...      + 0.5 * np.exp(-0.02 * t) * np.cos(2 * np.pi * 0.3 * t - 1.0))
-    >>> f, Pxx, db, noise = qdm.covariance_psd(x, order=4, nfft=1000, fs=1000.0)
+    >>> f, Pxx, db, noise, status = qdm.covariance_psd(x, order=4, nfft=1000, fs=1000.0)
     >>> print(len(f), f[0], f[1] - f[0], f[-1])    # N = 1024: 0 to fs/2 in steps of fs/N
     513 0.0 0.9765625 500.0
     >>> print(db.max(), f[np.argmax(Pxx)].round(1))    # the peak, in Hz
@@ -1311,18 +1752,23 @@ def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
     >>> print(len(s.frequencies), s.frequencies[0])
     1024 -500.0
     """
-    a, c = _signal(x, "covariance_psd")
-    n, p = a.shape[0], _int(order, "order", "covariance_psd")
+    threads = _workers(workers, "covariance_psd")
+    a, c, r = _input(x, axis, "covariance_psd")
+    n = a.shape[0] if r is None else r.n
+    p = _int(order, "order", "covariance_psd")
     pts = _nfft(nfft, points, "covariance_psd")
     rate = _fs(fs, "covariance_psd")
     given = (None, order, nfft if points is None else points)
     flag = _onesided(return_onesided, c, "covariance_psd")
+    if r is not None:
+        return _covariance_psd_batch(r, p, pts, rate, flag, given, threads)
     m = _room(p, n)
     coef: _Coefficients = _np.empty(m + 1, _C128) if c else _np.empty(m + 1, _F64)
     poles = _np.empty(max(m, 1), _C128)
     nv = _ct.c_double()
-    _check(_fn["covariance", _kind(c)](_addr(a), n, p, _addr(coef), _addr(poles),
-                                       _ct.byref(nv)), "covariance_psd", _SPECTRUM, *given)
+    status = _check(_fn["covariance", _kind(c)](_addr(a), n, p, _addr(coef), _addr(poles),
+                                                _ct.byref(nv)), "covariance_psd", _SPECTRUM,
+                    *given)
     psd = _fn["ar_psd", _kind(c)]
     # Null outputs: the sizes are checked before room for them is made.
     probe = psd(None, p, nv.value, pts, rate, flag, None, None, None, None)
@@ -1333,12 +1779,49 @@ def covariance_psd(x: "ArrayLike", *, order: int, nfft: Optional[int] = None,
     _check(psd(_addr(coef), p, nv.value, pts, rate, flag, *(_addr(row) for row in out),
                _ct.byref(count)), "covariance_psd", _SPECTRUM, *given)
     f, db, psd = out[:, :count.value]
-    return CovarianceSpectrum(f, psd, db, nv.value)
+    return CovarianceSpectrum(f, psd, db, nv.value, status)
+
+
+def _axis_of(N, rate, onesided, values=None):
+    """The frequency axis of an N-value spectrum as the library lays it out,
+    and (with `values`) those N values laid out the same way, in place: the
+    layout only moves values, so a batch's rows follow the moves of 0..N-1."""
+    values = _np.zeros(N) if values is None else values
+    axis, length = _np.empty(N), _ct.c_int32()
+    _check(_clib.qdm_spectrum_layout(_addr(values), None, N, rate, onesided, _addr(axis),
+                                     _ct.byref(length)), "spectrum_layout")
+    return axis[:length.value], values[:length.value]
+
+
+def _covariance_psd_batch(r, p, pts, rate, flag, given, threads):
+    """covariance_psd on a batch: the covariance batch, then each fitted
+    record's spectrum by the same library call the 1-D path makes."""
+    # The arguments in the 1-D call's order: the fit's first, then the spectrum's.
+    _covariance_batch(r, p, threads, "covariance_psd", _SPECTRUM, given, count=0)
+    psd = _fn["ar_psd", _kind(r.c)]
+    probe = psd(None, p, 0.0, pts, rate, flag, None, None, None, None)
+    if probe != _NULL_POINTER:
+        _check(probe, "covariance_psd", _SPECTRUM, *given)
+    coef, _, nv, status = _covariance_batch(r, p, threads, "covariance_psd", _SPECTRUM, given)
+    N = _clib.qdm_spectrum_length(pts)
+    db, density = _np.full((r.count, N), _np.nan), _np.full((r.count, N), _np.nan)
+    scratch, count = _np.empty(N), _ct.c_int32()
+    for i in _np.flatnonzero(status >= 0):
+        s = psd(_addr(coef[i]), p, float(nv[i]), pts, rate, flag, _addr(scratch), _addr(db[i]),
+                _addr(density[i]), _ct.byref(count))
+        if s != 0:
+            status[i] = s
+    _fill_failed(status, db, density, nv)
+    _warn_records(status, _RANK_DEFICIENT, RankDeficientWarning, "covariance_psd", 4)
+    f, _ = _axis_of(N, rate, flag)
+    return CovarianceSpectrum(f, _stack(r, density[:, :f.size]), _stack(r, db[:, :f.size]),
+                              _stack(r, nv), _stack(r, status))
 
 
 def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int] = None,
              fs: float = 1.0, real_signal: bool = False, return_onesided: Optional[bool] = None,
-             sort: bool = True, points: Optional[int] = None) -> PcarSpectrum:
+             sort: bool = True, points: Optional[int] = None, axis: int = -1,
+             workers: Optional[int] = None) -> PcarSpectrum:
     """Power spectrum of the principal-component AR model, and its strongest modes.
 
     Evaluates 1/|A(f)|**2 of the model `pcar` fits at N frequencies, N the
@@ -1349,9 +1832,10 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
 
     Parameters
     ----------
-    x : array_like, 1-D, n >= 1 samples
-        The record. float64 runs the real fit, complex128 the complex one;
-        other dtypes numpy casts safely to one of them are converted.
+    x : array_like, n >= 1 samples along axis
+        The record, or for N-D x a batch of records along `axis`. float64
+        runs the real fit, complex128 the complex one; other dtypes numpy
+        casts safely to one of them are converted.
     order : int, 1 <= order <= floor(2n/3), order + 1 <= N
         The model order p (0 passes the order check, but no `components`
         value is then valid).
@@ -1375,6 +1859,14 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
         library's order, nearest the unit circle first.
     points : int or None, default None
         The old name of `nfft`: still accepted, with a DeprecationWarning.
+    axis : int, default -1
+        The axis of x along which the samples of a record run, for an N-D x:
+        each 1-D slice along it is a record, fitted by one library call for
+        the whole batch (see "Batches" above).
+    workers : int or None, default None
+        Threads a batch's records are fitted on: None one, a positive count
+        that many, -1 one per processor (-2 all but one, ...); 0 is an
+        ArgumentError. The results are the same for every count.
 
     Returns
     -------
@@ -1385,6 +1877,9 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
         of x), phase in radians in (-pi, pi], frequency in Hz when fs is
         given, else cycles per sample; and the amplitude fit's mean squared
         error (units of x squared). No damping, no density.
+        Then ``mode_count`` and ``status``: 0, or 20001 for the warning. For an N-D x a batch:
+        every field but a spectrum's axis gains the batch's shape in front,
+        and status holds each record's status (see the result's class).
 
     Raises
     ------
@@ -1433,35 +1928,55 @@ def pcar_psd(x: "ArrayLike", *, order: int, components: int, nfft: Optional[int]
     >>> print(s.frequency.round(3), s.amplitude.round(3), s.phase.round(3))
     [100. 300.] [0.5  0.25] [ 0.5 -1. ]
     """
-    a, c = _signal(x, "pcar_psd")
-    n, p = a.shape[0], _int(order, "order", "pcar_psd")
+    threads = _workers(workers, "pcar_psd")
+    a, c, r = _input(x, axis, "pcar_psd")
+    n = a.shape[0] if r is None else r.n
+    p = _int(order, "order", "pcar_psd")
     k = _int(components, "components", "pcar_psd")
     pts = _nfft(nfft, points, "pcar_psd")
     onesided = _onesided(return_onesided, c, "pcar_psd")
     N = _clib.qdm_spectrum_length(pts)
+    rate = _fs(fs, "pcar_psd")
+    flag = _real_flag(real_signal, c, "pcar_psd")
+    settings: tuple = (p, pts, k, rate) + (() if c else (flag,))
+    given = (None, order, nfft if points is None else points, components)
+    if r is not None:
+        rows = max(r.count, 1)
+        block, counts = _np.empty((3, rows, max(_room(k, n), 1))), _np.zeros(rows, _np.int32)
+        db, f0, df, err = _np.empty((rows, max(N, 1))), *_np.empty((3, rows))
+        status = _batch("pcar_psd", r, settings, [_addr(block[q]) for q in range(3)]
+                        + [_addr(counts), _addr(db), _addr(f0), _addr(df), _addr(err)],
+                        threads, "pcar_psd", _SPECTRUM, given)
+        _fill_failed(status, db, err)
+        _warn_records(status, _RANK_DEFICIENT, RankDeficientWarning, "pcar_psd", 3)
+        db, counts = db[:r.count], counts[:r.count]
+        f, moved = _axis_of(N, rate, onesided, _np.arange(N, dtype=_np.float64))
+        amplitude, phase, frequency = _batch_modes(status, counts, [block[0, :r.count],
+                                                   block[1, :r.count], block[2, :r.count],
+                                                   block[2, :r.count]], sort)[:3]
+        return PcarSpectrum(f, _stack(r, db[:, moved.astype(_np.intp)]), _stack(r, amplitude),
+                            _stack(r, phase), _stack(r, frequency), _stack(r, err),
+                            _stack(r, counts), _stack(r, status))
     db = _np.empty(max(N, 1))
     block, rows = _modes(3, _room(k, n))
     count = _ct.c_int32()
     f0, df, err = _ct.c_double(), _ct.c_double(), _ct.c_double()
-    args: tuple = (_addr(a), n, p, pts, k, _fs(fs, "pcar_psd"))
-    flag = _real_flag(real_signal, c, "pcar_psd")
-    if not c:
-        args += (flag,)
-    _check(_fn["pcar_psd", _kind(c)](*args, *rows, _ct.byref(count), _addr(db),
-                                     _ct.byref(f0), _ct.byref(df), _ct.byref(err)), "pcar_psd",
-           _SPECTRUM, None, order, nfft if points is None else points, components)
+    args: tuple = (_addr(a), n) + settings
+    status = _check(_fn["pcar_psd", _kind(c)](*args, *rows, _ct.byref(count), _addr(db),
+                                              _ct.byref(f0), _ct.byref(df), _ct.byref(err)),
+                    "pcar_psd", _SPECTRUM, *given)
     amplitude, phase, frequency = block[:, :count.value]
     axis, length = _np.empty(N), _ct.c_int32()
-    _check(_clib.qdm_spectrum_layout(_addr(db), None, N, args[5], onesided, _addr(axis),
+    _check(_clib.qdm_spectrum_layout(_addr(db), None, N, rate, onesided, _addr(axis),
                                      _ct.byref(length)), "pcar_psd")
     i = _order(frequency, sort)
     return PcarSpectrum(axis[:length.value], db[:length.value], amplitude[i], phase[i],
-                        frequency[i], err.value)
+                        frequency[i], err.value, count.value, status)
 
 
 def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[ArrayLike]]", *,
-                fs: float = 1.0,
-                real_signal: bool = False) -> ModeErrors:
+                fs: float = 1.0, real_signal: bool = False, axis: int = -1,
+                workers: Optional[int] = None) -> ModeErrors:
     """Standard errors of exponential modes: the Cramer-Rao bound at the modes.
 
     For the model of `prony` and `matrix_pencil`, evaluates the Jacobian D
@@ -1478,7 +1993,7 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
 
     Parameters
     ----------
-    x : array_like, 1-D, n samples
+    x : array_like, n samples along axis
         The record the modes describe: float64 for real data, complex128
         for complex data (other dtypes as for the fits).
     modes : PronyFit, PencilFit or a sequence of four arrays
@@ -1492,6 +2007,14 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
         Real data only: the modes are one per conjugate pair, as a fit with
         real_signal=True reports them. False (real data): every pole of the
         real record, each off 0 and fs/2 with its conjugate partner.
+    axis : int, default -1
+        The axis of x along which the samples of a record run, for an N-D x:
+        each 1-D slice along it is a record, fitted by one library call for
+        the whole batch (see "Batches" above).
+    workers : int or None, default None
+        Threads a batch's records are fitted on: None one, a positive count
+        that many, -1 one per processor (-2 all but one, ...); 0 is an
+        ArgumentError. The results are the same for every count.
 
     Returns
     -------
@@ -1499,6 +2022,9 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
         Named tuple ``(amplitude_stderr, phase_stderr, damping_stderr,
         frequency_stderr, damping_per_s_stderr, noise_variance)``, the
         arrays in the order of the modes given.
+        Then ``status``: 0, or 20002 for the warning. For an N-D x a batch:
+        every field but a spectrum's axis gains the batch's shape in front,
+        and status holds each record's status (see the result's class).
 
     Raises
     ------
@@ -1546,7 +2072,8 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
     >>> print(f"{e.noise_variance:.1e}")
     2.0e-04
     """
-    a, c = _signal(x, "mode_errors")
+    threads = _workers(workers, "mode_errors")
+    a, c, r = _input(x, axis, "mode_errors")
     if all(hasattr(modes, f) for f in ("amplitude", "phase", "damping", "frequency")):
         fields = (modes.amplitude, modes.phase, modes.damping, modes.frequency)
     else:
@@ -1556,6 +2083,12 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
                                       "phase, damping, frequency)", "mode_errors")
     block = _np.array([_np.asarray(v, dtype=_np.float64) for v in fields]) \
         if len({_np.shape(v) for v in fields}) == 1 else None
+    if r is not None:
+        if block is None or block.shape[1:-1] != r.shape:
+            raise ArgumentError(None, "the four mode arrays must be of one shape: x's batch "
+                                      f"shape {r.shape} followed by the modes", "mode_errors")
+        return _mode_errors_batch(r, block, _fs(fs, "mode_errors"),
+                                  _real_flag(real_signal, c, "mode_errors"), threads)
     if block is None or block.ndim != 2:
         raise ArgumentError(None, "the four mode arrays must be 1-D and of one length",
                             "mode_errors")
@@ -1564,9 +2097,33 @@ def mode_errors(x: "ArrayLike", modes: "Union[PronyFit, PencilFit, Sequence[Arra
     flag = _real_flag(real_signal, c, "mode_errors")
     status, out, variance = _errors_call(a, c, rate, flag, [block[q].ctypes.data for q in range(4)],
                                          _int(block.shape[1], "modes", "mode_errors"))
-    _check(status, "mode_errors")
+    status = _check(status, "mode_errors")
     sa, sp, sd, sf = out
-    return ModeErrors(sa, sp, sd, sf, sd * rate, variance)
+    return ModeErrors(sa, sp, sd, sf, sd * rate, variance, status)
+
+
+def _mode_errors_batch(r, block, rate, flag, threads):
+    """mode_errors on a batch. Record i's modes are the entries of its rows up
+    to the last that is not NaN in all four arrays (a batch fit pads its rows
+    with NaN); a record's failure is its status, its errors NaN."""
+    room = block.shape[-1]
+    rows = max(r.count, 1)
+    modes = _np.zeros((4, rows, room))
+    modes[:, :r.count] = block.reshape(4, r.count, room)
+    given = ~_np.isnan(modes[:, :r.count]).all(axis=0)
+    counts = _np.zeros(rows, _np.int32)
+    counts[:r.count] = _np.where(given.any(axis=1), room - _np.argmax(given[:, ::-1], axis=1), 0)
+    out, nv = _np.empty((4, rows, max(room, 1))), _np.empty(rows)
+    status = _batch("mode_errors", r, (rate,) + (() if r.c else (flag,))
+                    + (_int(room, "modes", "mode_errors"), _addr(counts)),
+                    [_addr(modes[q]) for q in range(4)] + [_addr(out[q]) for q in range(4)]
+                    + [_addr(nv)], threads, "mode_errors")
+    out = out[:, :r.count, :room]
+    out[:, _np.arange(room) >= counts[:r.count, None]] = _np.nan
+    _fill_failed(status, *out, nv)
+    _warn_records(status, _BOUND_SINGULAR, SingularBoundWarning, "mode_errors", 4)
+    sa, sp, sd, sf = (_stack(r, v) for v in out)
+    return ModeErrors(sa, sp, sd, sf, sd * rate, _stack(r, nv), _stack(r, status))
 
 
 class Stabilization(NamedTuple):
@@ -1623,8 +2180,10 @@ def stabilization(x: "ArrayLike", *, max_order: int, min_order: int = 1,
     Parameters
     ----------
     x : array_like, 1-D, n >= 1 samples
-        The record. float64 runs the real fit, complex128 the complex one;
-        other dtypes numpy casts safely to one of them are converted.
+        The record: one only. The diagram has no batch form (its row count
+        differs from record to record); loop over records to fit several.
+        float64 runs the real fit, complex128 the complex one; other dtypes
+        numpy casts safely to one of them are converted.
     max_order : int, min_order < max_order <= min(pencil, n - pencil)
         The highest order fitted.
     min_order : int, min_order >= 1, default 1

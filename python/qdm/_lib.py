@@ -76,6 +76,27 @@ for _name, _args in _SIGNATURES.items():
                                   if not (a == "R" and _kind == "complex")]
         functions[_name, _kind] = _f
 
+# Batch twins: (count, distance) after n, (status, threads) at the end; the
+# pencil and PCAR batches take the *_solver functions' arguments, and the mode
+# errors' count of modes becomes (room, per-record counts).
+_L = ctypes.c_int64
+_BATCHES = {"covariance": "covariance", "pcar": "pcar_solver", "prony": "prony",
+            "matrix_pencil": "matrix_pencil_solver", "mdl_order": "mdl_order",
+            "pcar_psd": "pcar_psd"}
+for _name, _single in _BATCHES.items():
+    for _kind in ("real", "complex"):
+        _f = getattr(lib, f"qdm_{_name}_batch_{_kind}")
+        _f.restype = _I
+        _f.argtypes = [_P, _I, _L, _L] + [_I if a == "R" else a for a in _SIGNATURES[_single]
+                                          if not (a == "R" and _kind == "complex")] + [_P, _I]
+        functions[_name + "_batch", _kind] = _f
+for _kind in ("real", "complex"):
+    _f = getattr(lib, f"qdm_mode_errors_batch_{_kind}")
+    _f.restype = _I
+    _f.argtypes = ([_P, _I, _L, _L, _D] + ([_I] if _kind == "real" else [])
+                   + [_I] + [_P] * 10 + [_P, _I])
+    functions["mode_errors_batch", _kind] = _f
+
 lib.qdm_status_text.restype = ctypes.c_char_p
 lib.qdm_status_text.argtypes = [_I]
 lib.qdm_spectrum_length.restype = _I

@@ -16,7 +16,8 @@ FUNCTIONS = [qdm.covariance, qdm.pcar, qdm.prony, qdm.matrix_pencil, qdm.mdl_ord
              qdm.covariance_psd, qdm.pcar_psd, qdm.mode_errors, qdm.stabilization,
              qdm.status_text]
 RESULTS = [qdm.CovarianceFit, qdm.PcarFit, qdm.PronyFit, qdm.PencilFit,
-           qdm.CovarianceSpectrum, qdm.PcarSpectrum, qdm.ModeErrors, qdm.Stabilization]
+           qdm.CovarianceSpectrum, qdm.PcarSpectrum, qdm.ModeErrors, qdm.MdlOrder,
+           qdm.Stabilization]
 SECTIONS = ["Parameters", "Returns", "Raises", "Examples"]
 
 

@@ -110,7 +110,7 @@ def test_a_noise_free_record_gives_errors_at_rounding_level(dtype):
         x = np.exp((-0.01 + 0.7j) * t) + 0.3j * np.exp((-0.002 - 2.1j) * t)
     fit = qdm.matrix_pencil(x.astype(dtype), modes=4 if dtype is np.float64 else 2)
     assert fit.mse < 1e-26
-    assert np.all(np.array(fit[6:]) < 1e-11)
+    assert np.all(np.array(fit[6:11]) < 1e-11)
     assert qdm.mode_errors(x, fit).noise_variance < 1e-26
 
 
@@ -131,7 +131,7 @@ def test_fields_follow_the_modes_when_sorted(fit):
     for name in ("amplitude", "phase", "damping", "frequency", "damping_per_s"):
         np.testing.assert_array_equal(getattr(raw, name + "_stderr")[i],
                                       getattr(ordered, name + "_stderr"))
-    np.testing.assert_array_equal(qdm.mode_errors(x, raw)[:5], raw[-5:])
+    np.testing.assert_array_equal(qdm.mode_errors(x, raw)[:5], raw[-7:-2])
 
 
 GOOD = ([1.0], [0.0], [0.0], [0.1])

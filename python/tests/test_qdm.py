@@ -143,7 +143,7 @@ E = qdm.ArgumentError
 BAD = [  # call, exception, library code (None: refused before the library)
     (lambda: qdm.covariance(REAL.astype(np.longdouble), order=4), qdm.DTypeError, None),
     (lambda: qdm.covariance(None, order=1), qdm.DTypeError, None),
-    (lambda: qdm.covariance(REAL.reshape(8, 12), order=4), E, None),
+    (lambda: qdm.covariance(REAL[0], order=4), E, None),
     (lambda: qdm.covariance(np.float64(3.0), order=1), E, None),
     (lambda: qdm.prony(COMPLEX, order=4, real_signal=True), E, None),
     (lambda: qdm.pcar(np.zeros(0, complex), order=0, components=1), E, -42401),
@@ -219,8 +219,8 @@ MESSAGES = [  # call, exception, the message exactly: argument, value, limit in 
      "covariance_psd: nfft must be an integer, not 64.5"),
     (lambda: qdm.prony(REAL, order=4, fs="1000"), TypeError,
      "prony: fs must be a real number, not '1000'"),
-    (lambda: qdm.covariance(REAL.reshape(8, 12), order=4), E,
-     "covariance: x must be one-dimensional, not 2-D of shape (8, 12)"),
+    (lambda: qdm.covariance(REAL[0], order=4), E,
+     "covariance: x must have at least one dimension, not 0-D"),
     (lambda: qdm.prony(COMPLEX, order=4, real_signal=True), E,
      "prony: real_signal=True applies to real data only, not to complex x"),
 ]
@@ -246,7 +246,7 @@ def test_a_pole_on_the_unit_circle_gives_finite_numbers_or_the_error():
     # A ramp's AR polynomial has a double root at 1, or within rounding of it (which one
     # depends on the BLAS): the spectrum is then infinite at 0 Hz, or huge and finite.
     try:
-        f, psd, db, noise = qdm.covariance_psd(np.arange(12.0), order=2, nfft=16)
+        f, psd, db, noise, status = qdm.covariance_psd(np.arange(12.0), order=2, nfft=16)
     except qdm.NonFiniteResultError as e:
         assert e.code == -30001
     else:

@@ -33,3 +33,5 @@ qdm_plain_test(api_plain_threads ${CMAKE_SOURCE_DIR}/tests/api/plain_threads.cpp
 # Error bars of modes, and the stabilization diagram.
 qdm_plain_test(api_mode_errors ${CMAKE_SOURCE_DIR}/tests/api/plain_mode_errors.cpp)
 qdm_plain_test(api_stabilization ${CMAKE_SOURCE_DIR}/tests/api/plain_stabilization.cpp)
+# Batches: every fit's batch twin against its single calls.
+qdm_plain_test(api_plain_batch ${CMAKE_SOURCE_DIR}/tests/api/plain_batch.cpp)

@@ -215,7 +215,7 @@ readme)
 import sys
 text = open(sys.argv[1], encoding="utf-8").read()
 section = text.split("\n## The command-line tool\n", 1)[1].split("\n## ", 1)[0]
-lines = [l[4:] for l in section.splitlines() if l.startswith("    ")]
+lines = section.split("```sh\n", 1)[1].split("\n```", 1)[0].splitlines()
 assert len(lines) >= 4, lines
 print("set -e\n" + "\n".join(lines))
 PY
