@@ -714,22 +714,27 @@ Record Fit(Method m, const Options& o, const std::string& input, const Signal& s
 // ---- output ---------------------------------------------------------------------------
 
 // Writes in pieces through a buffer, so a long spectrum is never one string.
+// To a string instead, the text is kept whole (a line made ahead of its turn).
 class Writer {
  public:
   explicit Writer(std::FILE* out) : out_(out) {}
+  explicit Writer(std::string* kept) : kept_(kept) {}
   ~Writer() { Flush(); }
+  Writer(const Writer&) = delete;
+  Writer& operator=(const Writer&) = delete;
   Writer& operator<<(std::string_view s) {
-    buffer_.append(s);
+    (kept_ ? *kept_ : buffer_).append(s);
     if (buffer_.size() >= (size_t{1} << 16)) Flush();
     return *this;
   }
   void Flush() {
-    std::fwrite(buffer_.data(), 1, buffer_.size(), out_);
+    if (out_ != nullptr) std::fwrite(buffer_.data(), 1, buffer_.size(), out_);
     buffer_.clear();
   }
 
  private:
-  std::FILE* out_;
+  std::FILE* out_ = nullptr;
+  std::string* kept_ = nullptr;
   std::string buffer_;
 };
 
@@ -751,9 +756,8 @@ std::string JsonNumber(double v) {
 // The record as JSON (indent < 0: one line), with the spectrum's columns
 // spliced into their empty arrays (the last of each name: the spectrum is the
 // record's last member, and a name inside a JSON string has its quotes escaped).
-void WriteJson(std::FILE* out, const Record& r, int indent) {
+void WriteJson(Writer& w, const Record& r, int indent) {
   const std::string text = r.json.dump(indent, ' ', false, kReplace);
-  Writer w(out);
   size_t done = 0;
   for (size_t c = 0; c < std::size(kSpectrumColumns) && r.spectrum; ++c) {
     const std::string key = std::string("\"") + kSpectrumColumns[c] + "\":";
@@ -772,6 +776,11 @@ void WriteJson(std::FILE* out, const Record& r, int indent) {
     done = open;
   }
   w << std::string_view(text).substr(done) << "\n";
+}
+
+void WriteJson(std::FILE* out, const Record& r, int indent) {
+  Writer w(out);
+  WriteJson(w, r, indent);
 }
 
 std::string Brief(const Json& v) {
@@ -1200,12 +1209,31 @@ void FitGroup(Method m, const Options& o, std::vector<Entry>& chunk, Group& g) {
   }
 }
 
+// What a record of a chunk holds, roughly: its samples, its output rows and its
+// line, where a spectrum's or a diagram's text weighs the most (a number is at
+// most 24 characters).
+uint64_t RecordBytes(Method m, const Options& o, const Signal& s) {
+  uint64_t bytes = sizeof(double) * (s.values.size() + 12 * (uint64_t(s.n) + 1));
+  if (kSpectra & Bit(m)) bytes += uint64_t(qdm_spectrum_length(o.nfft.value_or(512))) * 3 * 32;
+  if (m == kStabilization) {
+    const int32_t top = std::min(o.maxOrder.value_or(20), s.n / 2);
+    bytes += uint64_t(std::max<int64_t>(qdm_stabilization_rows(o.minOrder.value_or(1), top), 0)) *
+             8 * 32;
+  }
+  return bytes;
+}
+
+// A file's JSON line, made ahead of its turn, and what goes to stderr with it.
+struct Line {
+  std::string text, warning, error;
+  int code = kOk;
+};
+
 // The files in chunks: each chunk's records grouped by length and type, each
 // group fitted by one batch call on --jobs threads, then one JSON line per
 // file, in input order. The stabilization diagram has no batch: its records
-// are fitted one by one on --jobs threads.
+// are fitted one by one on --jobs threads, where every line is made.
 int RunBatch(Method m, const Options& o) {
-  const int32_t spectrumValues = m == kPcarSpectrum ? qdm_spectrum_length(o.nfft.value_or(512)) : 0;
   int exit = kOk;
   for (size_t next = 0; next < o.files.size();) {
     std::vector<Entry> chunk;
@@ -1222,7 +1250,7 @@ int RunBatch(Method m, const Options& o) {
         continue;
       }
       const Signal& s = e.signal;
-      bytes += sizeof(double) * (s.values.size() + 12 * (uint64_t(s.n) + 1) + spectrumValues);
+      bytes += RecordBytes(m, o, s);
       const auto [it, added] = groupOf.try_emplace({s.n, s.complex, s.defaultRate}, groups.size());
       if (added) {
         Group& g = groups.emplace_back();
@@ -1233,53 +1261,54 @@ int RunBatch(Method m, const Options& o) {
       groups[e.group].members.push_back(chunk.size() - 1);
     }
     for (Group& g : groups) FitGroup(m, o, chunk, g);
-    // The diagrams of the chunk, made ahead of the lines.
-    std::vector<std::optional<Record>> made(chunk.size());
-    std::vector<int> codes(chunk.size(), kOk);
-    const auto make = [&](size_t c) {
+    // The chunk's lines are made on the --jobs threads (the diagrams fitted
+    // there), then printed in input order.
+    std::vector<Line> lines(chunk.size());
+    OnThreads(chunk.size(), o.jobs, [&](size_t c) {
       const Entry& e = chunk[c];
       const std::string& path = o.files[e.file];
-      return Guarded(m, path, &codes[c], [&] {
-        if (e.error) std::rethrow_exception(e.error);
-        const Group& g = groups[e.group];
-        if (g.error) std::rethrow_exception(g.error);
-        if (m == kStabilization) return StabilizationRecord(*g.plan, path, e.signal, false);
-        const size_t values = size_t(g.n) * (g.complex ? 2 : 1);
-        return Present(*g.plan, path, g.rows, e.row, g.x + size_t(e.row) * values);
-      });
-    };
-    if (m == kStabilization) {
-      OnThreads(chunk.size(), o.jobs, [&](size_t c) {
-        try {
-          made[c] = make(c);
-        } catch (...) {  // no memory even for the error record: written below
-          codes[c] = kFailed;
-        }
-      });
-    }
+      Line& line = lines[c];
+      try {
+        const Record r = Guarded(m, path, &line.code, [&] {
+          if (e.error) std::rethrow_exception(e.error);
+          const Group& g = groups[e.group];
+          if (g.error) std::rethrow_exception(g.error);
+          if (m == kStabilization) return StabilizationRecord(*g.plan, path, e.signal, false);
+          const size_t values = size_t(g.n) * (g.complex ? 2 : 1);
+          return Present(*g.plan, path, g.rows, e.row, g.x + size_t(e.row) * values);
+        });
+        Writer w(&line.text);
+        WriteJson(w, r, -1);
+        w.Flush();
+        line.warning = r.warning;
+        if (line.code != kOk) line.error = r.json["error"].get<std::string>();
+      } catch (...) {  // no memory even for the error record: written below
+        line = Line{};
+        line.code = kFailed;
+      }
+    });
     for (size_t c = 0; c < chunk.size(); ++c) {
       const std::string& path = o.files[chunk[c].file];
-      Record r;
-      try {
-        r = made[c] ? std::move(*made[c]) : make(c);
-      } catch (...) {
-        codes[c] = kFailed;
-      }
-      made[c].reset();
-      if (r.json.is_null())
+      Line& line = lines[c];
+      if (line.text.empty()) {
+        Record r;
         r.json = {{"input", path},
                   {"method", kMethods[m][0]},
                   {"status", nullptr},
                   {"exit", kFailed},
                   {"error", Shown(path, kNameShown) + ": out of memory"}};
-      WriteJson(stdout, r, -1);
-      if (!r.warning.empty())
-        std::fprintf(stderr, "qdm: %s: warning: %s\n", Shown(path, kNameShown).c_str(),
-                     r.warning.c_str());
-      if (codes[c] != kOk) {
-        exit = kFailed;
-        std::fprintf(stderr, "qdm: %s\n", r.json["error"].get<std::string>().c_str());
+        WriteJson(stdout, r, -1);
+        line.error = r.json["error"].get<std::string>();
       }
+      std::fwrite(line.text.data(), 1, line.text.size(), stdout);
+      if (!line.warning.empty())
+        std::fprintf(stderr, "qdm: %s: warning: %s\n", Shown(path, kNameShown).c_str(),
+                     line.warning.c_str());
+      if (line.code != kOk) {
+        exit = kFailed;
+        std::fprintf(stderr, "qdm: %s\n", line.error.c_str());
+      }
+      line = Line{};
     }
   }
   return exit;
